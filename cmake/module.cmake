@@ -1,0 +1,41 @@
+# The module, libqxesm.so. Its objects are a library of their own, so that tests reach what the module hides.
+set(BLA_VENDOR Generic)
+find_package(BLAS REQUIRED)
+
+add_library(qxesm_objects OBJECT
+  frame/entry.cpp
+  frame/instance.cpp
+  frame/not_yet.cpp
+  frame/table.cpp
+  store/api.cpp
+  store/assembly.cpp
+  store/closing.cpp
+  store/lifecycle.cpp
+  store/nodes.cpp
+  store/sizing.cpp
+  cholesky/api.cpp
+  cholesky/dense.cpp
+  cholesky/factor.cpp
+  cholesky/ginverse2.cpp
+  cholesky/numeric.cpp
+  cholesky/ordering.cpp
+  cholesky/reorder.cpp
+  cholesky/solve.cpp
+  cholesky/symbolic.cpp
+  forms/kernels.cpp)
+target_include_directories(qxesm_objects PUBLIC ${PROJECT_SOURCE_DIR}/include PRIVATE ${PROJECT_SOURCE_DIR})
+target_compile_options(qxesm_objects PRIVATE $<$<COMPILE_LANGUAGE:CXX>:-fno-exceptions -fno-rtti>)
+target_link_libraries(qxesm_objects PRIVATE qxesm_options)
+
+add_library(qxesm SHARED)
+add_library(qxesm::qxesm ALIAS qxesm)
+target_sources(qxesm PUBLIC FILE_SET HEADERS BASE_DIRS ${PROJECT_SOURCE_DIR}/include FILES
+  include/qxesm/cholesky.h include/qxesm/forms.h include/qxesm/ginv.h include/qxesm/host.h include/qxesm/instance.h
+  include/qxesm/iterative.h include/qxesm/matrix.h include/qxesm/qxesm.h include/qxesm/status.h
+  include/qxesm/store.h include/qxesm/trace.h include/qxesm/types.h)
+target_link_libraries(qxesm PRIVATE qxesm_objects qxesm_options BLAS::BLAS m)
+set_target_properties(qxesm PROPERTIES SOVERSION 1 LINK_DEPENDS ${PROJECT_SOURCE_DIR}/qxesm.map)
+target_link_options(qxesm PRIVATE -Wl,--version-script=${PROJECT_SOURCE_DIR}/qxesm.map -Wl,--as-needed)
+if(NOT QXESM_SANITIZE)
+  target_link_options(qxesm PRIVATE -Wl,-z,defs)
+endif()

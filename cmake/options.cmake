@@ -1,0 +1,29 @@
+# Every switch of the build, and the compile options that all targets share (qxesm_options).
+option(QXESM_WERROR "Treat warnings as errors" OFF)
+option(QXESM_SANITIZE "AddressSanitizer and UndefinedBehaviorSanitizer" OFF)
+option(QXESM_COVERAGE "Line and branch coverage (gcov)" OFF)
+option(QXESM_BUILD_TESTS "Build the tests" ${PROJECT_IS_TOP_LEVEL})
+option(QXESM_BUILD_CLI "Build the qxsm command" ON)
+option(QXESM_BUILD_FUZZERS "Build the libFuzzer targets (clang only)" OFF)
+
+if(NOT CMAKE_BUILD_TYPE AND NOT CMAKE_CONFIGURATION_TYPES)
+  set(CMAKE_BUILD_TYPE Release CACHE STRING "Build type" FORCE)
+endif()
+set(CMAKE_C_FLAGS_RELEASE "-O3 -DNDEBUG")
+set(CMAKE_CXX_FLAGS_RELEASE "-O3 -DNDEBUG")
+
+add_library(qxesm_options INTERFACE)
+# The same bits on every CPU: no contraction of a*b + c into one rounding.
+target_compile_options(qxesm_options INTERFACE -Wall -Wextra -Wconversion -Wshadow -ffp-contract=off)
+if(QXESM_WERROR)
+  target_compile_options(qxesm_options INTERFACE -Werror)
+endif()
+if(QXESM_SANITIZE)
+  target_compile_options(qxesm_options INTERFACE -fsanitize=address,undefined -fno-sanitize-recover=undefined
+    -fno-omit-frame-pointer -g)
+  target_link_options(qxesm_options INTERFACE -fsanitize=address,undefined)
+endif()
+if(QXESM_COVERAGE)
+  target_compile_options(qxesm_options INTERFACE --coverage)
+  target_link_options(qxesm_options INTERFACE --coverage)
+endif()

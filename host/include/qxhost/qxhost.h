@@ -1,0 +1,99 @@
+/* The embedded host: everything the module needs of a kernel, for programs that have none.
+ *
+ *   QxHost* host = qxhost_create(NULL);
+ *   SmExtension* extension = (SmExtension*)qxhost_load_extension(host, L"qxesm", 5);
+ *   SmInstance* instance = extension->CreateInstance(extension);
+ *   ...
+ *   instance->functions->qxsmDestroyInstance(&instance);
+ *   extension->qxsmDestroyExtension(extension);
+ *   qxhost_destroy(host);
+ *
+ * A host is used by one thread at a time. Nothing here prints or aborts. */
+#ifndef QXHOST_QXHOST_H
+#define QXHOST_QXHOST_H
+
+#include <qxesm/host.h>
+
+#if defined(__cplusplus)
+#define QXHOST_API extern "C" __attribute__((visibility("default")))
+#else
+#define QXHOST_API extern __attribute__((visibility("default")))
+#endif
+
+typedef struct QxHost QxHost;
+
+/* How a host is made. Zero-initialise, then set what differs. */
+typedef struct QxHostOptions {
+  uint64_t memory_ceiling; /* bytes that all pools together may hand out; 0: no ceiling */
+  int32_t checking;        /* non-zero: the checking mode below; slower, for tests */
+} QxHostOptions;
+
+/* What the pools of a host hold. Bytes are as requested, without the pools' own overhead. */
+typedef struct QxHostUsage {
+  uint64_t bytes_in_use;
+  uint64_t bytes_peak;
+  int64_t pools_live;
+  int64_t blocks_live; /* counted in the checking mode only, else 0 */
+  int64_t requests;    /* requests made so far that a fault could have met: blocks, pools, trees, extensions */
+} QxHostUsage;
+
+/* What the checking mode found since the host was made. */
+typedef struct QxHostViolations {
+  int64_t foreign_frees; /* free of a block that the pool did not hand out */
+  int64_t double_frees;
+  int64_t overruns;   /* a block was written past its end (found when it is freed or its pool destroyed) */
+  int64_t dead_pools; /* a call on a pool that was destroyed */
+} QxHostViolations;
+
+/* A new host, or null when memory is short. `options` may be null. */
+QXHOST_API QxHost* qxhost_create(const QxHostOptions* options);
+
+/* Destroys every pool that is left and the host. Null is harmless. */
+QXHOST_API void qxhost_destroy(QxHost* host);
+
+/* The table that the module takes as its service handle. Valid until qxhost_destroy. */
+QXHOST_API HostServices* qxhost_services(QxHost* host);
+
+/* Adds a folder in which extensions are looked for, after the folder of the host library and those added before.
+ * Answers 0, or -1 when memory is short or directory is null. */
+QXHOST_API int32_t qxhost_add_search_path(QxHost* host, const char* directory);
+
+/* Loads lib<name>.so, hands it the services through its qxextver, and calls its entry of the same name; `length` counts
+ * wide characters. The answer is that entry's (for L"qxesm" an SmExtension*), or null: qxhost_last_error says why. The
+ * library stays loaded until the host is destroyed. It is what the services' load_extension does. */
+QXHOST_API void* qxhost_load_extension(QxHost* host, const wchar_t* name, int64_t length);
+
+/* Why the last load failed: one line that names the file and the cause. Empty when none failed. Never null. */
+QXHOST_API const char* qxhost_last_error(const QxHost* host);
+
+/* Sets the host's ceiling (0: none). Blocks that are out already stay. */
+QXHOST_API void qxhost_set_memory_ceiling(QxHost* host, uint64_t bytes);
+
+/* Sets a ceiling for one pool of this host (0: none). Answers 0, or -1 when the pool is not this host's. */
+QXHOST_API int32_t qxhost_set_pool_ceiling(QxHost* host, MemoryPool* pool, uint64_t bytes);
+
+QXHOST_API QxHostUsage qxhost_usage(const QxHost* host);
+
+/* Non-zero when a request was refused because of a ceiling since the host was made. */
+QXHOST_API int32_t qxhost_ceiling_was_met(const QxHost* host);
+
+/* What a planned fault refuses. */
+enum {
+  QXHOST_FAIL_BLOCKS = 1,     /* allocate */
+  QXHOST_FAIL_POOLS = 2,      /* create pool */
+  QXHOST_FAIL_TREES = 4,      /* create tree manager */
+  QXHOST_FAIL_EXTENSIONS = 8, /* load extension */
+  QXHOST_FAIL_ALL = 15
+};
+
+/* Checking mode: refuse the k-th request (k = 0: the next one) of the kinds in `what`, once or from then on. Only
+ * requests that come through the services are counted. */
+QXHOST_API void qxhost_fail_request(QxHost* host, int32_t what, int64_t k, int32_t for_ever);
+
+/* Ends the planned fault and answers how many requests it refused. */
+QXHOST_API int64_t qxhost_stop_failing(QxHost* host);
+
+/* Checking mode: looks at every live block and answers what was found so far. All zero outside that mode. */
+QXHOST_API QxHostViolations qxhost_violations(QxHost* host);
+
+#endif

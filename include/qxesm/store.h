@@ -1,0 +1,124 @@
+/* The matrix store: creation, sizing, assembly, closing, reading, copying. */
+#ifndef QXESM_STORE_H
+#define QXESM_STORE_H
+
+#include <qxesm/instance.h>
+
+/* A record of the given kind and format, without a size.
+ *   matrix  in/out  *matrix null: a new record, registered in the instance; else that record is typed again, and what
+ *                   it held before is not given back (reset it with qxsmdelete first)
+ * Answers: 101 (record, registry or pool could not be had); 116 (format not allowed for the kind: 21, 22, 23 for
+ * general and symmetric, 22, 23 for diagonal); 124 (no such kind); 0.
+ * On 116 and 124 the record stays registered with kind none and without a pool, and *matrix is unchanged. A missing tree
+ * manager is not an error here: the first assignment answers 101. */
+QXESM_API SmStatus qxsmnew(SmInstance* instance, SmMatrix** matrix, int32_t kind, int32_t format);
+
+/* qxsmnew and qxsmresize in one: symmetric sparse n x n, open, with its zero diagonal; symmetric in format 22, n x n;
+ * general sparse rows x cols; diagonal in format 23, n x n. The answer of qxsmnew unless it is 0, else of qxsmresize. */
+QXESM_API SmStatus qxsmnewss(SmInstance* instance, SmMatrix** matrix, int64_t n);
+QXESM_API SmStatus qxsmnewds(SmInstance* instance, SmMatrix** matrix, int64_t n);
+QXESM_API SmStatus qxsmnewsg(SmInstance* instance, SmMatrix** matrix, int64_t rows, int64_t cols);
+QXESM_API SmStatus qxsmnewsd(SmInstance* instance, SmMatrix** matrix, int64_t n);
+
+/* Gives the matrix a size, drops its entries and factor, and voids rank and log-determinant.
+ *   dense and diagonal  zero values, state 1; the same size again zeroes the array in place (a tied one too); another
+ *                       size gives an owned array back, lets go of a tied one, and takes a new one
+ *   general sparse      no entries, state 1
+ *   symmetric sparse    a zero on every diagonal position (nnz = n), state 0: open for qxsmassign
+ * 0 x 0 is a size. Answers: 1; 122 (negative, or exactly one dimension zero); 111 (symmetric or diagonal and
+ * rows != cols; the state is 1 afterwards, and while a symmetric sparse matrix has no compressed rows its readers answer
+ * 113); 105 (more than 2^53 values, roots or nodes); 101; 124.
+ * After 105 or 101 a dense or diagonal matrix has no values (nnz 0) and keeps rows and cols as asked. After 101 a
+ * sparse one keeps its size and refuses entries with 101. Cost: the size of the storage; a symmetric sparse matrix pays n
+ * insertions. */
+QXESM_API SmStatus qxsmresize(SmMatrix* matrix, int64_t rows, int64_t cols);
+
+/* Resets to kind none, state 0: pools, trees and arrays go back; the record and its registry index stay, so that
+ * qxsmnew or qxsmtie can use it again. Null is harmless. Answers 0. */
+QXESM_API SmStatus qxsmdelete(SmMatrix* matrix);
+
+/* Resets the matrix, frees its record and stores null. A null address or record is harmless. Answers 0. */
+QXESM_API SmStatus qxsmDestroyMatrix(SmInstance* instance, SmMatrix** matrix);
+
+/* Attaches the caller's array as the values of a dense or diagonal matrix.
+ *   data  in/out, lent  rows*cols (general), n(n+1)/2 (symmetric) or n (diagonal) doubles in the layout of the format;
+ *                       it stays the caller's and must outlive its use; the module never frees it
+ * What the matrix held is dropped first. The state is 1 for a matrix that had a type (0 for one that was symmetric
+ * sparse) and 0 for a reset record, which is registered again: qxsmclose makes it readable.
+ * Answers: 104 (data null with rows > 0 or cols >= 1; a negative size), with nothing changed; then, with the matrix
+ * emptied: 111 (symmetric or diagonal, rows != cols); 124 (a format other than 22, 23; another kind); 105 (more than
+ * 2^53 values); 0. */
+QXESM_API SmStatus qxsmtie(SmMatrix* matrix, double* data, int64_t rows, int64_t cols, int32_t kind, int32_t format);
+
+/* Removes one entry of a general sparse matrix; an absent entry is no error.
+ * Answers: 0 with nothing done (empty); 1; 117 (outside); 124 (not general sparse); 0. */
+QXESM_API SmStatus qxsmremove(SmMatrix* matrix, int64_t row, int64_t col);
+
+/* Stores (add = 0) or adds (add != 0) one value.
+ *   general sparse    an index past the size makes the matrix grow to cover it
+ *   symmetric sparse  only while open, only col >= row; an index past the size makes the matrix grow to cover col; the
+ *                     new rows get their zero diagonal when the matrix is closed
+ *   dense             general: the position col + row*cols (format 23) or col*rows + row (format 22) is what counts
+ * Rank and log-determinant are voided. On a factored or inverted dense or diagonal matrix the separate factor array
+ * goes back and the state returns to 1; one that was factored or inverted in place keeps its state, and its values are
+ * then that factor or inverse with this element changed.
+ * Answers: 0 with nothing done (rows < 1); 1; 104 (negative index; off the diagonal of a diagonal matrix; outside a dense
+ * matrix's storage or size); 117 (below the diagonal of a symmetric matrix); 119 (symmetric sparse, closed);
+ * 124 (format); 105 (2^53 entries, or an index that no root array can reach); 101; 0.
+ * After 101 from a sparse matrix that could not get a new slab the entry is in; further calls answer 101.
+ * Cost: one tree insertion. */
+QXESM_API SmStatus qxsmassign(SmMatrix* matrix, int64_t row, int64_t col, int32_t add, double value);
+
+/* Reads one element of a closed matrix into *value.
+ *   symmetric sparse  col >= row only; once ordering has been applied or begun (state > 1) the diagonal only
+ *   diagonal          the diagonal value of the row, whatever the column
+ * Answers, with *value 0: 123 (empty); with *value missing: 110 (kind none); 113; 117 (outside); 123 (below the
+ * diagonal, or off it past state 1; another kind); 116 (format); else 0, an absent entry reading as 0.
+ * Cost: one search in the row. */
+QXESM_API SmStatus qxsmget(SmMatrix* matrix, int64_t row, int64_t col, double* value);
+
+/* Sets every stored entry of a closed matrix to `value`; the pattern stays. Rank and log-determinant are voided; a
+ * symmetric sparse factor in state 5 becomes state 4; dense and diagonal factors as in qxsmassign.
+ * Answers: 0 with nothing done (empty); 110 (kind none); 113; 124; 0. */
+QXESM_API SmStatus qxsmsetee(SmMatrix* matrix, double value);
+
+/* Adds weight * z * z' to a symmetric matrix.
+ *   z      length doubles
+ *   index  null: z lies along rows 0 .. length-1, and zeros of z add nothing; else length row numbers, in any order, and
+ *          every pair is entered, zeros included
+ * Answers: 0 with nothing done (empty); 104 (length > rows; z null with length > 0); 124 (not symmetric); 119 (sparse
+ * and not open); else the first answer of qxsmassign that is not 0 (what was added before stays); 0.
+ * Cost: length^2 / 2 assignments. */
+QXESM_API SmStatus qxsmzscp(SmMatrix* matrix, const double* z, const int64_t* index, int64_t length, double weight);
+
+/* Ends assembly: state 1. Entries with |value| <= tolerance are dropped (dense and diagonal: set to 0; the diagonal of a
+ * symmetric sparse matrix: kept as 0). A negative tolerance stands for setting 3 of the instance; a NaN drops nothing. A
+ * symmetric sparse matrix turns into compressed rows of its upper triangle, diagonal first, columns ascending, every
+ * diagonal present; its trees go back to the host. Only a matrix in state 0 is touched.
+ * Answers: 0 with state 1 (empty); 1; 0 with nothing done (closed already); 105; 101 (the matrix stays open);
+ * 124; 0. Cost: one walk over the entries. */
+QXESM_API SmStatus qxsmclose(SmMatrix* matrix, double tolerance);
+
+/* The operations below answer 124 in this release. */
+
+/* out <- row `row` of A from column `start` on; out has cols doubles. */
+QXESM_API SmStatus qxsmrow(SmMatrix* matrix, int64_t row, double* out, int64_t start);
+/* out <- the stored part of row `row` of a symmetric matrix; out has cols doubles. */
+QXESM_API SmStatus qxsmUpperRow(SmMatrix* matrix, int64_t row, double* out);
+/* out <- a block of a symmetric sparse matrix, (r1-r0+1) x (c1-c0+1), row-major. */
+QXESM_API SmStatus qxsmUpperSub(SmMatrix* matrix, double* out, int64_t r0, int64_t r1, int64_t c0, int64_t c1);
+/* out <- diagonal elements first .. last. */
+QXESM_API SmStatus qxsmdiag(SmMatrix* matrix, double* out, int64_t first, int64_t last);
+/* out <- the whole matrix: mode 2 full, row-major; modes 0 and 1 a packed triangle. */
+QXESM_API SmStatus qxsmdense(SmMatrix* matrix, double* out, int16_t mode);
+/* *flag <- 1 when every stored off-diagonal entry is at or below the tolerance. */
+QXESM_API SmStatus qxsmIsDiag(SmMatrix* matrix, int16_t* flag, double tolerance);
+/* target <- source, same kind and format, with its factor. */
+QXESM_API SmStatus qxsmclone(SmMatrix* source, SmMatrix* target, int32_t reassemble);
+/* target <- source, across kinds and formats. */
+QXESM_API SmStatus qxsmconvert(SmMatrix* source, SmMatrix* target, int32_t flag);
+/* values -> the dense values of a matrix, which is rebuilt when its shape differs. */
+QXESM_API SmStatus qxsmcopyv(const double* values, SmMatrix* matrix, int64_t rows, int64_t cols, int32_t kind,
+                             int32_t format);
+
+#endif
