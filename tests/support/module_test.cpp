@@ -2,7 +2,7 @@
 
 #include <cstring>
 
-namespace qxesm::test {
+namespace sm::test {
 
 std::string name_of(HostKind kind) { return kind == HostKind::embedded ? "embedded" : "minimal"; }
 
@@ -47,4 +47,4 @@ bool is_missing(double value) {
   return bits == SM_MISSING_BITS;
 }
 
-}  // namespace qxesm::test
+}  // namespace sm::test

@@ -5,7 +5,7 @@
 
 #include "support/test_host.hpp"
 
-namespace qxesm::test {
+namespace sm::test {
 
 // A host with the module loaded in it. Destroys instance and extension, if they are still there, and leaves leaks and
 // violations to be asked for. Usable outside the fixture (the allocation failure loops make one for each k).
@@ -47,8 +47,8 @@ class ModuleTest : public ::testing::TestWithParam<HostKind> {
 // Runs a suite under both hosts: INSTANTIATE_BOTH_HOSTS(MySuite);
 #define INSTANTIATE_BOTH_HOSTS(suite)                                                                              \
   INSTANTIATE_TEST_SUITE_P(Hosts, suite,                                                                           \
-                           ::testing::Values(::qxesm::test::HostKind::embedded, ::qxesm::test::HostKind::minimal), \
-                           [](const auto& i) { return ::qxesm::test::name_of(i.param); })
+                           ::testing::Values(::sm::test::HostKind::embedded, ::sm::test::HostKind::minimal), \
+                           [](const auto& i) { return ::sm::test::name_of(i.param); })
 
 // Runs `run` with every request refused in turn, first once and then from there on; see the comments at its body.
 //   prepare(Session&) -> anything    builds the problem without faults
@@ -78,4 +78,4 @@ void survives_every_allocation_failure(HostKind kind, Prepare prepare, Run run) 
 
 bool is_missing(double value);  // the missing value, to the bit
 
-}  // namespace qxesm::test
+}  // namespace sm::test

@@ -7,7 +7,7 @@
 #include <memory>
 #include <string>
 
-namespace qxesm::test {
+namespace sm::test {
 
 // A host in its checking mode. Counts and faults cover what passes through its services.
 class TestHost {
@@ -30,4 +30,4 @@ std::string name_of(HostKind kind);
 // The embedded host of this project, or the minimal one in C that is written from the public headers alone.
 std::unique_ptr<TestHost> make_host(HostKind kind);
 
-}  // namespace qxesm::test
+}  // namespace sm::test
