@@ -1,0 +1,47 @@
+// Operations that this release declares but does not serve yet: each answers 124 and touches nothing.
+#include "frame/core.hpp"
+
+extern "C" SmStatus qxsmrow(SmMatrix*, int64_t, double*, int64_t) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmUpperRow(SmMatrix*, int64_t, double*) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmUpperSub(SmMatrix*, double*, int64_t, int64_t, int64_t, int64_t) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmdiag(SmMatrix*, double*, int64_t, int64_t) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmdense(SmMatrix*, double*, int16_t) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmIsDiag(SmMatrix*, int16_t*, double) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmclone(SmMatrix*, SmMatrix*, int32_t) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmconvert(SmMatrix*, SmMatrix*, int32_t) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmcopyv(const double*, SmMatrix*, int64_t, int64_t, int32_t, int32_t) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsminvdiag(SmMatrix*, double*) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmmultv(SmMatrix*, const double*, double*, int64_t, int64_t, int64_t, int64_t, int64_t, int32_t) {
+  return SM_UNAVAILABLE;
+}
+extern "C" SmStatus qxsmvmult(const double*, SmMatrix*, double*, int64_t, int32_t) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmquadv(SmMatrix*, const double*, double*, int64_t, int64_t, int64_t) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmbilin(SmMatrix*, const double*, const double*, double*, int64_t, int64_t) {
+  return SM_UNAVAILABLE;
+}
+extern "C" SmStatus qxsmquad(SmMatrix*, SmMatrix*, SmMatrix*, int32_t) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmDenseQuad(SmMatrix*, const double*, SmMatrix*, int32_t) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsminvquadv(SmMatrix*, const double*, double*, int64_t, int32_t) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsminvquad(SmMatrix*, SmMatrix*, SmMatrix*) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsminvbilin(SmMatrix*, const double*, const double*, double*, int64_t, int64_t) {
+  return SM_UNAVAILABLE;
+}
+extern "C" SmStatus qxsmmults(SmMatrix*, double) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmmultm(SmMatrix*, SmMatrix*, SmMatrix*, int32_t) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmvaxpy(SmMatrix*, SmMatrix*, SmMatrix*, double, double) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmpivot(SmMatrix*, char*) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmcke(SmMatrix*, const double*, int32_t, int64_t*, int32_t*, char, double) {
+  return SM_UNAVAILABLE;
+}
+extern "C" SmStatus qxsmAddSS(SmMatrix*, SmMatrix*, double) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmUpdateGinv(SmMatrix*, SmMatrix*, SmMatrix*, int64_t, int64_t, double) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmAddGinv(SmMatrix*, SmMatrix*, SmMatrix*, int64_t, double, double) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsminv(SmMatrix*, int16_t, double) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmhermite(SmMatrix*, SmMatrix*) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmorth(SmMatrix*, const int16_t*, int64_t, int64_t, double) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmtrace(SmMatrix*, double*) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmtraceAB(SmMatrix*, SmMatrix*, double*) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmtraceinvAB(SmMatrix*, SmMatrix*, int64_t, double*) { return SM_UNAVAILABLE; }
+extern "C" SmStatus qxsmsolioc(SmMatrix*, const double*, double*, int32_t, int64_t, int64_t*, double*, double) {
+  return SM_UNAVAILABLE;
+}

@@ -1,0 +1,91 @@
+// Nodes are carved from slabs, and one spare node is always ready: an insertion offers it to the tree, which either
+// links it in or answers with the node that holds the key already, so that no node is ever allocated on its own.
+#include "store/nodes.hpp"
+
+#include <algorithm>
+
+#include "frame/memory.hpp"
+
+namespace sm {
+
+namespace {
+
+constexpr i64 kRootSlack = 21;  // a root array that grows reaches this many words past the row that made it grow
+
+i64 node_stride(const SmMatrix& m) { return (m.node_size + 7) / 8 * 8; }
+
+// A fresh slab, its first node the spare one. On failure there is no spare node, and entries are refused from then on.
+SmStatus take_slab(SmMatrix& m) {
+  m.spare_node = nullptr;
+  m.next_node = nullptr;
+  SM_TRY(allocate(tree_pool(m), m.slab_nodes, Fill::zero, m.spare_node));
+  m.slab_used = node_stride(m);
+  m.next_node = m.spare_node + 1;
+  return SM_OK;
+}
+
+// The spare node has been linked in: count it and make the next one ready.
+SmStatus advance_spare(SmMatrix& m) {
+  ++m.nnz;
+  m.slab_used += node_stride(m);
+  if (m.slab_used > m.slab_bytes) return take_slab(m);
+  m.spare_node = m.next_node;
+  m.next_node = m.spare_node + 1;
+  return SM_OK;
+}
+
+SmStatus grow_roots(SmMatrix& m, i64 row) {
+  if (row > SM_MAX_ELEMENTS - kRootSlack) return SM_TOO_LARGE;
+  uint64_t* grown = nullptr;
+  SM_TRY(allocate(tree_pool(m), row + kRootSlack, Fill::zero, grown));
+  uint64_t*& roots = roots_of(m);
+  std::copy_n(roots, m.row_capacity, grown);
+  give_back(tree_pool(m), roots);
+  roots = grown;
+  m.row_capacity = row + kRootSlack;
+  return SM_OK;
+}
+
+// A symmetric matrix stays square, so the larger index decides; (row, col) has row <= col there.
+SmStatus cover_symmetric(SmMatrix& m, i64 col) {
+  if (col < m.rows) return SM_OK;
+  if (col >= m.row_capacity) SM_TRY(grow_roots(m, col));
+  m.rows = m.cols = col + 1;
+  m.value_count = (static_cast<double>(col) + 2.0) * (static_cast<double>(col) + 1.0) / 2.0;
+  return SM_OK;
+}
+
+SmStatus cover_general(SmMatrix& m, i64 row, i64 col) {
+  if (row < m.rows && col < m.cols) return SM_OK;
+  if (col == INT64_MAX) return SM_TOO_LARGE;
+  if (row >= m.row_capacity) SM_TRY(grow_roots(m, row));
+  m.rows = std::max(m.rows, row + 1);
+  m.cols = std::max(m.cols, col + 1);
+  m.value_count = static_cast<double>(m.rows) * static_cast<double>(m.cols);
+  return SM_OK;
+}
+
+}  // namespace
+
+SmStatus start_trees(SmMatrix& m, i64 slab_nodes) {
+  m.slab_nodes = slab_nodes;
+  m.slab_bytes = m.node_size * slab_nodes;
+  SM_TRY(take_slab(m));
+  return allocate(tree_pool(m), m.row_capacity, Fill::zero, roots_of(m));
+}
+
+SmStatus enter_node(SmMatrix& m, i64 row, i64 col, bool add, double value) {
+  if (!m.tree || !m.spare_node || !roots_of(m)) return SM_NO_MEMORY;
+  SM_TRY(is_symmetric_sparse(m) ? cover_symmetric(m, col) : cover_general(m, row, col));
+  uint64_t* root = roots_of(m) + row;
+  if (m.nnz >= SM_MAX_ELEMENTS && !m.tree->find(m.tree, root, &col)) return SM_TOO_LARGE;
+  NonzeroNode* spare = m.spare_node;
+  spare->key = col;
+  spare->value = value;
+  NonzeroNode* node = m.tree->insert(m.tree, root, spare);
+  if (node == spare) return advance_spare(m);
+  node->value = add ? node->value + value : value;
+  return SM_OK;
+}
+
+}  // namespace sm

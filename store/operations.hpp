@@ -1,0 +1,23 @@
+// The operations of the store, behind the C boundary.
+#pragma once
+
+#include "frame/core.hpp"
+
+namespace sm {
+
+[[nodiscard]] SmStatus make(SmInstance& instance, SmMatrix*& matrix, std::int32_t kind, std::int32_t format);
+[[nodiscard]] SmStatus make_sized(SmInstance& instance, SmMatrix*& matrix, std::int32_t kind, std::int32_t format,
+                                  i64 rows, i64 cols);
+void reset(SmMatrix& m);
+[[nodiscard]] SmStatus resize(SmMatrix& m, i64 rows, i64 cols);
+[[nodiscard]] SmStatus tie(SmMatrix& m, double* data, i64 rows, i64 cols, std::int32_t kind, std::int32_t format);
+
+[[nodiscard]] SmStatus assign(SmMatrix& m, i64 row, i64 col, bool add, double value);
+[[nodiscard]] SmStatus get(SmMatrix& m, i64 row, i64 col, double& value);
+[[nodiscard]] SmStatus set_all(SmMatrix& m, double value);
+[[nodiscard]] SmStatus add_outer(SmMatrix& m, const double* z, const i64* index, i64 length, double weight);
+[[nodiscard]] SmStatus remove(SmMatrix& m, i64 row, i64 col);
+
+[[nodiscard]] SmStatus close(SmMatrix& m, double tolerance);
+
+}  // namespace sm
