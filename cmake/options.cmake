@@ -15,6 +15,8 @@ set(CMAKE_CXX_FLAGS_RELEASE "-O3 -DNDEBUG")
 add_library(qxesm_options INTERFACE)
 # The same bits on every CPU: no contraction of a*b + c into one rounding.
 target_compile_options(qxesm_options INTERFACE -Wall -Wextra -Wconversion -Wshadow -ffp-contract=off)
+# GCC's meaning of -Wconversion for C++, also where clang reads these flags (its own includes signs).
+target_compile_options(qxesm_options INTERFACE $<$<COMPILE_LANGUAGE:CXX>:-Wno-sign-conversion>)
 if(QXESM_WERROR)
   target_compile_options(qxesm_options INTERFACE -Werror)
 endif()
