@@ -1,0 +1,272 @@
+#include "avl/tree.hpp"
+
+namespace sm::avl {
+namespace {
+
+Side towards(std::int64_t key, const Node& node) { return key < node.key ? Side::left : Side::right; }
+
+// Turns the child on `side` up into the place of `top`, and returns it. Heights are the caller's business.
+Node* rotate(Node& top, Side side) {
+  Node& child = *target(top, side);
+  const Side inner = opposite(side);
+  // The subtree between the two changes hands; where it is empty, the two thread to each other.
+  if (has_child(child, inner)) {
+    set_child(top, side, target(child, inner));
+  } else {
+    set_thread(top, side, &child);
+  }
+  set_child(child, inner, &top);
+  return &child;
+}
+
+struct Balanced {
+  Node* top;
+  bool as_high_as_before;  // before the insertion or deletion that made the node two levels out
+};
+
+// Restores the balance of `top`, two levels higher on `side`; its bits still say one. Returns the subtree's new top.
+Balanced restore(Node& top, Side side) {
+  Node& child = *target(top, side);
+  const Side inner = opposite(side);
+  if (!is_higher(child, inner)) {
+    // An even child, which only a deletion can leave here, keeps the subtree's height and both nodes uneven.
+    const bool even = !is_higher(child, side);
+    rotate(top, side);
+    if (even) {
+      set_higher(top, side);
+      set_higher(child, inner);
+    } else {
+      set_even(top);
+      set_even(child);
+    }
+    return {&child, even};
+  }
+  Node& middle = *target(child, inner);
+  const bool to_side = is_higher(middle, side);
+  const bool to_inner = is_higher(middle, inner);
+  set_child(top, side, rotate(child, inner));
+  rotate(top, side);
+  set_even(top);
+  set_even(child);
+  set_even(middle);
+  if (to_side) set_higher(top, inner);
+  if (to_inner) set_higher(child, side);
+  return {&middle, false};
+}
+
+// Where a key is, or would be: the node that holds it, or else the neighbours of its gap (null past an end).
+struct Place {
+  Node* held;
+  Node* before;
+  Node* after;
+};
+
+Place descend(Word root, std::int64_t key) {
+  Node* node = node_at(root);
+  while (key != node->key) {
+    const Side side = towards(key, *node);
+    Node* next = target(*node, side);
+    if (!has_child(*node, side)) {
+      return side == Side::left ? Place{nullptr, next, node} : Place{nullptr, node, next};
+    }
+    node = next;
+  }
+  return {node, nullptr, nullptr};
+}
+
+// The place of `key` if it is at `node`, at a neighbour, or in a gap beside it; else by a descent.
+Place locate(Word root, std::int64_t key, Node* node) {
+  if (key == node->key) return {node, nullptr, nullptr};
+  const Side side = towards(key, *node);
+  Node* next = neighbour(node, side);
+  if (next && key == next->key) return {next, nullptr, nullptr};
+  if (next && towards(key, *next) == side) return descend(root, key);
+  return side == Side::left ? Place{nullptr, next, node} : Place{nullptr, node, next};
+}
+
+// The word that leads down to `node`, the top of a subtree that lies between `before` and `after`. Its parent is one of
+// these two: a left child's parent follows the subtree in key order, a right child's precedes it.
+Word& word_above(Word& root, const Node* node, Node* before, Node* after) {
+  if (node_at(root) == node) return root;
+  if (before && has_child(*before, Side::right) && target(*before, Side::right) == node) return before->right;
+  return after->left;
+}
+
+// Makes `child` what `above` leads to, without touching the tags.
+void replace_below(Word& above, const Node* child) { above = address_of(child) | (above & SM_LINK_BALANCE); }
+
+// Restores the balance after `node` came in as a leaf between its neighbours `before` and `after`.
+//
+// Parents are found through the threads: one of the two nodes beside a subtree is its parent, and the node beside the
+// parent's subtree is at the end of a walk down the sibling. The climb's k-th level costs a walk of at most k links.
+// Keys in ascending order climb the right edge of the tree. A node of that edge that is even when the climb reaches it
+// passes the climb on and leans right; reached again, it is rotated, which ends the climb and puts an even node at
+// that height. So of the climbs that reach one level at most every second, rounded up, reaches the next, and n
+// insertions cost no more than the sum of (k + 1)(n/2^k + 1) over the levels, O(n): a constant each. Descending keys
+// are the mirror image. In any order, one insertion stays below the square of the height.
+void grow(Word& root, Node* node, Node* before, Node* after) {
+  Node* top = node;
+  while (top != node_at(root)) {
+    const bool right_child = before && has_child(*before, Side::right) && target(*before, Side::right) == top;
+    const Side side = right_child ? Side::right : Side::left;
+    Node* parent = right_child ? before : after;
+    if (is_higher(*parent, opposite(side))) {
+      set_even(*parent);
+      return;
+    }
+    Node*& beside = right_child ? before : after;
+    beside = target(*outermost(parent, opposite(side)), opposite(side));
+    if (is_higher(*parent, side)) {
+      Word& above = word_above(root, parent, before, after);
+      replace_below(above, restore(*parent, side).top);
+      return;
+    }
+    set_higher(*parent, side);
+    top = parent;
+  }
+}
+
+// A tree of height h holds at least F(h + 2) - 1 nodes, F the Fibonacci numbers (Adelson-Velsky and Landis), which puts
+// h below 1.4405 log2(n + 2). Nodes take 32 of at most 2^64 bytes, so n < 2^59 and h < 86.
+constexpr int kMaxHeight = 96;
+
+// The way down from the root to a node that is about to be unlinked.
+struct Path {
+  struct Step {
+    Node* node;
+    Side side;
+  };
+  Word* root;
+  int length;
+  Step steps[kMaxHeight];
+
+  void push(Node* node, Side side) { steps[length++] = {node, side}; }
+  // The word that leads to the node of step i, or, for i = length, to the node below the last step.
+  Word& word_above(int i) { return i == 0 ? *root : link_of(*steps[i - 1].node, steps[i - 1].side); }
+};
+
+// Unlinks a node with at most one child. A lone child is a leaf, else the node would be out of balance.
+void unlink_edge(Path& path, Node* node) {
+  Word& above = path.word_above(path.length);
+  const bool left = has_child(*node, Side::left);
+  if (left || has_child(*node, Side::right)) {
+    const Side side = left ? Side::left : Side::right;
+    Node* child = target(*node, side);
+    set_thread(*child, opposite(side), target(*node, opposite(side)));
+    replace_below(above, child);
+  } else if (path.length == 0) {
+    above = 0;
+  } else {
+    const Path::Step& last = path.steps[path.length - 1];
+    set_thread(*last.node, last.side, target(*node, last.side));
+  }
+}
+
+// Unlinks a node with two children: its successor takes its place, so that no key moves from one node to another.
+void unlink_inner(Path& path, Node* node) {
+  const int place = path.length;
+  Node* predecessor = outermost(target(*node, Side::left), Side::right);
+  path.push(node, Side::right);
+  Node* successor = target(*node, Side::right);
+  while (has_child(*successor, Side::left)) {
+    path.push(successor, Side::left);
+    successor = target(*successor, Side::left);
+  }
+  if (path.length == place + 1) {
+    // The right child itself keeps its right link and takes the balance of the place that it moves up to.
+    const Word right = successor->right & ~SM_LINK_BALANCE;
+    successor->right = right | (node->right & SM_LINK_BALANCE);
+  } else {
+    Node* parent = path.steps[path.length - 1].node;
+    if (has_child(*successor, Side::right)) {
+      set_child(*parent, Side::left, target(*successor, Side::right));
+    } else {
+      set_thread(*parent, Side::left, successor);
+    }
+    successor->right = node->right;
+  }
+  successor->left = node->left;
+  set_thread(*predecessor, Side::right, successor);
+  replace_below(path.word_above(place), successor);
+  path.steps[place].node = successor;
+}
+
+// Restores the balance after the subtree below the last step became one level lower.
+void shrink(Path& path) {
+  for (int i = path.length - 1; i >= 0; --i) {
+    Node* node = path.steps[i].node;
+    const Side side = path.steps[i].side;
+    if (is_higher(*node, side)) {
+      set_even(*node);
+    } else if (!is_higher(*node, opposite(side))) {
+      set_higher(*node, opposite(side));
+      return;
+    } else {
+      const Balanced balanced = restore(*node, opposite(side));
+      replace_below(path.word_above(i), balanced.top);
+      if (balanced.as_high_as_before) return;
+    }
+  }
+}
+
+}  // namespace
+
+Node* insert(Word& root, Node& node, Hint& hint) {
+  if (root == 0) {
+    node.left = node.right = SM_LINK_THREAD;
+    root = address_of(&node);
+    hint = {&root, root, &node};
+    return &node;
+  }
+  const bool hinted = hint.root == &root && hint.word == root;
+  const Place place = hinted ? locate(root, node.key, hint.last) : descend(root, node.key);
+  Node* result = place.held;
+  if (!result) {
+    result = &node;
+    node.left = address_of(place.before) | SM_LINK_THREAD;
+    node.right = address_of(place.after) | SM_LINK_THREAD;
+    // Of two neighbours one lies below the other, and that one has its link towards the gap free.
+    if (place.before && !has_child(*place.before, Side::right)) {
+      set_child(*place.before, Side::right, &node);
+    } else {
+      set_child(*place.after, Side::left, &node);
+    }
+    grow(root, &node, place.before, place.after);
+  }
+  hint = {&root, root, result};
+  return result;
+}
+
+Node* find(Word root, std::int64_t key) {
+  Node* node = node_at(root);
+  while (node && key != node->key) {
+    const Side side = towards(key, *node);
+    node = has_child(*node, side) ? target(*node, side) : nullptr;
+  }
+  return node;
+}
+
+bool remove(Word& root, std::int64_t key, Hint& hint) {
+  Path path;
+  path.root = &root;
+  path.length = 0;
+  Node* node = node_at(root);
+  while (node && key != node->key) {
+    const Side side = towards(key, *node);
+    path.push(node, side);
+    node = has_child(*node, side) ? target(*node, side) : nullptr;
+  }
+  if (!node) return false;
+  hint = {};
+  if (has_child(*node, Side::left) && has_child(*node, Side::right)) {
+    unlink_inner(path, node);
+  } else {
+    unlink_edge(path, node);
+  }
+  shrink(path);
+  return true;
+}
+
+Node* first(Word root) { return root == 0 ? nullptr : outermost(node_at(root), Side::left); }
+
+}  // namespace sm::avl
