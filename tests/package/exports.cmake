@@ -1,0 +1,66 @@
+# Compares what a shared library defines and needs with what it may.
+#   cmake -DNM= -DREADELF= -DLIBRARY= -DLIST= [-DIMPORTS=ON] -P exports.cmake
+# LIST names every symbol that the library defines for others, one a line. With IMPORTS the symbols that it takes from
+# others are looked at too; instrumented builds cannot pass that.
+function(symbols_of out)
+  execute_process(COMMAND ${NM} -D --format=posix ${ARGN} ${LIBRARY}
+    OUTPUT_VARIABLE text RESULT_VARIABLE result)
+  if(NOT result EQUAL 0 OR text STREQUAL "")
+    message(FATAL_ERROR "${NM} ${ARGN} found nothing in ${LIBRARY} (exit ${result})")
+  endif()
+  string(REGEX MATCHALL "[^\n]+" lines "${text}")
+  list(TRANSFORM lines REPLACE "[ @].*" "")
+  list(SORT lines)
+  set(${out} ${lines} PARENT_SCOPE)
+endfunction()
+
+set(wrong "")
+symbols_of(defined --defined-only)
+file(STRINGS ${LIST} wanted)
+if(NOT wanted)
+  message(FATAL_ERROR "${LIST} is empty")
+endif()
+foreach(name IN LISTS defined)
+  if(NOT name IN_LIST wanted)
+    string(APPEND wrong "  defined but not listed: ${name}\n")
+  endif()
+endforeach()
+foreach(name IN LISTS wanted)
+  if(NOT name IN_LIST defined)
+    string(APPEND wrong "  listed but not defined: ${name}\n")
+  endif()
+endforeach()
+
+if(IMPORTS)
+  symbols_of(undefined --undefined-only)
+  # C++ linkage is operator new, containers, exceptions or run-time types of the C++ library; the rest is memory, output
+  # and threads that are the host's business.
+  set(forbidden "^(_Z.*|__cxa_(throw|rethrow|begin_catch|end_catch|allocate_exception)|__gxx_personality.*|_Unwind_.*|\
+__dynamic_cast|(malloc|calloc|realloc|free|aligned_alloc|posix_memalign|mmap)|(__)?v?[fds]?n?w?printf(_chk)?|\
+f?puts|f?putc|putchar|f?write|f?open|f?read|std(out|err|in)|getenv|pthread_.*|exit|_exit|abort|dl(open|sym))$")
+  foreach(name IN LISTS undefined)
+    if(name MATCHES "${forbidden}")
+      string(APPEND wrong "  imported but forbidden: ${name}\n")
+    endif()
+  endforeach()
+  execute_process(COMMAND ${READELF} -d ${LIBRARY} OUTPUT_VARIABLE text RESULT_VARIABLE result)
+  if(NOT result EQUAL 0)
+    message(FATAL_ERROR "${READELF} cannot read ${LIBRARY}")
+  endif()
+  string(REGEX MATCHALL "\\(NEEDED\\)[^\n]*\\[[^\n]*\\]" needed "${text}")
+  if(NOT needed)
+    message(FATAL_ERROR "${LIBRARY} needs no library at all: ${READELF} was misread")
+  endif()
+  foreach(line IN LISTS needed)
+    string(REGEX REPLACE ".*\\[(.*)\\]" "\\1" library "${line}")
+    if(NOT library MATCHES "^(lib([a-z]*blas|m|c|stdc\\+\\+|gcc_s)|ld-linux-x86-64)\\.so")
+      string(APPEND wrong "  needed but not allowed: ${library}\n")
+    endif()
+  endforeach()
+endif()
+
+if(wrong)
+  message(FATAL_ERROR "${LIBRARY}:\n${wrong}")
+endif()
+list(LENGTH defined count)
+message(STATUS "${LIBRARY} defines the ${count} symbols of the list")
