@@ -1,0 +1,127 @@
+// Everything happens in a copy of the triangle by columns, whatever the format: column k of R, of its inverse and of the
+// result are contiguous there, and the caller's array is written when nothing can fail any more.
+//
+// Inversion by R^-1 R^-T as in LAPACK's packed routines: Anderson et al., "LAPACK Users' Guide", 3rd ed., SIAM (1999).
+#include "cholesky/ginverse2.hpp"
+
+#include <algorithm>
+#include <cmath>
+
+#include "cholesky/steps.hpp"
+#include "forms/kernels.hpp"
+#include "frame/memory.hpp"
+#include "store/layouts.hpp"
+
+namespace sm {
+
+namespace {
+
+double* column(double* t, i64 k) { return t + k * (k + 1) / 2; }
+
+void load(const double* array, std::int32_t format, i64 n, double* t) {
+  with_packed(format, n, [&](auto layout) {
+    for (i64 c = 0; c < n; ++c) {
+      for (i64 r = 0; r <= c; ++r) column(t, c)[r] = array[layout.at(r, c)];
+    }
+  });
+}
+
+void store(const double* t, std::int32_t format, i64 n, double* array) {
+  with_packed(format, n, [&](auto layout) {
+    for (i64 c = 0; c < n; ++c) {
+      for (i64 r = 0; r <= c; ++r) array[layout.at(r, c)] = t[c * (c + 1) / 2 + r];
+    }
+  });
+}
+
+// A -> R, column by column: entry (i, k) needs columns i and k above row i. A dropped row i has r_ii = 0, and its entries
+// are set to 0.
+SmStatus to_factor(double* t, i64 n, double tolerance) {
+  for (i64 k = 0; k < n; ++k) {
+    double* rk = column(t, k);
+    for (i64 i = 0; i < k; ++i) {
+      const double* ri = column(t, i);
+      rk[i] = ri[i] > 0.0 ? (rk[i] - hzvdot11(ri, rk, i)) / ri[i] : 0.0;
+    }
+    const PivotLimits limits(rk[k], tolerance);
+    const double d = rk[k] - hzvdot11(rk, rk, k);
+    if (d > limits.accept) {
+      rk[k] = std::sqrt(d);
+    } else if (d < limits.refuse) {
+      return SM_NOT_DEFINITE;
+    } else {
+      rk[k] = 0.0;
+    }
+  }
+  return SM_OK;
+}
+
+void report(const double* t, i64 n, double& log_det, i64& rank) {
+  log_det = 0.0;
+  rank = 0;
+  for (i64 k = 0; k < n; ++k) {
+    const double r = t[k * (k + 1) / 2 + k];
+    if (!(r > 0.0)) continue;
+    log_det += 2.0 * std::log(r);
+    ++rank;
+  }
+}
+
+// R -> T, the inverse of its accepted block in place; rows and columns of dropped pivots become 0. Column k of T is
+// -T(above) R(:,k) / r_kk; row i of R is 0 where i is dropped, so no product reaches such a row.
+void invert_triangle(double* t, i64 n) {
+  for (i64 k = 0; k < n; ++k) {
+    double* tk = column(t, k);
+    if (!(tk[k] > 0.0)) {
+      std::fill_n(tk, k + 1, 0.0);
+      continue;
+    }
+    const double reciprocal = 1.0 / tk[k];
+    for (i64 j = 0; j < k; ++j) {  // column j of T, scaled by r_jk, ends at row j
+      const double r = tk[j];
+      const double* tj = column(t, j);
+      if (r != 0.0) hzvaxpy(tk, tk, tj, static_cast<std::int32_t>(j), r);
+      tk[j] = tj[j] * r;
+    }
+    for (i64 i = 0; i < k; ++i) tk[i] *= -reciprocal;
+    tk[k] = reciprocal;
+  }
+}
+
+// T -> T T': column k adds its outer product to the triangle before it, then becomes its own part of the result.
+void multiply_by_transpose(double* t, i64 n) {
+  for (i64 k = 0; k < n; ++k) {
+    double* tk = column(t, k);
+    for (i64 c = 0; c < k; ++c) {
+      if (tk[c] != 0.0) hzvaxpy(column(t, c), column(t, c), tk, static_cast<std::int32_t>(c + 1), tk[c]);
+    }
+    const double last = tk[k];
+    for (i64 i = 0; i <= k; ++i) tk[i] *= last;
+  }
+}
+
+}  // namespace
+
+SmStatus ginverse2(SmInstance* instance, double* array, i64 n, double* log_det, i64* rank, std::int32_t mode,
+                   double tolerance, std::int32_t format, std::int16_t* definite) {
+  Scratch<double> work;
+  SM_TRY(work.take(instance->pool, n * (n + 1) / 2));
+  double* t = work.data();
+  load(array, format, n, t);
+  if (mode != kPackedFactorToInverse) {
+    if (const SmStatus status = to_factor(t, n, tolerance); status != SM_OK) {
+      *definite = 0;
+      return status;
+    }
+  }
+  report(t, n, *log_det, *rank);
+  *definite = 1;
+  if (mode != kPackedFactor) {
+    invert_triangle(t, n);
+    multiply_by_transpose(t, n);
+  }
+  store(t, format, n, array);
+  return SM_OK;
+}
+
+}  // namespace sm
