@@ -11,6 +11,7 @@ install(TARGETS qxesm qxhost EXPORT qxesmTargets
 # Loaded by name, never linked.
 install(TARGETS qxeavl LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})
 if(TARGET qxsm)
+  set_target_properties(qxsm PROPERTIES INSTALL_RPATH "$ORIGIN/../${CMAKE_INSTALL_LIBDIR}")
   install(TARGETS qxsm RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
 endif()
 install(FILES ${PROJECT_SOURCE_DIR}/LICENSE DESTINATION ${CMAKE_INSTALL_DOCDIR})

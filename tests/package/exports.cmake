@@ -2,6 +2,7 @@
 #   cmake -DNM= -DREADELF= -DLIBRARY= -DLIST= [-DIMPORTS=ON] -P exports.cmake
 # LIST names every symbol that the library defines for others, one a line. With IMPORTS the symbols that it takes from
 # others are looked at too; instrumented builds cannot pass that.
+cmake_minimum_required(VERSION 3.25)
 function(symbols_of out)
   execute_process(COMMAND ${NM} -D --format=posix ${ARGN} ${LIBRARY}
     OUTPUT_VARIABLE text RESULT_VARIABLE result)
