@@ -1,0 +1,195 @@
+// Extensions: from a wide name to a shared library beside the host or on the search path, and to what its entry answers.
+#include <dlfcn.h>
+#include <link.h>
+#include <unistd.h>
+
+#include <cstdarg>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+
+#include "host/checker.hpp"
+
+namespace sm::host {
+namespace {
+
+constexpr std::int64_t kLongestName = 64;
+constexpr std::int32_t kInterfaceMajor = 5;
+
+using VersionEntry = std::int32_t (*)(HostServices* handle, std::int32_t* major, std::int32_t* minor);
+using ExtensionEntry = void* (*)(void* unused, void* owner);
+
+bool is_plain(wchar_t c) {
+  return (c >= L'a' && c <= L'z') || (c >= L'A' && c <= L'Z') || (c >= L'0' && c <= L'9') || c == L'_';
+}
+
+// The name in ASCII, so that it can be neither a path nor an option of the file system's encoding.
+bool narrow(const wchar_t* name, std::int64_t length, char (&ascii)[kLongestName + 1]) {
+  if (!name || length < 1 || length > kLongestName) return false;
+  for (std::int64_t i = 0; i < length; ++i) {
+    if (!is_plain(name[i])) return false;
+    ascii[i] = static_cast<char>(name[i]);
+  }
+  ascii[length] = '\0';
+  return true;
+}
+
+// The first file of that name on the search path. Whatever it is, no later one is tried: a broken installation is told,
+// not papered over by an older copy.
+bool locate(Loader& loader, const char* ascii, char (&file)[PATH_MAX]) {
+  for (const SearchPath* path = loader.paths; path; path = path->next) {
+    const int written = std::snprintf(file, sizeof file, "%s/lib%s.so", path->directory, ascii);
+    if (written > 0 && static_cast<std::size_t>(written) < sizeof file && access(file, F_OK) == 0) return true;
+  }
+  load_failed(loader, "lib%s.so: not found beside the host library%s", ascii,
+              loader.paths && loader.paths->next ? ", nor in the folders added to the search" : "");
+  return false;
+}
+
+// Keeps one handle of each library until the host goes.
+bool keep(Loader& loader, void* handle) {
+  for (const LoadedLibrary* library = loader.libraries; library; library = library->next) {
+    if (library->handle != handle) continue;
+    dlclose(handle);  // gives back the second count only
+    return true;
+  }
+  auto* library = static_cast<LoadedLibrary*>(std::malloc(sizeof(LoadedLibrary)));
+  if (!library) {
+    dlclose(handle);
+    return false;
+  }
+  *library = {loader.libraries, handle};
+  loader.libraries = library;
+  return true;
+}
+
+// A symbol that the library itself defines. dlsym also looks through what the library depends on, where a chance
+// namesake would be called as an entry.
+void* own_symbol(void* handle, const char* symbol) {
+  void* address = dlsym(handle, symbol);
+  if (!address) return nullptr;
+  link_map* library = nullptr;
+  link_map* definer = nullptr;
+  Dl_info info = {};
+  if (dlinfo(handle, RTLD_DI_LINKMAP, &library) != 0) return nullptr;
+  if (dladdr1(address, &info, reinterpret_cast<void**>(&definer), RTLD_DL_LINKMAP) == 0) return nullptr;
+  return definer == library ? address : nullptr;
+}
+
+const char* dl_cause() {
+  const char* cause = dlerror();
+  return cause ? cause : "unknown cause";
+}
+
+void* open_library(Loader& loader, const char* file) {
+  void* handle = dlopen(file, RTLD_NOW | RTLD_LOCAL);
+  if (!handle) return load_failed(loader, "%s: cannot be loaded: %s", file, dl_cause());
+  if (!keep(loader, handle)) return load_failed(loader, "%s: out of memory", file);
+  return handle;
+}
+
+// Hands over the services and calls the entry.
+void* start(QxHost& host, void* handle, const char* file, const char* ascii) {
+  Loader& loader = host.loader;
+  const auto version = reinterpret_cast<VersionEntry>(own_symbol(handle, "qxextver"));
+  if (!version) return load_failed(loader, "%s: has no qxextver", file);
+  const auto entry = reinterpret_cast<ExtensionEntry>(own_symbol(handle, ascii));
+  if (!entry) return load_failed(loader, "%s: has no entry %s", file, ascii);
+  std::int32_t major = 0;
+  std::int32_t minor = 0;
+  if (const std::int32_t answer = version(&host.services, &major, &minor); answer != 0) {
+    return load_failed(loader, "%s: its qxextver answered %d", file, answer);
+  }
+  if (major != kInterfaceMajor) {
+    return load_failed(loader, "%s: speaks interface %d.%d, this host speaks %d", file, major, minor, kInterfaceMajor);
+  }
+  const std::int64_t failures = loader.failures;
+  void* extension = entry(nullptr, nullptr);
+  if (extension) return extension;
+  if (loader.failures == failures) return load_failed(loader, "%s: its entry %s answered null", file, ascii);
+  char within[sizeof loader.error];  // it failed because one that it loads did
+  std::memcpy(within, loader.error, sizeof within);
+  return load_failed(loader, "%s: its entry %s answered null (%.*s)", file, ascii, PATH_MAX, within);
+}
+
+}  // namespace
+
+std::nullptr_t load_failed(Loader& loader, const char* format, ...) {
+  va_list arguments;
+  va_start(arguments, format);
+  std::vsnprintf(loader.error, sizeof loader.error, format, arguments);
+  va_end(arguments);
+  for (char* c = loader.error; *c; ++c) {
+    if (*c == '\n') *c = ' ';
+  }
+  ++loader.failures;
+  return nullptr;
+}
+
+bool add_search_path(Loader& loader, const char* directory) {
+  if (!directory || !*directory) return false;
+  auto* path = static_cast<SearchPath*>(std::calloc(1, sizeof(SearchPath)));
+  if (!path) return false;
+  path->directory = strdup(directory);
+  if (!path->directory) {
+    std::free(path);
+    return false;
+  }
+  SearchPath** link = &loader.paths;
+  while (*link) link = &(*link)->next;
+  *link = path;
+  return true;
+}
+
+bool begin_search_beside_host(Loader& loader) {
+  Dl_info self = {};
+  if (dladdr(reinterpret_cast<const void*>(&qxhost_create), &self) == 0 || !self.dli_fname) return false;
+  char file[PATH_MAX];
+  const int written = std::snprintf(file, sizeof file, "%s", self.dli_fname);
+  if (written < 0 || static_cast<std::size_t>(written) >= sizeof file) return false;
+  char* slash = std::strrchr(file, '/');
+  if (slash == file) return add_search_path(loader, "/");
+  if (slash) *slash = '\0';
+  // Made absolute now, because the program may change its working folder before it loads.
+  char* directory = realpath(slash ? file : ".", nullptr);
+  const bool added = add_search_path(loader, directory);
+  std::free(directory);
+  return added;
+}
+
+void* load_extension(QxHost& host, const wchar_t* name, std::int64_t length) {
+  Loader& loader = host.loader;
+  char ascii[kLongestName + 1];
+  if (!narrow(name, length, ascii)) {
+    return load_failed(loader, "extension name: 1 to %d letters, digits and underscores expected",
+                       static_cast<int>(kLongestName));
+  }
+  char file[PATH_MAX];
+  if (!locate(loader, ascii, file)) return nullptr;
+  void* handle = open_library(loader, file);
+  if (!handle) return nullptr;
+  void* extension = start(host, handle, file, ascii);
+  if (!extension || !host.checker || std::strcmp(ascii, "qxeavl") != 0) return extension;
+  auto* real = static_cast<TreeExtension*>(extension);
+  TreeExtension* watched = watch_trees(host, real);
+  if (!watched) {
+    real->destroy(real);
+    return load_failed(loader, "%s: out of memory", file);
+  }
+  return watched;
+}
+
+void unload_all(Loader& loader) {
+  while (LoadedLibrary* library = loader.libraries) {
+    loader.libraries = library->next;
+    dlclose(library->handle);
+    std::free(library);
+  }
+  while (SearchPath* path = loader.paths) {
+    loader.paths = path->next;
+    std::free(path->directory);
+    std::free(path);
+  }
+}
+
+}  // namespace sm::host
