@@ -24,3 +24,5 @@ extern "C" SmStatus qxsminvmultv(SmMatrix* matrix, const double* b, double* x, i
 extern "C" SmStatus qxsmsoldirect(SmMatrix* matrix, const double* b, double* x, int32_t count) {
   return sm::solve_direct(*matrix, b, x, count);
 }
+
+extern "C" SmStatus qxsminvdiag(SmMatrix* matrix, double* x) { return sm::inverse_diagonal(*matrix, x); }

@@ -2,6 +2,7 @@
 #include <algorithm>
 
 #include "cholesky/ginverse2.hpp"
+#include "cholesky/packed_triangle.hpp"
 #include "cholesky/steps.hpp"
 #include "forms/kernels.hpp"
 #include "store/checks.hpp"
@@ -50,45 +51,6 @@ class SparseSolve {
   const double* values_;
 };
 
-// A packed triangle R is stored in contiguous segments: by columns, segment k is R(0..k, k), by rows R(k, k..n-1). The
-// off-diagonal part of a segment either gives to component k (gather) or takes from it (scatter); R' and R swap roles.
-struct Segment {
-  const double* off;  // the entries off the diagonal
-  i64 first;          // the component that off[0] belongs to
-  i64 count;
-  double diagonal;
-};
-
-Segment segment(const PackedColumns& layout, const double* r, i64 k) {
-  return {r + layout.at(0, k), 0, k, r[layout.diagonal(k)]};
-}
-Segment segment(const PackedRows& layout, const double* r, i64 k) {
-  return {r + layout.diagonal(k) + 1, k + 1, layout.n - 1 - k, r[layout.diagonal(k)]};
-}
-
-// A dropped pivot passes its component on undivided.
-double divide(double y, double pivot) { return pivot > 0.0 ? y / pivot : y; }
-
-void gather(const Segment& s, double* y, i64 k) {
-  y[k] = divide(y[k] - hzvdot11(s.off, y + s.first, s.count), s.diagonal);
-}
-
-void scatter(const Segment& s, double* y, i64 k) {
-  y[k] = divide(y[k], s.diagonal);
-  hzvaxpy(y + s.first, y + s.first, s.off, static_cast<std::int32_t>(s.count), -y[k]);
-}
-
-template <class Layout>
-void solve_packed(const Layout& layout, const double* r, double* y) {
-  constexpr bool kByColumns = std::is_same_v<Layout, PackedColumns>;
-  for (i64 k = 0; k < layout.n; ++k) {
-    kByColumns ? gather(segment(layout, r, k), y, k) : scatter(segment(layout, r, k), y, k);
-  }
-  for (i64 k = layout.n - 1; k >= 0; --k) {
-    kByColumns ? scatter(segment(layout, r, k), y, k) : gather(segment(layout, r, k), y, k);
-  }
-}
-
 SmStatus substitute_packed(SmMatrix& m, const double* b, double* x, std::int32_t count) {
   Scratch<double> work;
   SM_TRY(need_pool(m));
@@ -96,7 +58,8 @@ SmStatus substitute_packed(SmMatrix& m, const double* b, double* x, std::int32_t
   with_packed(m.format, m.rows, [&](auto layout) {
     for (i64 v = 0; v < count; ++v) {
       std::copy_n(b + v * m.rows, m.rows, work.data());
-      solve_packed(layout, factor_array(m), work.data());
+      solve_transposed(layout, factor_array(m), work.data());
+      solve_upper(layout, factor_array(m), work.data(), m.rows - 1);
       std::copy_n(work.data(), m.rows, x + v * m.rows);
     }
   });

@@ -18,6 +18,7 @@ namespace sm {
 
 [[nodiscard]] SmStatus substitute(SmMatrix& m, const double* b, double* x, std::int32_t count);
 [[nodiscard]] SmStatus apply_inverse(SmMatrix& m, const double* b, double* x, i64 count);
+[[nodiscard]] SmStatus inverse_diagonal(SmMatrix& m, double* x);
 [[nodiscard]] SmStatus solve_direct(SmMatrix& m, const double* b, double* x, std::int32_t count);
 
 // The limits between which a pivot is dropped: accepted above |a| * tolerance, an error below the negative one.

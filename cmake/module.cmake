@@ -17,6 +17,7 @@ add_library(qxesm_objects OBJECT
   cholesky/dense.cpp
   cholesky/factor.cpp
   cholesky/ginverse2.cpp
+  cholesky/inverse_diagonal.cpp
   cholesky/numeric.cpp
   cholesky/ordering.cpp
   cholesky/reorder.cpp

@@ -10,7 +10,6 @@ extern "C" SmStatus qxsmIsDiag(SmMatrix*, int16_t*, double) { return SM_UNAVAILA
 extern "C" SmStatus qxsmclone(SmMatrix*, SmMatrix*, int32_t) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmconvert(SmMatrix*, SmMatrix*, int32_t) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmcopyv(const double*, SmMatrix*, int64_t, int64_t, int32_t, int32_t) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsminvdiag(SmMatrix*, double*) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmmultv(SmMatrix*, const double*, double*, int64_t, int64_t, int64_t, int64_t, int64_t, int32_t) {
   return SM_UNAVAILABLE;
 }

@@ -76,7 +76,10 @@ QXESM_API SmStatus qxsminvmultv(SmMatrix* matrix, const double* b, double* x, in
  * 101; 103; qxsmfact's; qxsmsubst's; 0. */
 QXESM_API SmStatus qxsmsoldirect(SmMatrix* matrix, const double* b, double* x, int32_t count);
 
-/* x <- diagonal of A^-, n doubles. Answers 124 in this release. */
+/* x <- the diagonal of A^-, factoring when needed; n doubles, in the matrix's own numbering. Rows of dropped pivots give 0.
+ * A diagonal matrix that has not been inverted answers its factor, the square roots of its elements, as it stands.
+ * Answers: 0 with nothing done (empty); 1; 113; 111; then, with x cleared: 124 (general); qxsmfact's; 101 (packed: n
+ * doubles of work); 0. Cost: n partial back substitutions. Uses the record's factor_scratch. */
 QXESM_API SmStatus qxsminvdiag(SmMatrix* matrix, double* x);
 
 #endif
