@@ -8,9 +8,6 @@
 
 namespace sm {
 
-namespace {
-
-// The array to factor: a fresh copy of the values in the separate array, or the values themselves.
 SmStatus choose_array(SmMatrix& m, bool in_place, double*& array) {
   if (in_place) {
     give_back(m.pool, m.dense_factor);
@@ -26,8 +23,6 @@ SmStatus choose_array(SmMatrix& m, bool in_place, double*& array) {
   array = m.dense_factor;
   return SM_OK;
 }
-
-}  // namespace
 
 SmStatus factor_packed(SmMatrix& m, bool in_place) {
   double* array = nullptr;

@@ -11,6 +11,9 @@ namespace sm {
 [[nodiscard]] SmStatus factor_numeric(SmMatrix& m);
 
 [[nodiscard]] SmStatus factor(SmMatrix& m, bool in_place);
+// The array of a packed or diagonal matrix that is to be factored or inverted: the values themselves (a separate array goes
+// back then), or a fresh copy of them in the separate array.
+[[nodiscard]] SmStatus choose_array(SmMatrix& m, bool in_place, double*& array);
 [[nodiscard]] SmStatus factor_packed(SmMatrix& m, bool in_place);
 [[nodiscard]] SmStatus factor_diagonal(SmMatrix& m, bool in_place);
 [[nodiscard]] SmStatus log_determinant(SmMatrix& m, double& out);

@@ -28,16 +28,6 @@ extern "C" SmStatus qxsminvbilin(SmMatrix*, const double*, const double*, double
 extern "C" SmStatus qxsmmults(SmMatrix*, double) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmmultm(SmMatrix*, SmMatrix*, SmMatrix*, int32_t) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmvaxpy(SmMatrix*, SmMatrix*, SmMatrix*, double, double) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmpivot(SmMatrix*, char*) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmcke(SmMatrix*, const double*, int32_t, int64_t*, int32_t*, char, double) {
-  return SM_UNAVAILABLE;
-}
-extern "C" SmStatus qxsmAddSS(SmMatrix*, SmMatrix*, double) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmUpdateGinv(SmMatrix*, SmMatrix*, SmMatrix*, int64_t, int64_t, double) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmAddGinv(SmMatrix*, SmMatrix*, SmMatrix*, int64_t, double, double) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsminv(SmMatrix*, int16_t, double) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmhermite(SmMatrix*, SmMatrix*) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmorth(SmMatrix*, const int16_t*, int64_t, int64_t, double) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmtrace(SmMatrix*, double*) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmtraceAB(SmMatrix*, SmMatrix*, double*) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmtraceinvAB(SmMatrix*, SmMatrix*, int64_t, double*) { return SM_UNAVAILABLE; }

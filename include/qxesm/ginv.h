@@ -21,6 +21,6 @@ QXESM_API SmStatus qxsminv(SmMatrix* a, int16_t in_place, double tolerance);
 /* H <- A^- A. */
 QXESM_API SmStatus qxsmhermite(SmMatrix* a, SmMatrix* h);
 /* Orthogonalises the flagged rows of a general sparse matrix; active has n flags. */
-QXESM_API SmStatus qxsmorth(SmMatrix* a, const int16_t* active, int64_t lo, int64_t hi, double tolerance);
+QXESM_API SmStatus qxsmorth(SmMatrix* a, int16_t* active, int64_t lo, int64_t hi, double tolerance);
 
 #endif
