@@ -104,9 +104,11 @@ void multiply_by_transpose(double* t, i64 n) {
 
 SmStatus ginverse2(SmInstance* instance, double* array, i64 n, double* log_det, i64* rank, std::int32_t mode,
                    double tolerance, std::int32_t format, std::int16_t* definite) {
+  // Order 1 is what a diagonal preconditioner asks for, once a row: it costs no allocation.
+  double single = 0.0;
   Scratch<double> work;
-  SM_TRY(work.take(instance->pool, n * (n + 1) / 2));
-  double* t = work.data();
+  if (n > 1) SM_TRY(work.take(instance->pool, n * (n + 1) / 2));
+  double* t = n > 1 ? work.data() : &single;
   load(array, format, n, t);
   if (mode != kPackedFactorToInverse) {
     if (const SmStatus status = to_factor(t, n, tolerance); status != SM_OK) {

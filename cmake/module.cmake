@@ -10,6 +10,7 @@ add_library(qxesm_objects OBJECT
   store/api.cpp
   store/assembly.cpp
   store/closing.cpp
+  store/extraction.cpp
   store/lifecycle.cpp
   store/nodes.cpp
   store/sizing.cpp
@@ -23,7 +24,17 @@ add_library(qxesm_objects OBJECT
   cholesky/reorder.cpp
   cholesky/solve.cpp
   cholesky/symbolic.cpp
-  forms/kernels.cpp)
+  forms/kernels.cpp
+  ginv/accumulation.cpp
+  ginv/addition.cpp
+  ginv/api.cpp
+  ginv/hermite.cpp
+  ginv/inversion.cpp
+  ginv/orthogonal.cpp
+  ginv/pivots.cpp
+  ginv/update.cpp
+  iterative/api.cpp
+  iterative/conjugate_gradients.cpp)
 target_include_directories(qxesm_objects PUBLIC ${PROJECT_SOURCE_DIR}/include PRIVATE ${PROJECT_SOURCE_DIR})
 target_compile_options(qxesm_objects PRIVATE $<$<COMPILE_LANGUAGE:CXX>:-fno-exceptions -fno-rtti>)
 target_link_libraries(qxesm_objects PRIVATE qxesm_options)

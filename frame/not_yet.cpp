@@ -1,12 +1,6 @@
 // Operations that this release declares but does not serve yet: each answers 124 and touches nothing.
 #include "frame/core.hpp"
 
-extern "C" SmStatus qxsmrow(SmMatrix*, int64_t, double*, int64_t) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmUpperRow(SmMatrix*, int64_t, double*) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmUpperSub(SmMatrix*, double*, int64_t, int64_t, int64_t, int64_t) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmdiag(SmMatrix*, double*, int64_t, int64_t) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmdense(SmMatrix*, double*, int16_t) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmIsDiag(SmMatrix*, int16_t*, double) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmclone(SmMatrix*, SmMatrix*, int32_t) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmconvert(SmMatrix*, SmMatrix*, int32_t) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmcopyv(const double*, SmMatrix*, int64_t, int64_t, int32_t, int32_t) { return SM_UNAVAILABLE; }
@@ -31,6 +25,3 @@ extern "C" SmStatus qxsmvaxpy(SmMatrix*, SmMatrix*, SmMatrix*, double, double) {
 extern "C" SmStatus qxsmtrace(SmMatrix*, double*) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmtraceAB(SmMatrix*, SmMatrix*, double*) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmtraceinvAB(SmMatrix*, SmMatrix*, int64_t, double*) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmsolioc(SmMatrix*, const double*, double*, int32_t, int64_t, int64_t*, double*, double) {
-  return SM_UNAVAILABLE;
-}
