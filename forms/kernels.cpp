@@ -1,6 +1,7 @@
 #include "forms/kernels.hpp"
 
 #include <climits>
+#include <cmath>
 
 extern "C" {
 double ddot_(const int* n, const double* x, const int* incx, const double* y, const int* incy);
@@ -40,6 +41,16 @@ double hzvdot11(const double* x, const double* y, i64 n) {
   if (n < kLongDot || n > INT_MAX) return lane_dot(x, y, n);  // a longer vector than the BLAS can count
   const int length = static_cast<int>(n);
   return ddot_(&length, x, &kUnit, y, &kUnit);
+}
+
+double zvamx(const double* x, i64 n) {
+  if (n < 1) return 0.0;
+  double largest = std::fabs(x[0]);
+  for (i64 i = 1; i < n; ++i) {
+    const double magnitude = std::fabs(x[i]);
+    largest = magnitude < largest ? largest : magnitude;
+  }
+  return largest;
 }
 
 }  // namespace sm

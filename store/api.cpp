@@ -60,3 +60,25 @@ extern "C" SmStatus qxsmzscp(SmMatrix* matrix, const double* z, const int64_t* i
 }
 
 extern "C" SmStatus qxsmclose(SmMatrix* matrix, double tolerance) { return sm::close(*matrix, tolerance); }
+
+extern "C" SmStatus qxsmrow(SmMatrix* matrix, int64_t row, double* out, int64_t start) {
+  return sm::row(*matrix, row, out, start);
+}
+
+extern "C" SmStatus qxsmUpperRow(SmMatrix* matrix, int64_t row, double* out) {
+  return sm::upper_row(*matrix, row, out);
+}
+
+extern "C" SmStatus qxsmUpperSub(SmMatrix* matrix, double* out, int64_t r0, int64_t r1, int64_t c0, int64_t c1) {
+  return sm::upper_block(*matrix, out, r0, r1, c0, c1);
+}
+
+extern "C" SmStatus qxsmdiag(SmMatrix* matrix, double* out, int64_t first, int64_t last) {
+  return sm::diagonal(*matrix, out, first, last);
+}
+
+extern "C" SmStatus qxsmdense(SmMatrix* matrix, double* out, int16_t mode) { return sm::dense(*matrix, out, mode); }
+
+extern "C" SmStatus qxsmIsDiag(SmMatrix* matrix, int16_t* flag, double tolerance) {
+  return sm::is_diagonal(*matrix, *flag, tolerance);
+}

@@ -20,4 +20,11 @@ void reset(SmMatrix& m);
 
 [[nodiscard]] SmStatus close(SmMatrix& m, double tolerance);
 
+[[nodiscard]] SmStatus row(SmMatrix& m, i64 row, double* out, i64 start);
+[[nodiscard]] SmStatus upper_row(SmMatrix& m, i64 row, double* out);
+[[nodiscard]] SmStatus upper_block(SmMatrix& m, double* out, i64 r0, i64 r1, i64 c0, i64 c1);
+[[nodiscard]] SmStatus diagonal(SmMatrix& m, double* out, i64 first, i64 last);
+[[nodiscard]] SmStatus dense(SmMatrix& m, double* out, std::int16_t mode);
+[[nodiscard]] SmStatus is_diagonal(SmMatrix& m, std::int16_t& flag, double tolerance);
+
 }  // namespace sm

@@ -14,9 +14,13 @@
 //
 // Each view has rows, cols;
 //   row(i, f)      f(j, value) for the stored entries of row i, in the order of the table
+//   line(k, f)     f(i, j, value) for the stored entries of the k-th of lines() lines in storage: a column where columns
+//                  are stored, else a row
 //   entries(f)     f(i, j, value) for every stored entry, in storage order
+//   any(f)         whether f(i, j, value) holds for one of them; lines after the first that has one are not looked at
 //   find(i, j)     the address of the stored element, or null; one_triangle views want i <= j, and UpperRows rows that have
 //                  not been reordered
+//   diagonal(i)    the address of the stored element (i, i), or null; in any order of the rows
 // Values are passed as double&, so that the same walk reads and writes.
 #pragma once
 
@@ -26,7 +30,25 @@
 
 namespace sm {
 
-struct TreeRows {
+template <class View>
+struct StoredLines {
+  template <class F>
+  void entries(F&& f) const {
+    const auto& view = static_cast<const View&>(*this);
+    for (i64 k = 0; k < view.lines(); ++k) view.line(k, f);
+  }
+  template <class F>
+  bool any(F&& f) const {
+    const auto& view = static_cast<const View&>(*this);
+    bool found = false;
+    for (i64 k = 0; k < view.lines() && !found; ++k) {
+      view.line(k, [&](i64 i, i64 j, double& v) { found = found || f(i, j, v); });
+    }
+    return found;
+  }
+};
+
+struct TreeRows : StoredLines<TreeRows> {
   static constexpr bool one_triangle = false;
   SmMatrix& m;
   i64 rows, cols;
@@ -37,20 +59,20 @@ struct TreeRows {
   void row(i64 i, F&& f) const {
     for (NonzeroNode* node = first_node(m, i); node; node = sm_node_next(node)) f(node->key, node->value);
   }
+  i64 lines() const { return rows; }
   template <class F>
-  void entries(F&& f) const {
-    for (i64 i = 0; i < rows; ++i) {
-      row(i, [&](i64 j, double& v) { f(i, j, v); });
-    }
+  void line(i64 i, F&& f) const {
+    row(i, [&](i64 j, double& v) { f(i, j, v); });
   }
   double* find(i64 i, i64 j) const {
     uint64_t* root = m.row_roots ? m.row_roots + i : nullptr;
     NonzeroNode* node = root && *root && m.tree ? m.tree->find(m.tree, root, &j) : nullptr;
     return node ? &node->value : nullptr;
   }
+  double* diagonal(i64 i) const { return find(i, i); }
 };
 
-struct FullArray {
+struct FullArray : StoredLines<FullArray> {
   static constexpr bool one_triangle = false;
   double* values;
   i64 rows, cols;
@@ -59,25 +81,23 @@ struct FullArray {
   explicit FullArray(SmMatrix& m) : values(m.values), rows(m.rows), cols(m.cols), layout(FullLayout::of(m)) {}
 
   double* find(i64 i, i64 j) const { return values + i * layout.row_step + j * layout.col_step; }
+  double* diagonal(i64 i) const { return find(i, i); }
   template <class F>
   void row(i64 i, F&& f) const {
     for (i64 j = 0; j < cols; ++j) f(j, *find(i, j));
   }
+  i64 lines() const { return layout.col_step == 1 ? rows : cols; }
   template <class F>
-  void entries(F&& f) const {
+  void line(i64 k, F&& f) const {
     if (layout.col_step == 1) {
-      for (i64 i = 0; i < rows; ++i) {
-        for (i64 j = 0; j < cols; ++j) f(i, j, *find(i, j));
-      }
+      for (i64 j = 0; j < cols; ++j) f(k, j, *find(k, j));
     } else {
-      for (i64 j = 0; j < cols; ++j) {
-        for (i64 i = 0; i < rows; ++i) f(i, j, *find(i, j));
-      }
+      for (i64 i = 0; i < rows; ++i) f(i, k, *find(i, k));
     }
   }
 };
 
-struct UpperRows {
+struct UpperRows : StoredLines<UpperRows> {
   static constexpr bool one_triangle = true;
   const i64* row_start;
   const i64* col_index;
@@ -91,11 +111,10 @@ struct UpperRows {
   void row(i64 i, F&& f) const {
     for (i64 p = row_start[i]; p < row_start[i + 1]; ++p) f(col_index[p], values[p]);
   }
+  i64 lines() const { return rows; }
   template <class F>
-  void entries(F&& f) const {
-    for (i64 i = 0; i < rows; ++i) {
-      row(i, [&](i64 j, double& v) { f(i, j, v); });
-    }
+  void line(i64 i, F&& f) const {
+    row(i, [&](i64 j, double& v) { f(i, j, v); });
   }
   double* find(i64 i, i64 j) const {
     const i64* first = col_index + row_start[i];
@@ -103,10 +122,11 @@ struct UpperRows {
     const i64* hit = std::lower_bound(first, last, j);
     return hit != last && *hit == j ? values + (hit - col_index) : nullptr;
   }
+  double* diagonal(i64 i) const { return values + row_start[i]; }
 };
 
 template <class Layout>
-struct Packed {
+struct Packed : StoredLines<Packed<Layout>> {
   static constexpr bool one_triangle = true;
   static constexpr bool by_columns = std::is_same_v<Layout, PackedColumns>;
   double* values;
@@ -116,24 +136,23 @@ struct Packed {
   Packed(double* array, i64 n) : values(array), rows(n), cols(n), layout{n} {}
 
   double* find(i64 i, i64 j) const { return values + layout.at(i, j); }
+  double* diagonal(i64 i) const { return values + layout.diagonal(i); }
   template <class F>
   void row(i64 i, F&& f) const {
     for (i64 j = i; j < cols; ++j) f(j, *find(i, j));
   }
+  i64 lines() const { return rows; }
   template <class F>
-  void entries(F&& f) const {
-    double* v = values;  // storage order
-    for (i64 k = 0; k < rows; ++k) {
-      if constexpr (by_columns) {
-        for (i64 i = 0; i <= k; ++i) f(i, k, *v++);
-      } else {
-        for (i64 j = k; j < cols; ++j) f(k, j, *v++);
-      }
+  void line(i64 k, F&& f) const {
+    if constexpr (by_columns) {
+      for (i64 i = 0; i <= k; ++i) f(i, k, *find(i, k));
+    } else {
+      for (i64 j = k; j < cols; ++j) f(k, j, *find(k, j));
     }
   }
 };
 
-struct DiagonalArray {
+struct DiagonalArray : StoredLines<DiagonalArray> {
   static constexpr bool one_triangle = false;
   double* values;
   i64 rows, cols;
@@ -141,13 +160,15 @@ struct DiagonalArray {
   explicit DiagonalArray(SmMatrix& m) : values(m.values), rows(m.rows), cols(m.cols) {}
 
   double* find(i64 i, i64 j) const { return i == j ? values + i : nullptr; }
+  double* diagonal(i64 i) const { return values + i; }
   template <class F>
   void row(i64 i, F&& f) const {
     f(i, values[i]);
   }
+  i64 lines() const { return rows; }
   template <class F>
-  void entries(F&& f) const {
-    for (i64 i = 0; i < rows; ++i) f(i, i, values[i]);
+  void line(i64 i, F&& f) const {
+    f(i, i, values[i]);
   }
 };
 

@@ -99,20 +99,53 @@ QXESM_API SmStatus qxsmzscp(SmMatrix* matrix, const double* z, const int64_t* in
  * 124; 0. Cost: one walk over the entries. */
 QXESM_API SmStatus qxsmclose(SmMatrix* matrix, double tolerance);
 
+/* out <- row `row` of A from column `start` on (a negative start is 0).
+ *   out  out  cols doubles, cleared first; absent entries are 0
+ *   symmetric   the part right of the diagonal is written whatever the start is; what lies left of it, columns start ..
+ *               row-1, is read from the earlier rows
+ *   diagonal    the diagonal element is written whatever the start is
+ * A start > 0 moves the block of columns start .. cols-1 (general, format 23) or start .. row (symmetric, format 22) to
+ * the beginning of out: column c is at out[c - start]. Every other layout keeps column c at out[c].
+ * Answers: 0 with nothing done (empty); 1; 113; 117 (row outside); then, out cleared: 118 (symmetric sparse, reordered:
+ * state > 2); 124; 0. Cost: the row; a search in each earlier row from `start` on for a symmetric sparse matrix. */
+QXESM_API SmStatus qxsmrow(SmMatrix* matrix, int64_t row, double* out, int64_t start);
+
+/* out <- the stored part of row `row` of a symmetric matrix in format 21 or 23: columns row .. n-1, at their own places.
+ *   out  out  n doubles, cleared first
+ * Answers: 0 with nothing done (empty); 1; 113; then, out cleared: 124 (not symmetric); 118 (sparse, state > 2);
+ * 124 (format 22); 117 (row outside); 0. */
+QXESM_API SmStatus qxsmUpperRow(SmMatrix* matrix, int64_t row, double* out);
+
+/* out <- rows r0 .. r1, columns c0 .. c1 of a symmetric sparse matrix, row-major; ranges are inclusive, r0 <= c0.
+ *   out  out  (r1-r0+1) x (c1-c0+1) doubles, cleared before any check (an empty range clears nothing)
+ * Each stored entry (i, j), i <= j, in the block is written at its place, and when c0 <= i < j also at
+ * (j - c0) * (c1-c0+1) + (i - r0), as far as that is inside out. With r0 == c0 these are the places below the diagonal,
+ * so a block on the diagonal is full; with r0 < c0 they are other ones, and an entry that shares its place with a later
+ * one (rows ascending, columns ascending within) is lost.
+ * Answers, out cleared: 0 (empty); 1; 113; 124 (not symmetric sparse); 118 (state > 2); 117 (an index outside
+ * 0 .. n-1, r0 > r1, c0 > c1, c0 < r0); 0. */
+QXESM_API SmStatus qxsmUpperSub(SmMatrix* matrix, double* out, int64_t r0, int64_t r1, int64_t c0, int64_t c1);
+
+/* out <- diagonal elements first .. last, indices below min(rows, cols); served in every state from 1 on.
+ *   out  out  last - first + 1 doubles
+ * Answers: 0 with nothing done (empty); 1; 113; 117 (an index outside, last < first); then, out cleared: 124; 0. */
+QXESM_API SmStatus qxsmdiag(SmMatrix* matrix, double* out, int64_t first, int64_t last);
+
+/* out <- the whole matrix; served in every state from 1 on.
+ *   mode  2: rows x cols, row-major, both triangles of a symmetric matrix
+ *         0, 1: a symmetric matrix packed as in format 22 and as in format 23; the n values of a diagonal matrix
+ *   out   out  rows*cols doubles for mode 2, else n(n+1)/2 (n for a diagonal matrix, rows*cols for a general one)
+ * Answers: 0 with nothing done (empty); 1; 113; 105 (more than 2^53 elements); then, out cleared: 124 (a general matrix
+ * in another mode than 2; another mode); 0. */
+QXESM_API SmStatus qxsmdense(SmMatrix* matrix, double* out, int16_t mode);
+
+/* *flag <- 1 when no stored off-diagonal element of a square matrix has |value| > tolerance (NaN: 0.0), else 0. Elements
+ * that are NaN count as small. Answers, with *flag 0: 0 (empty); for a diagonal matrix 0 with *flag 1, open or closed;
+ * 110 (kind none); 113; 121 (rows != cols); else 0. Cost: the entries up to the first large one. */
+QXESM_API SmStatus qxsmIsDiag(SmMatrix* matrix, int16_t* flag, double tolerance);
+
 /* The operations below answer 124 in this release. */
 
-/* out <- row `row` of A from column `start` on; out has cols doubles. */
-QXESM_API SmStatus qxsmrow(SmMatrix* matrix, int64_t row, double* out, int64_t start);
-/* out <- the stored part of row `row` of a symmetric matrix; out has cols doubles. */
-QXESM_API SmStatus qxsmUpperRow(SmMatrix* matrix, int64_t row, double* out);
-/* out <- a block of a symmetric sparse matrix, (r1-r0+1) x (c1-c0+1), row-major. */
-QXESM_API SmStatus qxsmUpperSub(SmMatrix* matrix, double* out, int64_t r0, int64_t r1, int64_t c0, int64_t c1);
-/* out <- diagonal elements first .. last. */
-QXESM_API SmStatus qxsmdiag(SmMatrix* matrix, double* out, int64_t first, int64_t last);
-/* out <- the whole matrix: mode 2 full, row-major; modes 0 and 1 a packed triangle. */
-QXESM_API SmStatus qxsmdense(SmMatrix* matrix, double* out, int16_t mode);
-/* *flag <- 1 when every stored off-diagonal entry is at or below the tolerance. */
-QXESM_API SmStatus qxsmIsDiag(SmMatrix* matrix, int16_t* flag, double tolerance);
 /* target <- source, same kind and format, with its factor. */
 QXESM_API SmStatus qxsmclone(SmMatrix* source, SmMatrix* target, int32_t reassemble);
 /* target <- source, across kinds and formats. */
