@@ -10,6 +10,7 @@ add_library(qxesm_objects OBJECT
   store/api.cpp
   store/assembly.cpp
   store/closing.cpp
+  store/copying.cpp
   store/extraction.cpp
   store/lifecycle.cpp
   store/nodes.cpp
@@ -25,6 +26,7 @@ add_library(qxesm_objects OBJECT
   cholesky/solve.cpp
   cholesky/symbolic.cpp
   forms/kernels.cpp
+  forms/sum.cpp
   ginv/accumulation.cpp
   ginv/addition.cpp
   ginv/api.cpp
@@ -34,7 +36,10 @@ add_library(qxesm_objects OBJECT
   ginv/pivots.cpp
   ginv/update.cpp
   iterative/api.cpp
-  iterative/conjugate_gradients.cpp)
+  iterative/conjugate_gradients.cpp
+  trace/api.cpp
+  trace/product.cpp
+  trace/trace.cpp)
 target_include_directories(qxesm_objects PUBLIC ${PROJECT_SOURCE_DIR}/include PRIVATE ${PROJECT_SOURCE_DIR})
 target_compile_options(qxesm_objects PRIVATE $<$<COMPILE_LANGUAGE:CXX>:-fno-exceptions -fno-rtti>)
 target_link_libraries(qxesm_objects PRIVATE qxesm_options)

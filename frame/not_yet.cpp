@@ -1,9 +1,6 @@
 // Operations that this release declares but does not serve yet: each answers 124 and touches nothing.
 #include "frame/core.hpp"
 
-extern "C" SmStatus qxsmclone(SmMatrix*, SmMatrix*, int32_t) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmconvert(SmMatrix*, SmMatrix*, int32_t) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmcopyv(const double*, SmMatrix*, int64_t, int64_t, int32_t, int32_t) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmmultv(SmMatrix*, const double*, double*, int64_t, int64_t, int64_t, int64_t, int64_t, int32_t) {
   return SM_UNAVAILABLE;
 }
@@ -21,7 +18,3 @@ extern "C" SmStatus qxsminvbilin(SmMatrix*, const double*, const double*, double
 }
 extern "C" SmStatus qxsmmults(SmMatrix*, double) { return SM_UNAVAILABLE; }
 extern "C" SmStatus qxsmmultm(SmMatrix*, SmMatrix*, SmMatrix*, int32_t) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmvaxpy(SmMatrix*, SmMatrix*, SmMatrix*, double, double) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmtrace(SmMatrix*, double*) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmtraceAB(SmMatrix*, SmMatrix*, double*) { return SM_UNAVAILABLE; }
-extern "C" SmStatus qxsmtraceinvAB(SmMatrix*, SmMatrix*, int64_t, double*) { return SM_UNAVAILABLE; }

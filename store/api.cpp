@@ -82,3 +82,16 @@ extern "C" SmStatus qxsmdense(SmMatrix* matrix, double* out, int16_t mode) { ret
 extern "C" SmStatus qxsmIsDiag(SmMatrix* matrix, int16_t* flag, double tolerance) {
   return sm::is_diagonal(*matrix, *flag, tolerance);
 }
+
+extern "C" SmStatus qxsmclone(SmMatrix* source, SmMatrix* target, int32_t reassemble) {
+  return sm::clone(*source, *target, reassemble != 0);
+}
+
+extern "C" SmStatus qxsmconvert(SmMatrix* source, SmMatrix* target, int32_t flag) {
+  return sm::convert(*source, *target, flag != 0);
+}
+
+extern "C" SmStatus qxsmcopyv(const double* values, SmMatrix* matrix, int64_t rows, int64_t cols, int32_t kind,
+                              int32_t format) {
+  return sm::load(values, *matrix, rows, cols, kind, format);
+}

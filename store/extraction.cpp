@@ -1,5 +1,5 @@
-// Reading a closed matrix into arrays: rows, blocks, the diagonal, the whole matrix. Outputs are cleared first and receive
-// stored values only, so that absent entries read as 0.
+// Reading a closed matrix into arrays: rows, blocks, the diagonal, the whole matrix. Outputs are cleared first and
+// receive stored values only, so that absent entries read as 0.
 //
 //                 general 21, 22, 23   symmetric 21        symmetric 22, 23   diagonal
 //   row           yes                  up to state 2, 118  yes                yes
@@ -46,8 +46,8 @@ void fill_row(const View& view, i64 row, double* out, i64 start) {
 // The only element of a row is there whatever the start.
 void fill_row(const DiagonalArray& view, i64 row, double* out, i64) { out[row] = view.values[row]; }
 
-// Two layouts keep the part of a row from `start` on in one block, and that block lands at the beginning of `out`, not at
-// its own columns. Callers know it, so it stays: where the block ends, or 0 for the layouts that do not move it.
+// Two layouts keep the part of a row from `start` on in one block, and that block lands at the beginning of `out`, not
+// at its own columns. Callers know it, so it stays: where the block ends, or 0 for the layouts that do not move it.
 i64 moved_block_end(const SmMatrix& m, i64 row) {
   if (m.kind == SM_KIND_GENERAL && m.format == SM_FORMAT_ROWS) return m.cols;
   if (m.kind == SM_KIND_SYMMETRIC && m.format == SM_FORMAT_COLUMNS) return row + 1;
@@ -93,8 +93,8 @@ i64 block_size(i64 r0, i64 r1, i64 c0, i64 c1) {
 }
 
 // Entries of the block, each also at its mirrored place when its row is one of the block's columns. That place counts
-// from the corner (c0, r0), which is the block's own corner only when r0 == c0; it may lie behind the block, and may then
-// share its place with another entry: the later one stays.
+// from the corner (c0, r0), which is the block's own corner only when r0 == c0; it may lie behind the block, and may
+// then share its place with another entry: the later one stays.
 void fill_upper_block(const UpperRows& view, double* out, i64 r0, i64 r1, i64 c0, i64 c1) {
   const i64 width = extent(c0, c1);
   const i64 size = block_size(r0, r1, c0, c1);

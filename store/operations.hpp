@@ -1,7 +1,7 @@
 // The operations of the store, behind the C boundary.
 #pragma once
 
-#include "frame/core.hpp"
+#include "store/checks.hpp"
 
 namespace sm {
 
@@ -26,5 +26,13 @@ void reset(SmMatrix& m);
 [[nodiscard]] SmStatus diagonal(SmMatrix& m, double* out, i64 first, i64 last);
 [[nodiscard]] SmStatus dense(SmMatrix& m, double* out, std::int16_t mode);
 [[nodiscard]] SmStatus is_diagonal(SmMatrix& m, std::int16_t& flag, double tolerance);
+
+// What the operations that do not answer for an empty matrix first ask of an operand: an empty symmetric sparse one has
+// no compressed rows to look for.
+inline bool is_closed_or_empty(const SmMatrix& m) { return m.nnz < 1 ? m.state >= SM_STATE_CLOSED : is_closed(m); }
+[[nodiscard]] SmStatus clone(SmMatrix& source, SmMatrix& target, bool reassemble);
+[[nodiscard]] SmStatus convert(SmMatrix& source, SmMatrix& target, bool reassemble);
+[[nodiscard]] SmStatus load(const double* values, SmMatrix& m, i64 rows, i64 cols, std::int32_t kind,
+                            std::int32_t format);
 
 }  // namespace sm

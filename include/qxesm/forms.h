@@ -27,7 +27,13 @@ QXESM_API SmStatus qxsminvbilin(SmMatrix* a, const double* x, const double* y, d
 QXESM_API SmStatus qxsmmults(SmMatrix* a, double s);
 /* C <- A B. */
 QXESM_API SmStatus qxsmmultm(SmMatrix* a, SmMatrix* b, SmMatrix* c, int32_t keep);
-/* C <- A + scale B. */
+/* C <- A + scale B for two closed matrices of one shape: qxsmconvert(A, C, 1), then qxsmAddGinv(C, B, null, 0, scale,
+ * tolerance), which says what may be added to what and what the tolerance drops. C may be A: then B is added in place,
+ * and only the checks of qxsmAddGinv are made.
+ * A symmetric sparse C is left open when A is symmetric sparse too (close it to read it); filled from any other A it is
+ * closed by the conversion, and adding answers 119.
+ * Answers: 104 (C is B); 1 (any of kind none); 113 (A or B); 121 (A and B differ in shape); those of qxsmconvert; those
+ * of qxsmAddGinv; 0. After a refusal of those two C holds what they leave. */
 QXESM_API SmStatus qxsmvaxpy(SmMatrix* c, SmMatrix* a, SmMatrix* b, double scale, double tolerance);
 
 #endif

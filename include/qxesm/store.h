@@ -110,7 +110,8 @@ QXESM_API SmStatus qxsmclose(SmMatrix* matrix, double tolerance);
  * state > 2); 124; 0. Cost: the row; a search in each earlier row from `start` on for a symmetric sparse matrix. */
 QXESM_API SmStatus qxsmrow(SmMatrix* matrix, int64_t row, double* out, int64_t start);
 
-/* out <- the stored part of row `row` of a symmetric matrix in format 21 or 23: columns row .. n-1, at their own places.
+/* out <- the stored part of row `row` of a symmetric matrix in format 21 or 23: columns row .. n-1, at their own
+ * places.
  *   out  out  n doubles, cleared first
  * Answers: 0 with nothing done (empty); 1; 113; then, out cleared: 124 (not symmetric); 118 (sparse, state > 2);
  * 124 (format 22); 117 (row outside); 0. */
@@ -139,18 +140,45 @@ QXESM_API SmStatus qxsmdiag(SmMatrix* matrix, double* out, int64_t first, int64_
  * in another mode than 2; another mode); 0. */
 QXESM_API SmStatus qxsmdense(SmMatrix* matrix, double* out, int16_t mode);
 
-/* *flag <- 1 when no stored off-diagonal element of a square matrix has |value| > tolerance (NaN: 0.0), else 0. Elements
- * that are NaN count as small. Answers, with *flag 0: 0 (empty); for a diagonal matrix 0 with *flag 1, open or closed;
- * 110 (kind none); 113; 121 (rows != cols); else 0. Cost: the entries up to the first large one. */
+/* *flag <- 1 when no stored off-diagonal element of a square matrix has |value| > tolerance (NaN: 0.0), else 0.
+ * Elements that are NaN count as small. Answers, with *flag 0: 0 (empty); for a diagonal matrix 0 with *flag 1, open or
+ * closed; 110 (kind none); 113; 121 (rows != cols); else 0. Cost: the entries up to the first large one. */
 QXESM_API SmStatus qxsmIsDiag(SmMatrix* matrix, int16_t* flag, double tolerance);
 
-/* The operations below answer 124 in this release. */
-
-/* target <- source, same kind and format, with its factor. */
+/* target <- source, of the same kind and format. The target, typed with qxsmnew, is sized first; it takes the user word
+ * too. The two share no array.
+ *   symmetric sparse  reassemble 0: rows, ordering and factor as they are, with state, rank, log_det and definite, so
+ *                     that a factored matrix is factored in the copy; else the entries are assigned to the open target,
+ *                     in the caller's order whatever the source's: state 0, and more can be added
+ *   general sparse    the entries; state 1
+ *   dense, diagonal   the values; state 1, no factor
+ * The same record twice answers 0 and nothing happens.
+ * Answers: 1 (source of kind none); 113; those of qxsmresize (1 for a target of kind none); 0 (source empty: the target
+ * is empty too; a symmetric sparse one takes its state unless reassemble is set); 110 (kind or format differ; the
+ * target is sized); 101 (the target keeps what was entered, a symmetric sparse one its zero diagonal, open); 0.
+ * Cost: the size of the storage; one insertion for each entry that goes into trees. */
 QXESM_API SmStatus qxsmclone(SmMatrix* source, SmMatrix* target, int32_t reassemble);
-/* target <- source, across kinds and formats. */
+
+/* target <- source, across kinds and formats. The target, typed with qxsmnew, is sized first.
+ *   from general into general, from symmetric into general (both triangles) and symmetric, from diagonal into all
+ *   three; in any formats. The same kind and format: qxsmclone(source, target, flag).
+ * Every stored value of the source is entered, zeros included. A symmetric sparse source may be ordered or factored. A
+ * symmetric sparse target is closed with tolerance 0.0, every other target is closed by its sizing; no factor is
+ * copied. The same record twice answers 0 and nothing happens.
+ * Answers: 1 (source of kind none); 113; those of qxsmresize (1 for a target of kind none, 111 for a symmetric or
+ * diagonal one and a source that is not square); 124 (no such pair; the target is sized); the first of qxsmassign that
+ * is not 0; those of qxsmclose; 0. Cost: one assignment for each stored value. */
 QXESM_API SmStatus qxsmconvert(SmMatrix* source, SmMatrix* target, int32_t flag);
-/* values -> the dense values of a matrix, which is rebuilt when its shape differs. */
+
+/* values -> the value array of a dense or diagonal matrix. When kind, format, rows or cols differ, or there are no
+ * values because a sizing failed, the matrix is first emptied, typed again in its instance (its pools go back; the
+ * record stays) and sized: state 1.
+ *   values  in   rows*cols (general), n(n+1)/2 (symmetric) or n (diagonal) doubles in the layout of the format
+ * Without that, the state stays and rank and log-determinant are voided: a separate factor or inverse array that is
+ * there stays too and belongs to the old values.
+ * Answers: 0 with nothing done (values null); 124 (format 21); 104 (values is the matrix's own array and would be given
+ * back); then, unless the shape fits: 1 (the matrix is of kind none), those of qxsmnew (101, 116, 124: the record is
+ * left with kind none), those of qxsmresize (the matrix is left with what that leaves); 0. Cost: one copy. */
 QXESM_API SmStatus qxsmcopyv(const double* values, SmMatrix* matrix, int64_t rows, int64_t cols, int32_t kind,
                              int32_t format);
 
