@@ -33,7 +33,8 @@ QXESM_API SmStatus qxsmmultm(SmMatrix* a, SmMatrix* b, SmMatrix* c, int32_t keep
  * A symmetric sparse C is left open when A is symmetric sparse too (close it to read it); filled from any other A it is
  * closed by the conversion, and adding answers 119.
  * Answers: 104 (C is B); 1 (any of kind none); 113 (A or B); 121 (A and B differ in shape); those of qxsmconvert; those
- * of qxsmAddGinv; 0. After a refusal of those two C holds what they leave. */
+ * of qxsmAddGinv (0 with nothing added when A has no stored entries: C is then as empty as A); 0. After a refusal of
+ * those two C holds what they leave. */
 QXESM_API SmStatus qxsmvaxpy(SmMatrix* c, SmMatrix* a, SmMatrix* b, double scale, double tolerance);
 
 #endif
