@@ -5,7 +5,6 @@ find_package(BLAS REQUIRED)
 add_library(qxesm_objects OBJECT
   frame/entry.cpp
   frame/instance.cpp
-  frame/not_yet.cpp
   frame/table.cpp
   store/api.cpp
   store/assembly.cpp
@@ -25,8 +24,15 @@ add_library(qxesm_objects OBJECT
   cholesky/reorder.cpp
   cholesky/solve.cpp
   cholesky/symbolic.cpp
+  forms/api.cpp
+  forms/inverse_forms.cpp
   forms/kernels.cpp
+  forms/multiply.cpp
+  forms/products.cpp
+  forms/quadratic.cpp
+  forms/scaling.cpp
   forms/sum.cpp
+  forms/vector_forms.cpp
   ginv/accumulation.cpp
   ginv/addition.cpp
   ginv/api.cpp

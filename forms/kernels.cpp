@@ -3,6 +3,8 @@
 #include <climits>
 #include <cmath>
 
+#include "forms/lanes.hpp"
+
 extern "C" {
 double ddot_(const int* n, const double* x, const int* incx, const double* y, const int* incy);
 void daxpy_(const int* n, const double* a, const double* x, const int* incx, double* y, const int* incy);
@@ -15,17 +17,6 @@ namespace {
 constexpr std::int32_t kLongSum = 250;
 constexpr i64 kLongDot = 500;
 constexpr int kUnit = 1;
-
-// The lanes are ours, not the vector unit's, so that every CPU gives the same bits.
-double lane_dot(const double* x, const double* y, i64 n) {
-  double s[8] = {};
-  i64 i = 0;
-  for (; i + 8 <= n; i += 8) {
-    for (int lane = 0; lane < 8; ++lane) s[lane] += x[i + lane] * y[i + lane];
-  }
-  for (int lane = 0; i < n; ++i, ++lane) s[lane] += x[i] * y[i];
-  return ((s[0] + s[4]) + (s[2] + s[6])) + ((s[1] + s[5]) + (s[3] + s[7]));
-}
 
 }  // namespace
 
