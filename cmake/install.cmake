@@ -1,8 +1,5 @@
 # What `cmake --install` leaves behind: headers, libraries, the command, and the two ways in which other builds find
 # them. Nothing in it names the prefix, so the tree can be moved.
-if(NOT TARGET qxhost OR NOT TARGET qxeavl)
-  return()
-endif()
 include(CMakePackageConfigHelpers)
 
 install(TARGETS qxesm qxhost EXPORT qxesmTargets
