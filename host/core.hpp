@@ -1,4 +1,4 @@
-// The host object and what its parts share. Nothing here throws: memory comes from malloc and mmap, and null is checked.
+// The host object and what its parts share. Nothing here throws: memory comes from malloc and mmap, null is checked.
 #pragma once
 
 #include <qxhost/qxhost.h>

@@ -1,4 +1,4 @@
-// Extensions: from a wide name to a shared library beside the host or on the search path, and to what its entry answers.
+// Extensions: from a wide name to a shared library beside the host or on the search path, and to its entry's answer.
 #include <dlfcn.h>
 #include <link.h>
 #include <unistd.h>
