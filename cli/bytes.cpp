@@ -16,7 +16,6 @@
 namespace sm::cli {
 namespace {
 
-constexpr std::size_t kInputSize = 256 * 1024;
 constexpr int kGzipWindow = 15 + 16;  // zlib's way of saying: the largest window, and a gzip header
 
 }  // namespace
@@ -58,7 +57,8 @@ std::size_t MemoryBytes::read(char* out, std::size_t size) {
   return count;
 }
 
-GunzipBytes::GunzipBytes(ByteSource& inner) : inner_(inner), input_(kInputSize) {
+GunzipBytes::GunzipBytes(ByteSource& inner, std::size_t buffer)
+    : inner_(inner), input_(std::make_unique_for_overwrite<char[]>(buffer)), input_size_(buffer) {
   if (!has_magic()) return;
   stream_ = std::make_unique<z_stream>();
   if (inflateInit2(stream_.get(), kGzipWindow) != Z_OK) throw std::bad_alloc();
@@ -70,12 +70,11 @@ GunzipBytes::~GunzipBytes() {
 
 bool GunzipBytes::refill() {
   if (input_begin_ > 0) {
-    std::copy(input_.begin() + static_cast<std::ptrdiff_t>(input_begin_),
-              input_.begin() + static_cast<std::ptrdiff_t>(input_end_), input_.begin());
+    std::memmove(input_.get(), input_.get() + input_begin_, input_end_ - input_begin_);
     input_end_ -= input_begin_;
     input_begin_ = 0;
   }
-  const std::size_t got = inner_.read(input_.data() + input_end_, input_.size() - input_end_);
+  const std::size_t got = inner_.read(input_.get() + input_end_, input_size_ - input_end_);
   input_end_ += got;
   return got > 0;
 }
@@ -97,7 +96,7 @@ std::size_t GunzipBytes::read(char* out, std::size_t size) {
       trouble_ = "the gzip data end early";
       break;
     }
-    stream_->next_in = reinterpret_cast<Bytef*>(input_.data() + input_begin_);
+    stream_->next_in = reinterpret_cast<Bytef*>(input_.get() + input_begin_);
     stream_->avail_in = static_cast<uInt>(input_end_ - input_begin_);
     const int answer = inflate(stream_.get(), Z_NO_FLUSH);
     input_begin_ = input_end_ - stream_->avail_in;
@@ -114,7 +113,7 @@ std::size_t GunzipBytes::read(char* out, std::size_t size) {
 std::size_t GunzipBytes::read_plain(char* out, std::size_t size) {
   if (input_begin_ == input_end_) return inner_.read(out, size);
   const std::size_t count = std::min(size, input_end_ - input_begin_);
-  std::memcpy(out, input_.data() + input_begin_, count);
+  std::memcpy(out, input_.get() + input_begin_, count);
   input_begin_ += count;
   return count;
 }

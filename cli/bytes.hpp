@@ -9,7 +9,6 @@
 #include <memory>
 #include <span>
 #include <string>
-#include <vector>
 
 namespace sm::cli {
 
@@ -57,7 +56,7 @@ class MemoryBytes : public ByteSource {
 // The bytes of another source; when they begin like gzip data (by content, not by name), what they decompress to.
 class GunzipBytes : public ByteSource {
  public:
-  explicit GunzipBytes(ByteSource& inner);
+  GunzipBytes(ByteSource& inner, std::size_t buffer);
   ~GunzipBytes() override;
   GunzipBytes(const GunzipBytes&) = delete;
   GunzipBytes& operator=(const GunzipBytes&) = delete;
@@ -71,7 +70,8 @@ class GunzipBytes : public ByteSource {
   bool has_magic();
 
   ByteSource& inner_;
-  std::vector<char> input_;
+  std::unique_ptr<char[]> input_;
+  std::size_t input_size_;
   std::size_t input_begin_ = 0;
   std::size_t input_end_ = 0;
   std::unique_ptr<z_stream> stream_;  // null for plain bytes

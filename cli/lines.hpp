@@ -2,9 +2,9 @@
 #pragma once
 
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <string_view>
-#include <vector>
 
 #include "cli/bytes.hpp"
 
@@ -12,8 +12,8 @@ namespace sm::cli {
 
 class LineReader {
  public:
-  // No line may be longer than `capacity` - 1 bytes.
-  explicit LineReader(ByteSource& source, std::string name, std::size_t capacity = kDefaultCapacity);
+  // Reads through a buffer of that size, which no line may fill.
+  LineReader(ByteSource& source, std::string name, std::size_t buffer);
 
   // The next line, without its line feed (a carriage return before it stays; it counts as a blank). False at the end.
   // The view holds until the next call.
@@ -25,12 +25,12 @@ class LineReader {
   bool unterminated() const { return unterminated_; }  // the line last read ended with the file, without a line feed
 
  private:
-  static constexpr std::size_t kDefaultCapacity = 1024 * 1024;
   bool refill();
 
   ByteSource& source_;
   std::string name_;
-  std::vector<char> buffer_;
+  std::unique_ptr<char[]> buffer_;
+  std::size_t size_;
   std::size_t begin_ = 0;
   std::size_t end_ = 0;
   std::int64_t number_ = 0;

@@ -38,6 +38,7 @@ Report run_command(const Options& options) {
 
 ExitCode print(const Options& options, const Report& report) {
   const bool taken = output_is_taken(options);
+  if (taken && options.command == Command::grid) return report.code();  // there is nothing to say beside the grid
   const int file = taken ? STDERR_FILENO : STDOUT_FILENO;
   const std::string text = options.common.json ? report.json() : options.common.quiet ? "" : report.text();
   write_all(file, text, taken ? "standard error" : "standard output");

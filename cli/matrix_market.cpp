@@ -208,9 +208,9 @@ void DataReader::run() {
 
 }  // namespace
 
-Header read_matrix_market(ByteSource& source, const std::string& name, EntrySink& sink) {
-  GunzipBytes bytes(source);
-  LineReader lines(bytes, name);
+Header read_matrix_market(ByteSource& source, const std::string& name, EntrySink& sink, std::size_t buffer) {
+  GunzipBytes bytes(source, buffer);
+  LineReader lines(bytes, name, buffer);
   const Header header = read_header(lines);
   sink.begin(header);
   DataReader(lines, header, sink).run();

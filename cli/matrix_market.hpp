@@ -35,6 +35,8 @@ struct Entry {
   double value;
 };
 
+constexpr std::size_t kReadBuffer = 256 * 1024;
+
 class EntrySink {
  public:
   virtual ~EntrySink() = default;
@@ -45,7 +47,9 @@ class EntrySink {
 
 // Reads one matrix to the end of the source. Throws CommandError, naming `name` and the line, at the first thing that is
 // not as it must be: a header of another kind, a wrong number of fields, an index outside the matrix, a value that is no
-// finite number, entries on both sides of the diagonal of a symmetric file, too few or too many entries.
-Header read_matrix_market(ByteSource& source, const std::string& name, EntrySink& sink);
+// finite number, entries on both sides of the diagonal of a symmetric file, too few or too many entries, a line that fills
+// the buffer.
+Header read_matrix_market(ByteSource& source, const std::string& name, EntrySink& sink,
+                          std::size_t buffer = kReadBuffer);
 
 }  // namespace sm::cli
