@@ -86,34 +86,42 @@ class Allocation : public ::testing::TestWithParam<HostKind> {
 };
 
 TEST_P(Allocation, typing_a_new_record_needs_a_record_a_registry_a_pool_and_perhaps_a_tree) {
+  struct Problem {
+    SmMatrix* m;
+    std::int64_t pools;
+  };
   for (const Shape shape : kShapes) {
     SCOPED_TRACE(name_of(shape));
-    const auto create = [shape](Session& session, SmMatrix*& m) {
-      return session.fn().qxsmnew(session.instance(), &m, shape.kind, shape.format);
+    const auto create = [shape](Session& session, Problem& p) {
+      return session.fn().qxsmnew(session.instance(), &p.m, shape.kind, shape.format);
     };
-    const std::int64_t requests =
-        each_request_refused([](Session&) { return static_cast<SmMatrix*>(nullptr); }, create,
-                             [&](Session& session, SmMatrix*& m, SmStatus status, std::int64_t request) {
-                               SmInstance* instance = session.instance();
-                               if (request == 3) {  // a missing tree manager is found by the first entry
-                                 EXPECT_EQ(status, SM_OK);
-                                 ASSERT_NE(m, nullptr);
-                                 EXPECT_EQ(m->tree, nullptr);
-                                 return;
-                               }
-                               EXPECT_EQ(status, SM_NO_MEMORY);
-                               EXPECT_EQ(m, nullptr);
-                               EXPECT_EQ(session.host().live_pools(), 2) << "the extension's and the instance's";
-                               EXPECT_EQ(instance->matrix_count, request < 2 ? 0 : 1);
-                               if (request == 2) {
-                                 ASSERT_NE(instance->registry[0], nullptr);
-                                 EXPECT_EQ(instance->registry[0]->kind, SM_KIND_NONE);
-                                 EXPECT_EQ(instance->registry[0]->pool, nullptr);
-                               }
-                               EXPECT_EQ(create(session, m), SM_OK);
-                               EXPECT_EQ(m->registry_index, request < 2 ? 1 : 2);
-                             });
-    EXPECT_EQ(requests, is_sparse(shape) ? 4 : 3);
+    const std::int64_t requests = each_request_refused(
+        [](Session& session) {
+          return Problem{nullptr, session.host().live_pools()};
+        },
+        create,
+        [&](Session& session, Problem& p, SmStatus status, std::int64_t request) {
+          SmInstance* instance = session.instance();
+          if (request >= 3) {  // a missing tree manager is found by the first entry
+            EXPECT_EQ(status, SM_OK);
+            ASSERT_NE(p.m, nullptr);
+            EXPECT_EQ(p.m->tree, nullptr);
+            return;
+          }
+          EXPECT_EQ(status, SM_NO_MEMORY);
+          EXPECT_EQ(p.m, nullptr);
+          EXPECT_EQ(session.host().live_pools(), p.pools);
+          EXPECT_EQ(instance->matrix_count, request < 2 ? 0 : 1);
+          if (request == 2) {
+            ASSERT_NE(instance->registry[0], nullptr);
+            EXPECT_EQ(instance->registry[0]->kind, SM_KIND_NONE);
+            EXPECT_EQ(instance->registry[0]->pool, nullptr);
+          }
+          EXPECT_EQ(create(session, p), SM_OK);
+          EXPECT_EQ(p.m->registry_index, request < 2 ? 1 : 2);
+        });
+    // A host's tree manager may itself ask for more than one thing.
+    EXPECT_TRUE(is_sparse(shape) ? requests > 3 : requests == 3) << requests;
   }
 }
 
@@ -192,7 +200,7 @@ TEST_P(Allocation, the_short_forms_answer_101_and_leave_what_can_be_destroyed) {
                          [form](Session& session, SmMatrix*& m) { return form(session, &m); },
                          [&](Session& session, SmMatrix*& m, SmStatus status, std::int64_t request) {
                            // A general sparse matrix without a tree manager fails with its first entry only.
-                           if (general && request == 3 && status == SM_OK) {
+                           if (general && request >= 3 && status == SM_OK) {
                              EXPECT_EQ(set(session, m, 0, 0, 1.0), SM_NO_MEMORY);
                            } else {
                              EXPECT_EQ(status, SM_NO_MEMORY);

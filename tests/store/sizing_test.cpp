@@ -218,7 +218,7 @@ TEST_P(Sizing, more_values_than_can_be_counted_answer_105_and_leave_none) {
   const std::int64_t wrap = std::int64_t{1} << 32;
   const Case cases[] = {{kGeneralColumns, wrap, wrap},
                         {kGeneralRows, wrap, wrap},
-                        {kGeneralRows, SM_MAX_ELEMENTS + 1, 1},
+                        {kGeneralRows, SM_MAX_ELEMENTS + 2, 1},
                         {kGeneralColumns, 1, kHuge},
                         {kGeneralRows, kHuge, kHuge},
                         {kGeneralRows, 3, 6148914691236517206},  // 3 * this is 2 modulo 2^64
@@ -239,11 +239,12 @@ TEST_P(Sizing, more_values_than_can_be_counted_answer_105_and_leave_none) {
   }
 }
 
-TEST_P(Sizing, a_diagonal_too_large_for_memory_or_count_leaves_no_values) {
+// A diagonal's values are not counted against a limit of their own: memory ends first.
+TEST_P(Sizing, a_diagonal_beyond_any_memory_answers_101_and_leaves_no_values) {
   for (const Shape shape : {kDiagonalColumns, kDiagonalRows}) {
-    for (const std::int64_t n : {SM_MAX_ELEMENTS + 1, std::int64_t{1} << 61, kHuge}) {  // 2^61 * 8 wraps to 0
+    for (const std::int64_t n : {SM_MAX_ELEMENTS, std::int64_t{1} << 61, kHuge}) {  // 2^61 * 8 wraps to 0
       SmMatrix* m = square(shape, 3);
-      EXPECT_EQ(fn().qxsmresize(m, n, n), SM_TOO_LARGE) << n;
+      EXPECT_EQ(fn().qxsmresize(m, n, n), SM_NO_MEMORY) << n;
       expect_without_values(m, n, n);
       EXPECT_EQ(fn().qxsmresize(m, 3, 3), SM_OK);
       EXPECT_EQ(set(m, 2, 2, 2.0), SM_OK);

@@ -104,7 +104,7 @@ TEST_P(Tie, other_refusals_come_in_order_and_leave_the_matrix_empty) {
                         {kGeneralColumns, kHuge, kHuge, SM_TOO_LARGE},
                         {kSymmetricRows, wrap, wrap, SM_TOO_LARGE},
                         {kSymmetricColumns, kHuge, kHuge, SM_TOO_LARGE},
-                        {kDiagonalRows, SM_MAX_ELEMENTS + 1, SM_MAX_ELEMENTS + 1, SM_TOO_LARGE}};
+                        {kDiagonalRows, SM_MAX_ELEMENTS + 2, SM_MAX_ELEMENTS + 2, SM_TOO_LARGE}};
   for (const Case& c : cases) {
     SCOPED_TRACE(name_of(c.shape) + " " + std::to_string(c.rows) + " x " + std::to_string(c.cols));
     SmMatrix* m = square(kGeneralRows, 3);
