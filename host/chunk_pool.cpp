@@ -18,7 +18,6 @@ constexpr std::uint64_t kSmall = 4096;
 constexpr std::uint64_t kLarge = std::uint64_t{128} << 10;
 constexpr std::uint64_t kFirstChunk = std::uint64_t{4} << 10;
 constexpr std::uint64_t kLastChunk = std::uint64_t{256} << 10;
-constexpr std::uint64_t kPage = 4096;
 constexpr std::uint64_t kHugePage = std::uint64_t{2} << 20;
 constexpr std::uint64_t kHuge = std::uint64_t{4} << 20;  // from here on the block asks for huge pages
 
@@ -53,7 +52,7 @@ struct Tag {
 struct BigHead {
   BigHead* previous;
   BigHead* next;
-  std::uint64_t span;  // mapped bytes of a large block
+  std::uint64_t span;  // bytes of the block with its head
   std::uint64_t unused[3];
   Tag tag;
 };
@@ -129,10 +128,9 @@ void* map_pages(std::uint64_t span) {
 
 void* take_big(ChunkPool& pool, std::uint64_t bytes, bool zero) {
   BigHead* head = nullptr;
-  std::uint64_t span = sizeof(BigHead) + bytes;
+  const std::uint64_t span = sizeof(BigHead) + bytes;
   const bool large = bytes >= kLarge;
   if (large) {
-    span = (span + kPage - 1) / kPage * kPage;
     head = static_cast<BigHead*>(map_pages(span));
   } else {
     head = static_cast<BigHead*>(zero ? std::calloc(1, span) : std::malloc(span));

@@ -213,6 +213,17 @@ TEST_F(CheckingTest, many_blocks_are_told_apart) {
   EXPECT_EQ(found(), (Found{0, 10'000, 0, 0}));
 }
 
+TEST_F(CheckingTest, the_last_million_freed_blocks_are_remembered) {
+  constexpr std::size_t kRemembered = std::size_t{1} << 20;
+  std::vector<char*> blocks;
+  for (std::size_t k = 0; k < kRemembered + 5; ++k) blocks.push_back(take(1));
+  for (char* block : blocks) pool->free(pool, block);
+  for (const std::size_t k : {std::size_t{0}, std::size_t{4}}) pool->free(pool, blocks[k]);
+  EXPECT_EQ(found(), (Found{2, 0, 0, 0}));
+  for (const std::size_t k : {std::size_t{5}, kRemembered + 4}) pool->free(pool, blocks[k]);
+  EXPECT_EQ(found(), (Found{2, 2, 0, 0}));
+}
+
 TEST(Checking, many_dead_pools_are_let_go_from_the_oldest_on) {
   const QxHostOptions options = {0, 1};
   QxHost* host = qxhost_create(&options);

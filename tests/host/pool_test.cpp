@@ -123,6 +123,8 @@ TEST_F(PoolTest, usage_counts_requested_bytes_and_remembers_the_peak) {
   pool->free(pool, small);
   pool->free(pool, medium);
   EXPECT_EQ(usage().bytes_in_use, 0U);
+  take(50);
+  EXPECT_EQ(usage().bytes_in_use, 50U);
   EXPECT_EQ(usage().bytes_peak, 100 + 10'000 + kMiB);
 }
 
@@ -166,7 +168,7 @@ TEST_F(PoolTest, large_blocks_are_freed_in_any_order) {
 TEST_F(PoolTest, a_slab_of_640_megabytes_that_is_not_touched_costs_no_memory) {
   const std::int64_t before = resident_bytes();
   char* zeroed = take(640 * kMiB, SM_POOL_ZERO);
-  char* plain = take(640 * kMiB);
+  char* plain = take(640 * kMiB - 64);  // with its head a whole number of huge pages
   ASSERT_NE(zeroed, nullptr);
   ASSERT_NE(plain, nullptr);
   ASSERT_GT(before, 0);
@@ -184,6 +186,17 @@ TEST_F(PoolTest, a_freed_large_block_goes_back_to_the_system_at_once) {
   EXPECT_GT(resident_bytes() - before, 60 * std::int64_t{kMiB});
   pool->free(pool, block);
   EXPECT_LT(resident_bytes() - before, 4 * std::int64_t{kMiB});
+}
+
+TEST_F(PoolTest, a_large_block_is_made_of_fresh_pages_also_after_others_were_used_and_freed) {
+  for (int round = 0; round < 4; ++round) {
+    const std::int64_t before = resident_bytes();
+    char* block = take(20 * kMiB, SM_POOL_ZERO);
+    ASSERT_NE(block, nullptr);
+    EXPECT_LT(resident_bytes() - before, std::int64_t{kMiB}) << "round " << round;
+    std::memset(block, 1, 20 * kMiB);
+    pool->free(pool, block);
+  }
 }
 
 TEST_F(PoolTest, past_the_hosts_ceiling_requests_are_answered_with_null) {

@@ -149,7 +149,7 @@ class Matrix {
     if (matrix_) instance_->functions->qxsmDestroyMatrix(instance_, &matrix_);
   }
 
-  explicit operator bool() const noexcept { return matrix_ != nullptr && status_ == SM_OK; }
+  explicit operator bool() const noexcept { return status_ == SM_OK; }
   operator SmMatrix*() const noexcept { return matrix_; }
   SmMatrix* operator->() const noexcept { return matrix_; }
   [[nodiscard]] SmMatrix* get() const noexcept { return matrix_; }
