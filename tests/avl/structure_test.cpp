@@ -35,21 +35,21 @@ class Structure : public TreeTest {
 
 // Keys of the sparsest tree of a height, level by level: inserted so, they need no rotation and lean left everywhere.
 std::vector<std::int64_t> sparsest_tree(int height) {
-  struct Part {
+  struct Subtree {
     int height;
     std::int64_t first;
   };
   const std::function<std::int64_t(int)> size = [&](int h) { return h <= 0 ? 0 : 1 + size(h - 1) + size(h - 2); };
   std::vector<std::int64_t> keys;
-  std::vector<Part> level = {{height, 0}};
+  std::vector<Subtree> level = {{height, 0}};
   while (!level.empty()) {
-    std::vector<Part> below;
-    for (const Part& part : level) {
-      if (part.height <= 0) continue;
-      const std::int64_t top = part.first + size(part.height - 1);
+    std::vector<Subtree> below;
+    for (const Subtree& subtree : level) {
+      if (subtree.height <= 0) continue;
+      const std::int64_t top = subtree.first + size(subtree.height - 1);
       keys.push_back(top);
-      below.push_back({part.height - 1, part.first});
-      below.push_back({part.height - 2, top + 1});
+      below.push_back({subtree.height - 1, subtree.first});
+      below.push_back({subtree.height - 2, top + 1});
     }
     level = below;
   }
