@@ -93,8 +93,8 @@ struct TreeInner {
 
 /* A tree manager. It serves any number of trees; a tree is named by the address of its root word, which the module
  * keeps, and an empty tree is a root word of zero. Root words move when the module's root array grows, so nothing
- * about an address may be assumed between calls. Nodes stay where they are; removal unlinks, it frees nothing and
- * never moves a key from one node to another. */
+ * about an address may be assumed between calls. A tree stays with the manager that it was begun with. Nodes stay where
+ * they are; removal unlinks, it frees nothing and never moves a key from one node to another. */
 struct NonzeroTree {
   void* reserved_1[2];
   /* Word 3: gives the manager back; nodes are not its business. */
