@@ -1,4 +1,5 @@
 // Every request of every operation refused in turn, once and for ever.
+#include <algorithm>
 #include <cmath>
 #include <functional>
 
@@ -17,6 +18,7 @@ struct Operation {
   std::function<SmStatus(Session&, SmMatrix*)> run;
   std::function<Bits(const SmMatrix*)> inputs;
   std::function<Bits(const SmMatrix*)> answer;
+  bool solves = false;  // factoring may have succeeded before the refusal
 };
 
 class AllocationTest : public ModuleTest {
@@ -54,7 +56,7 @@ std::int64_t AllocationTest::survive(const Operation& op) {
         break;
       }
       EXPECT_EQ(status, SM_NO_MEMORY) << "request " << k << (for_ever ? " and on" : "");
-      EXPECT_TRUE(m->state == state || m->state < untroubled->state) << "request " << k;
+      EXPECT_LE(m->state, op.solves ? untroubled->state : std::max(state, untroubled->state - 1)) << "request " << k;
       EXPECT_EQ(op.inputs(m), inputs) << "request " << k;
       EXPECT_LE(session.host().live_blocks() - owned_blocks(m), loose) << "request " << k;
       EXPECT_EQ(op.run(session, m), SM_OK) << "after request " << k;
@@ -104,7 +106,7 @@ Operation AllocationTest::solving(std::function<SmMatrix*(Session&)> prepare,
   b_ = random.vector(64);
   x_.assign(64, 0.0);
   return {std::move(prepare), [this, solve](Session& s, SmMatrix* m) { return solve(s, m, b_.data(), x_.data()); },
-          nothing, [this](const SmMatrix*) { return bits(x_); }};
+          nothing, [this](const SmMatrix*) { return bits(x_); }, true};
 }
 
 SmStatus substitute(Session& s, SmMatrix* m, const double* b, double* x) { return s.fn().qxsmsubst(m, b, x, 2); }

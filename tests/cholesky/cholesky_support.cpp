@@ -101,6 +101,7 @@ std::vector<std::uint64_t> bits(const std::vector<double>& v) {
 }
 
 StoredRows rows_of(const SmMatrix* matrix) {
+  if (!matrix->row_start) return {};  // of order 0
   return {words(matrix->row_start, matrix->rows + 1), words(matrix->col_index, matrix->nnz),
           bits(matrix->nz_values, matrix->nnz)};
 }

@@ -189,7 +189,9 @@ TEST_P(FactorTest, a_separate_diagonal_that_failed_is_filled_again_or_given_back
   const std::int64_t blocks = host().live_blocks();
   EXPECT_EQ(factor(m, 0), SM_NOT_DEFINITE);
   EXPECT_EQ(host().live_blocks(), blocks + owned_blocks(m));
-  data = {16.0, 1.0, 25.0};
+  data[0] = 16.0;
+  data[1] = 1.0;
+  data[2] = 25.0;
   EXPECT_EQ(factor(m, 0), SM_OK);
   EXPECT_EQ(doubles(m->dense_factor, 3), (std::vector<double>{4.0, 1.0, 5.0}));
   EXPECT_EQ(host().live_blocks(), blocks + 1);

@@ -64,7 +64,7 @@ void expect_reference_factor(const SmMatrix* m, const Problem& problem, double t
 }
 
 TEST_P(NumericTest, factors_definite_matrices_as_the_dense_reference_does) {
-  for (std::uint64_t seed = 0; seed < 150; ++seed) {
+  for (std::uint64_t seed = 0; seed < 400; ++seed) {
     Random random(seed);
     const Problem problem = positive_definite(any_graph(random, 36), random);
     if (problem.n == 0) continue;
@@ -79,7 +79,7 @@ TEST_P(NumericTest, factors_definite_matrices_as_the_dense_reference_does) {
 }
 
 TEST_P(NumericTest, drops_the_dependent_columns_of_a_cross_product) {
-  for (std::uint64_t seed = 0; seed < 120; ++seed) {
+  for (std::uint64_t seed = 0; seed < 400; ++seed) {
     Random random(seed);
     const Semidefinite s = cross_product(random, 1 + random.below(20), random.below(6), random.below(4));
     SmMatrix* m = new_sparse(session(), s.problem);

@@ -40,7 +40,7 @@ std::int64_t expected_capacity(const SmMatrix* m, std::int64_t given, std::int64
 }
 
 TEST_P(OrderingTest, orders_random_graphs_exactly_as_the_reference_does) {
-  for (std::uint64_t seed = 0; seed < 1500; ++seed) {
+  for (std::uint64_t seed = 0; seed < 4000; ++seed) {
     Random random(seed);
     const Graph graph = any_graph(random, 61);
     SmMatrix* m = closed(graph);
@@ -85,7 +85,9 @@ TEST_P(OrderingTest, orders_larger_grids_and_dense_graphs_as_the_reference_does)
                                      blocks(random, 9, 9),
                                      random_graph(random, 120, 10),
                                      path(200),
-                                     random_tree(random, 250)};
+                                     random_tree(random, 250),
+                                     elements(random, 150, 60, 6),
+                                     multiplied(random, grid(8, 9))};
   for (const Graph& graph : graphs) {
     SmMatrix* m = closed(graph);
     ASSERT_EQ(qxsmmd(m), SM_OK);

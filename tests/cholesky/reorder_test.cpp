@@ -42,7 +42,7 @@ StoredRows expected_rows(const SmMatrix* m) {
 }
 
 TEST_P(ReorderTest, moves_every_entry_to_the_row_of_the_index_that_comes_first) {
-  for (std::uint64_t seed = 0; seed < 400; ++seed) {
+  for (std::uint64_t seed = 0; seed < 800; ++seed) {
     Random random(seed);
     const Problem problem = positive_definite(any_graph(random, 40), random);
     if (problem.n == 0) continue;

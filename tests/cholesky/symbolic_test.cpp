@@ -46,7 +46,7 @@ void expect_well_formed(const SmMatrix* m) {
 }
 
 TEST_P(SymbolicTest, finds_the_true_fill_of_random_structures) {
-  for (std::uint64_t seed = 0; seed < 600; ++seed) {
+  for (std::uint64_t seed = 0; seed < 1500; ++seed) {
     Random random(seed);
     const Graph graph = any_graph(random, 46);
     if (graph.n == 0) continue;

@@ -106,6 +106,35 @@ Graph blocks(Random& random, std::int64_t count, std::int64_t size) {
   return sorted(g);
 }
 
+Graph elements(Random& random, std::int64_t n, std::int64_t count, std::int64_t size) {
+  Graph g{n, {}};
+  for (std::int64_t e = 0; n > 0 && e < count; ++e) {
+    std::vector<std::int64_t> nodes;
+    for (std::int64_t k = 0; k < size; ++k) nodes.push_back(random.below(n));
+    for (const std::int64_t i : nodes)
+      for (const std::int64_t j : nodes)
+        if (i < j) g.edges.emplace_back(i, j);
+  }
+  return sorted(g);
+}
+
+Graph multiplied(Random& random, const Graph& graph) {
+  std::vector<std::vector<std::int64_t>> copies(at(graph.n));
+  Graph g;
+  for (auto& group : copies) {
+    const std::int64_t count = 1 + random.below(3);
+    for (std::int64_t k = 0; k < count; ++k) group.push_back(g.n++);
+    if (random.chance(50)) continue;
+    for (const std::int64_t i : group)
+      for (const std::int64_t j : group)
+        if (i < j) g.edges.emplace_back(i, j);
+  }
+  for (const Edge& e : graph.edges)
+    for (const std::int64_t i : copies[at(e.first)])
+      for (const std::int64_t j : copies[at(e.second)]) g.edges.emplace_back(i, j);
+  return sorted(g);
+}
+
 Graph relabelled(const Graph& graph, const std::vector<std::int64_t>& label) {
   Graph g{graph.n, {}};
   for (const Edge& e : graph.edges) g.edges.emplace_back(label[at(e.first)], label[at(e.second)]);
@@ -116,7 +145,7 @@ Graph any_graph(Random& random, std::int64_t limit) {
   const std::int64_t n = random.below(limit);
   const std::int64_t side = 1 + random.below(std::max<std::int64_t>(1, static_cast<std::int64_t>(std::sqrt(n))));
   Graph g;
-  switch (random.below(9)) {
+  switch (random.below(11)) {
     case 0:
       g = empty_graph(n);
       break;

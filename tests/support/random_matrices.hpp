@@ -40,6 +40,10 @@ Graph grid(std::int64_t width, std::int64_t height);
 Graph random_tree(Random& random, std::int64_t n);
 Graph arrowhead(std::int64_t n, std::int64_t border);                 // the last `border` vertices touch everything
 Graph blocks(Random& random, std::int64_t count, std::int64_t size);  // dense blocks without a link
+// Cliques that overlap, as finite elements do: many vertices become indistinguishable on the way.
+Graph elements(Random& random, std::int64_t n, std::int64_t count, std::int64_t size);
+// Every vertex becomes one to three copies with the same neighbours; the copies touch each other or not.
+Graph multiplied(Random& random, const Graph& graph);
 Graph relabelled(const Graph& graph, const std::vector<std::int64_t>& label);
 // One of the families above, of an order below `limit`.
 Graph any_graph(Random& random, std::int64_t limit);
