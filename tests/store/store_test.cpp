@@ -4,7 +4,7 @@
 #include <cstring>
 
 // The large sizes that are asked for here are refused by malloc; the sanitizer would end the program instead.
-extern "C" const char* __asan_default_options();
+extern "C" __attribute__((visibility("default"))) const char* __asan_default_options();
 extern "C" const char* __asan_default_options() { return "allocator_may_return_null=1"; }
 
 namespace sm::test {
