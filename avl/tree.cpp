@@ -54,42 +54,49 @@ Balanced restore(Node& top, Side side) {
   return {&middle, false};
 }
 
-// Where a key is, or would be: the node that holds it, or else the neighbours of its gap (null past an end).
+// Where a key is: at `node`, or else in the gap that the node's thread on `side` spans.
 struct Place {
-  Node* held;
-  Node* before;
-  Node* after;
+  Node* node;
+  Side side;
+  bool held;
 };
+
+Place held_at(Node* node) { return {node, Side::left, true}; }
 
 Place descend(Word root, std::int64_t key) {
   Node* node = node_at(root);
   while (key != node->key) {
-    const Side side = towards(key, *node);
-    Node* next = target(*node, side);
-    if (!has_child(*node, side)) {
-      return side == Side::left ? Place{nullptr, next, node} : Place{nullptr, node, next};
-    }
-    node = next;
+    const bool before = key < node->key;
+    const Word link = before ? node->left : node->right;
+    if (is_thread(link)) return {node, before ? Side::left : Side::right, false};
+    node = node_at(link);
   }
-  return {node, nullptr, nullptr};
+  return held_at(node);
 }
 
 // The place of `key` if it is at `node`, at a neighbour, or in a gap beside it; else by a descent.
 Place locate(Word root, std::int64_t key, Node* node) {
-  if (key == node->key) return {node, nullptr, nullptr};
+  if (key == node->key) return held_at(node);
   const Side side = towards(key, *node);
   Node* next = neighbour(node, side);
-  if (next && key == next->key) return {next, nullptr, nullptr};
-  if (next && towards(key, *next) == side) return descend(root, key);
-  return side == Side::left ? Place{nullptr, next, node} : Place{nullptr, node, next};
+  if (next) {
+    if (key == next->key) return held_at(next);
+    if (towards(key, *next) == side) return descend(root, key);
+    // Of two neighbours one lies below the other, and only that one has a thread across the gap.
+    if (has_child(*node, side)) return {next, opposite(side), false};
+  }
+  return {node, side, false};
 }
 
-// The word that leads down to `node`, the top of a subtree that lies between `before` and `after`. Its parent is one of
-// these two: a left child's parent follows the subtree in key order, a right child's precedes it.
-Word& word_above(Word& root, const Node* node, Node* before, Node* after) {
-  if (node_at(root) == node) return root;
-  if (before && has_child(*before, Side::right) && target(*before, Side::right) == node) return before->right;
-  return after->left;
+// A subtree hangs on one of its two neighbours in key order: a right child follows its parent, a left child precedes it.
+bool hangs_on(Node* before, const Node* top) {
+  return before && has_child(*before, Side::right) && target(*before, Side::right) == top;
+}
+
+// The word that leads to the subtree `top` between `before` and `after`.
+Word& word_above(Word& root, const Node* top, Node* before, Node* after) {
+  if (node_at(root) == top) return root;
+  return hangs_on(before, top) ? before->right : after->left;
 }
 
 // Makes `child` what `above` leads to, without touching the tags.
@@ -97,17 +104,18 @@ void replace_below(Word& above, const Node* child) { above = address_of(child) |
 
 // Restores the balance after `node` came in as a leaf between its neighbours `before` and `after`.
 //
-// Parents are found through the threads: one of the two nodes beside a subtree is its parent, and the node beside the
-// parent's subtree is at the end of a walk down the sibling. The climb's k-th level costs a walk of at most k links.
-// Keys in ascending order climb the right edge of the tree. A node of that edge that is even when the climb reaches it
-// passes the climb on and leans right; reached again, it is rotated, which ends the climb and puts an even node at
-// that height. So of the climbs that reach one level at most every second, rounded up, reaches the next, and n
-// insertions cost no more than the sum of (k + 1)(n/2^k + 1) over the levels, O(n): a constant each. Descending keys
-// are the mirror image. In any order, one insertion stays below the square of the height.
+// Parents are found through the threads: the climb keeps the two neighbours of the subtree that it has reached. Its k-th
+// level costs a walk of at most k links, down the sibling, and the whole climb less than the square of the height.
+//
+// Keys that ascend from the first on climb the right edge of the tree. Its node at height k comes to a climb either
+// even, is passed, and leans right from then on; or leaning right, ends the climb and is rotated away, which leaves an
+// even node at that height. Of the climbs that reach a level at most every second, rounded up, thus passes it, and n
+// insertions cost no more than the sum of (k + 1)(n/2^k + 1) over the levels k, O(n): a constant each. Descending keys
+// are the mirror image.
 void grow(Word& root, Node* node, Node* before, Node* after) {
   Node* top = node;
   while (top != node_at(root)) {
-    const bool right_child = before && has_child(*before, Side::right) && target(*before, Side::right) == top;
+    const bool right_child = hangs_on(before, top);
     const Side side = right_child ? Side::right : Side::left;
     Node* parent = right_child ? before : after;
     if (is_higher(*parent, opposite(side))) {
@@ -220,18 +228,15 @@ Node* insert(Word& root, Node& node, Hint& hint) {
   }
   const bool hinted = hint.root == &root && hint.word == root;
   const Place place = hinted ? locate(root, node.key, hint.last) : descend(root, node.key);
-  Node* result = place.held;
-  if (!result) {
+  Node* result = place.node;
+  if (!place.held) {
     result = &node;
-    node.left = address_of(place.before) | SM_LINK_THREAD;
-    node.right = address_of(place.after) | SM_LINK_THREAD;
-    // Of two neighbours one lies below the other, and that one has its link towards the gap free.
-    if (place.before && !has_child(*place.before, Side::right)) {
-      set_child(*place.before, Side::right, &node);
-    } else {
-      set_child(*place.after, Side::left, &node);
-    }
-    grow(root, &node, place.before, place.after);
+    Node* beyond = target(*place.node, place.side);
+    link_of(node, place.side) = address_of(beyond) | SM_LINK_THREAD;
+    link_of(node, opposite(place.side)) = address_of(place.node) | SM_LINK_THREAD;
+    set_child(*place.node, place.side, &node);
+    const bool in_front = place.side == Side::left;
+    grow(root, &node, in_front ? beyond : place.node, in_front ? place.node : beyond);
   }
   hint = {&root, root, result};
   return result;
@@ -240,8 +245,8 @@ Node* insert(Word& root, Node& node, Hint& hint) {
 Node* find(Word root, std::int64_t key) {
   Node* node = node_at(root);
   while (node && key != node->key) {
-    const Side side = towards(key, *node);
-    node = has_child(*node, side) ? target(*node, side) : nullptr;
+    const Word link = key < node->key ? node->left : node->right;
+    node = is_thread(link) ? nullptr : node_at(link);
   }
   return node;
 }

@@ -72,10 +72,9 @@ bool MinimumDegree::enter_graph() {
     for (i64 p = m_.row_start[i - 1]; p < m_.row_start[i]; ++p) {
       const i64 j = m_.col_index[p] + 1;
       if (j <= i || next_[j] == i) continue;  // next remembers the row that met j last: an edge counts once
-      if (free_slot_ >= half_) return false;
+      if (free_slot_ >= half_) return false;  // the second item of the edge may take the last slot, half
       next_[j] = i;
       enter_edge(i, j);
-      if (free_slot_ >= half_) return false;
       enter_edge(j, i);
     }
   }

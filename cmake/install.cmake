@@ -1,8 +1,5 @@
 # What `cmake --install` leaves behind: headers, libraries, the command, and the two ways in which other builds find
 # them. Nothing in it names the prefix, so the tree can be moved.
-if(NOT TARGET qxhost OR NOT TARGET qxeavl)
-  return()
-endif()
 include(CMakePackageConfigHelpers)
 
 install(TARGETS qxesm qxhost EXPORT qxesmTargets
@@ -30,6 +27,7 @@ if(IS_ABSOLUTE "${CMAKE_INSTALL_LIBDIR}" OR IS_ABSOLUTE "${CMAKE_INSTALL_INCLUDE
   message(FATAL_ERROR "CMAKE_INSTALL_LIBDIR and CMAKE_INSTALL_INCLUDEDIR are folders below the prefix, not absolute")
 endif()
 file(RELATIVE_PATH QXESM_PC_TO_PREFIX /prefix/${CMAKE_INSTALL_LIBDIR}/pkgconfig /prefix)
+string(REGEX REPLACE "/$" "" QXESM_PC_TO_PREFIX "${QXESM_PC_TO_PREFIX}")
 foreach(pc qxesm qxhost)
   configure_file(${PROJECT_SOURCE_DIR}/cmake/${pc}.pc.in ${PROJECT_BINARY_DIR}/${pc}.pc @ONLY)
   install(FILES ${PROJECT_BINARY_DIR}/${pc}.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)

@@ -58,7 +58,9 @@ target_sources(qxesm PUBLIC FILE_SET HEADERS BASE_DIRS ${PROJECT_SOURCE_DIR}/inc
   include/qxesm/store.h include/qxesm/trace.h include/qxesm/types.h)
 target_link_libraries(qxesm PRIVATE qxesm_objects qxesm_options BLAS::BLAS m)
 set_target_properties(qxesm PROPERTIES SOVERSION 1 LINK_DEPENDS ${PROJECT_SOURCE_DIR}/qxesm.map)
-target_link_options(qxesm PRIVATE -Wl,--version-script=${PROJECT_SOURCE_DIR}/qxesm.map -Wl,--as-needed)
+target_link_options(qxesm PRIVATE -Wl,--version-script=${PROJECT_SOURCE_DIR}/qxesm.map -Wl,--as-needed
+  # Its own calls stay inside, whatever else the process has loaded under these names.
+  -Wl,-Bsymbolic-functions)
 if(NOT QXESM_SANITIZE)
   target_link_options(qxesm PRIVATE -Wl,-z,defs)
 endif()

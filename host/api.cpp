@@ -22,7 +22,7 @@ void* load_extension(HostServices* kernel, const wchar_t* name, std::int64_t len
   if (!kernel) return nullptr;
   QxHost& host = host_of(kernel);
   if (sm::host::refuses(host, QXHOST_FAIL_EXTENSIONS)) {
-    return sm::host::load_failed(host.loader, "extension load: refused by the planned fault");
+    return sm::host::load_failed(host.loader, {"extension load: refused by the planned fault"});
   }
   return sm::host::load_extension(host, name, length);
 }

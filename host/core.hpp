@@ -1,4 +1,4 @@
-// The host object and what its parts share. Nothing here throws: memory comes from malloc and mmap, and null is checked.
+// The host object and what its parts share. Nothing here throws: memory comes from malloc and mmap, null is checked.
 #pragma once
 
 #include <qxhost/qxhost.h>
@@ -6,6 +6,7 @@
 #include <climits>
 #include <cstddef>
 #include <cstdint>
+#include <initializer_list>
 
 namespace sm::host {
 
@@ -101,8 +102,8 @@ bool add_search_path(Loader& loader, const char* directory);
 bool begin_search_beside_host(Loader& loader);
 // Loads an extension as qxhost_load_extension promises.
 void* load_extension(QxHost& host, const wchar_t* name, std::int64_t length);
-// Records why a load failed, printf style; answers null for the caller to return.
-[[gnu::format(printf, 2, 3)]] std::nullptr_t load_failed(Loader& loader, const char* format, ...);
+// Records why a load failed, as one line made of the parts; answers null for the caller to return.
+std::nullptr_t load_failed(Loader& loader, std::initializer_list<const char*> parts);
 // Closes every library and forgets every path.
 void unload_all(Loader& loader);
 

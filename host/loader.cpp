@@ -1,9 +1,8 @@
-// Extensions: from a wide name to a shared library beside the host or on the search path, and to what its entry answers.
+// Extensions: from a wide name to a shared library beside the host or on the search path, and to its entry's answer.
 #include <dlfcn.h>
 #include <link.h>
 #include <unistd.h>
 
-#include <cstdarg>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -13,11 +12,17 @@
 namespace sm::host {
 namespace {
 
-constexpr std::int64_t kLongestName = 64;
+constexpr std::int32_t kLongestName = 64;
 constexpr std::int32_t kInterfaceMajor = 5;
 
 using VersionEntry = std::int32_t (*)(HostServices* handle, std::int32_t* major, std::int32_t* minor);
 using ExtensionEntry = void* (*)(void* unused, void* owner);
+
+// A number in an error line.
+struct Digits {
+  explicit Digits(std::int32_t number) { std::snprintf(text, sizeof text, "%d", static_cast<int>(number)); }
+  char text[12];
+};
 
 bool is_plain(wchar_t c) {
   return (c >= L'a' && c <= L'z') || (c >= L'A' && c <= L'Z') || (c >= L'0' && c <= L'9') || c == L'_';
@@ -41,8 +46,9 @@ bool locate(Loader& loader, const char* ascii, char (&file)[PATH_MAX]) {
     const int written = std::snprintf(file, sizeof file, "%s/lib%s.so", path->directory, ascii);
     if (written > 0 && static_cast<std::size_t>(written) < sizeof file && access(file, F_OK) == 0) return true;
   }
-  load_failed(loader, "lib%s.so: not found beside the host library%s", ascii,
-              loader.paths && loader.paths->next ? ", nor in the folders added to the search" : "");
+  const bool folders = loader.paths && loader.paths->next;
+  load_failed(loader, {"lib", ascii, ".so: not found beside the host library",
+                       folders ? ", nor in the folders added to the search" : ""});
   return false;
 }
 
@@ -83,8 +89,8 @@ const char* dl_cause() {
 
 void* open_library(Loader& loader, const char* file) {
   void* handle = dlopen(file, RTLD_NOW | RTLD_LOCAL);
-  if (!handle) return load_failed(loader, "%s: cannot be loaded: %s", file, dl_cause());
-  if (!keep(loader, handle)) return load_failed(loader, "%s: out of memory", file);
+  if (!handle) return load_failed(loader, {file, ": cannot be loaded: ", dl_cause()});
+  if (!keep(loader, handle)) return load_failed(loader, {file, ": out of memory"});
   return handle;
 }
 
@@ -92,36 +98,36 @@ void* open_library(Loader& loader, const char* file) {
 void* start(QxHost& host, void* handle, const char* file, const char* ascii) {
   Loader& loader = host.loader;
   const auto version = reinterpret_cast<VersionEntry>(own_symbol(handle, "qxextver"));
-  if (!version) return load_failed(loader, "%s: has no qxextver", file);
+  if (!version) return load_failed(loader, {file, ": has no qxextver"});
   const auto entry = reinterpret_cast<ExtensionEntry>(own_symbol(handle, ascii));
-  if (!entry) return load_failed(loader, "%s: has no entry %s", file, ascii);
+  if (!entry) return load_failed(loader, {file, ": has no entry ", ascii});
   std::int32_t major = 0;
   std::int32_t minor = 0;
   if (const std::int32_t answer = version(&host.services, &major, &minor); answer != 0) {
-    return load_failed(loader, "%s: its qxextver answered %d", file, answer);
+    return load_failed(loader, {file, ": its qxextver answered ", Digits(answer).text});
   }
   if (major != kInterfaceMajor) {
-    return load_failed(loader, "%s: speaks interface %d.%d, this host speaks %d", file, major, minor, kInterfaceMajor);
+    return load_failed(loader, {file, ": speaks interface ", Digits(major).text, ".", Digits(minor).text,
+                                ", this host speaks ", Digits(kInterfaceMajor).text});
   }
   const std::int64_t failures = loader.failures;
   void* extension = entry(nullptr, nullptr);
   if (extension) return extension;
-  if (loader.failures == failures) return load_failed(loader, "%s: its entry %s answered null", file, ascii);
+  if (loader.failures == failures) return load_failed(loader, {file, ": its entry ", ascii, " answered null"});
   char within[sizeof loader.error];  // it failed because one that it loads did
   std::memcpy(within, loader.error, sizeof within);
-  return load_failed(loader, "%s: its entry %s answered null (%.*s)", file, ascii, PATH_MAX, within);
+  return load_failed(loader, {file, ": its entry ", ascii, " answered null (", within, ")"});
 }
 
 }  // namespace
 
-std::nullptr_t load_failed(Loader& loader, const char* format, ...) {
-  va_list arguments;
-  va_start(arguments, format);
-  std::vsnprintf(loader.error, sizeof loader.error, format, arguments);
-  va_end(arguments);
-  for (char* c = loader.error; *c; ++c) {
-    if (*c == '\n') *c = ' ';
+std::nullptr_t load_failed(Loader& loader, std::initializer_list<const char*> parts) {
+  char* end = loader.error;
+  const char* limit = loader.error + sizeof loader.error - 1;
+  for (const char* part : parts) {
+    for (; *part && end < limit; ++part) *end++ = *part == '\n' ? ' ' : *part;
   }
+  *end = '\0';
   ++loader.failures;
   return nullptr;
 }
@@ -161,8 +167,8 @@ void* load_extension(QxHost& host, const wchar_t* name, std::int64_t length) {
   Loader& loader = host.loader;
   char ascii[kLongestName + 1];
   if (!narrow(name, length, ascii)) {
-    return load_failed(loader, "extension name: 1 to %d letters, digits and underscores expected",
-                       static_cast<int>(kLongestName));
+    return load_failed(
+        loader, {"extension name: 1 to ", Digits(kLongestName).text, " letters, digits and underscores expected"});
   }
   char file[PATH_MAX];
   if (!locate(loader, ascii, file)) return nullptr;
@@ -174,7 +180,7 @@ void* load_extension(QxHost& host, const wchar_t* name, std::int64_t length) {
   TreeExtension* watched = watch_trees(host, real);
   if (!watched) {
     real->destroy(real);
-    return load_failed(loader, "%s: out of memory", file);
+    return load_failed(loader, {file, ": out of memory"});
   }
   return watched;
 }

@@ -93,8 +93,8 @@ struct TreeInner {
 
 /* A tree manager. It serves any number of trees; a tree is named by the address of its root word, which the module
  * keeps, and an empty tree is a root word of zero. Root words move when the module's root array grows, so nothing
- * about an address may be assumed between calls. Nodes stay where they are; removal unlinks, it frees nothing and
- * never moves a key from one node to another. */
+ * about an address may be assumed between calls. A tree stays with the manager that it was begun with. Nodes stay where
+ * they are; removal unlinks, it frees nothing and never moves a key from one node to another. */
 struct NonzeroTree {
   void* reserved_1[2];
   /* Word 3: gives the manager back; nodes are not its business. */
@@ -138,22 +138,22 @@ static inline NonzeroNode* sm_node_next(const NonzeroNode* node) {
 SM_STATIC_ASSERT(sizeof(void*) == 8, "64-bit only");
 SM_STATIC_ASSERT(sizeof(PoolParms) == 24, "pool parameter block");
 SM_STATIC_ASSERT(sizeof(TreeParms) == 16, "tree parameter block");
-SM_STATIC_ASSERT(offsetof(MemoryPool, destroy) == 8 * 2, "pool word 3");
-SM_STATIC_ASSERT(offsetof(MemoryPool, allocate) == 8 * 3, "pool word 4");
-SM_STATIC_ASSERT(offsetof(MemoryPool, free) == 8 * 4, "pool word 5");
-SM_STATIC_ASSERT(offsetof(HostServices, create_pool) == 8 * 6, "host word 7");
-SM_STATIC_ASSERT(offsetof(HostServices, load_extension) == 8 * 9, "host word 10");
-SM_STATIC_ASSERT(offsetof(TreeExtension, destroy) == 8 * 2, "tree extension word 3");
-SM_STATIC_ASSERT(offsetof(TreeExtension, create_tree_manager) == 8 * 9, "tree extension word 10");
-SM_STATIC_ASSERT(offsetof(TreeInner, reset) == 8 * 3, "inner word 4");
-SM_STATIC_ASSERT(offsetof(TreeInner, release) == 8 * 4, "inner word 5");
-SM_STATIC_ASSERT(offsetof(NonzeroTree, destroy) == 8 * 2, "tree word 3");
-SM_STATIC_ASSERT(offsetof(NonzeroTree, cleared_word) == 8 * 3, "tree word 4");
-SM_STATIC_ASSERT(offsetof(NonzeroTree, inner) == 8 * 5, "tree word 6");
-SM_STATIC_ASSERT(offsetof(NonzeroTree, insert) == 8 * 14, "tree word 15");
-SM_STATIC_ASSERT(offsetof(NonzeroTree, find) == 8 * 15, "tree word 16");
-SM_STATIC_ASSERT(offsetof(NonzeroTree, remove) == 8 * 17, "tree word 18");
-SM_STATIC_ASSERT(offsetof(NonzeroTree, first) == 8 * 18, "tree word 19");
+SM_STATIC_ASSERT(offsetof(MemoryPool, destroy) == 2 * sizeof(void*), "pool word 3");
+SM_STATIC_ASSERT(offsetof(MemoryPool, allocate) == 3 * sizeof(void*), "pool word 4");
+SM_STATIC_ASSERT(offsetof(MemoryPool, free) == 4 * sizeof(void*), "pool word 5");
+SM_STATIC_ASSERT(offsetof(HostServices, create_pool) == 6 * sizeof(void*), "host word 7");
+SM_STATIC_ASSERT(offsetof(HostServices, load_extension) == 9 * sizeof(void*), "host word 10");
+SM_STATIC_ASSERT(offsetof(TreeExtension, destroy) == 2 * sizeof(void*), "tree extension word 3");
+SM_STATIC_ASSERT(offsetof(TreeExtension, create_tree_manager) == 9 * sizeof(void*), "tree extension word 10");
+SM_STATIC_ASSERT(offsetof(TreeInner, reset) == 3 * sizeof(void*), "inner word 4");
+SM_STATIC_ASSERT(offsetof(TreeInner, release) == 4 * sizeof(void*), "inner word 5");
+SM_STATIC_ASSERT(offsetof(NonzeroTree, destroy) == 2 * sizeof(void*), "tree word 3");
+SM_STATIC_ASSERT(offsetof(NonzeroTree, cleared_word) == 3 * sizeof(void*), "tree word 4");
+SM_STATIC_ASSERT(offsetof(NonzeroTree, inner) == 5 * sizeof(void*), "tree word 6");
+SM_STATIC_ASSERT(offsetof(NonzeroTree, insert) == 14 * sizeof(void*), "tree word 15");
+SM_STATIC_ASSERT(offsetof(NonzeroTree, find) == 15 * sizeof(void*), "tree word 16");
+SM_STATIC_ASSERT(offsetof(NonzeroTree, remove) == 17 * sizeof(void*), "tree word 18");
+SM_STATIC_ASSERT(offsetof(NonzeroTree, first) == 18 * sizeof(void*), "tree word 19");
 SM_STATIC_ASSERT(sizeof(NonzeroNode) == 32, "node");
 SM_STATIC_ASSERT(offsetof(NonzeroNode, key) == 16, "node key");
 SM_STATIC_ASSERT(offsetof(NonzeroNode, value) == 24, "node value");

@@ -137,11 +137,11 @@ SM_STATIC_ASSERT(sizeof(SmInstance) == 64, "instance layout");
 SM_STATIC_ASSERT(offsetof(SmInstance, tolerances) == 32, "instance layout");
 SM_STATIC_ASSERT(offsetof(SmInstance, functions) == 40, "instance layout");
 SM_STATIC_ASSERT(sizeof(SmExtension) == 96, "twelve words");
-SM_STATIC_ASSERT(offsetof(SmExtension, qxsmGetReqVersion) == 8 * 3, "extension word 4");
-SM_STATIC_ASSERT(offsetof(SmExtension, qxsmDestroyExtension) == 8 * 6, "extension word 7");
-SM_STATIC_ASSERT(offsetof(SmExtension, pool) == 8 * 9, "extension word 10");
-SM_STATIC_ASSERT(offsetof(SmExtension, tree_extension) == 8 * 10, "extension word 11");
-SM_STATIC_ASSERT(offsetof(SmExtension, CreateInstance) == 8 * 11, "extension word 12");
+SM_STATIC_ASSERT(offsetof(SmExtension, qxsmGetReqVersion) == 3 * sizeof(void*), "extension word 4");
+SM_STATIC_ASSERT(offsetof(SmExtension, qxsmDestroyExtension) == 6 * sizeof(void*), "extension word 7");
+SM_STATIC_ASSERT(offsetof(SmExtension, pool) == 9 * sizeof(void*), "extension word 10");
+SM_STATIC_ASSERT(offsetof(SmExtension, tree_extension) == 10 * sizeof(void*), "extension word 11");
+SM_STATIC_ASSERT(offsetof(SmExtension, CreateInstance) == 11 * sizeof(void*), "extension word 12");
 
 /* The host's services. Set by qxextent; everything else in the module needs it. Read-only afterwards. */
 QXESM_API HostServices* Exported_QXHandle;

@@ -258,11 +258,8 @@ static void pool_free(MemoryPool* table, void* data) {
     return;
   }
   int seen = 0;
-  for (Pool* other = host->pools; other; other = other->next) {
-    if (find_block(other, data)) seen = -1;
-  }
-  for (int i = 0; i < FREED_KEPT && seen == 0; ++i) seen = host->freed[i] == data;
-  ++*(seen == 1 ? &host->counts.double_frees : &host->counts.foreign_frees);
+  for (int i = 0; i < FREED_KEPT && !seen; ++i) seen = host->freed[i] == data;
+  ++*(seen ? &host->counts.double_frees : &host->counts.foreign_frees);
 }
 
 static void pool_destroy(MemoryPool* table) {

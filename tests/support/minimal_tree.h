@@ -1,5 +1,5 @@
-/* The tree of the minimal host: an unbalanced search tree with threads, to the contract of <qxesm/host.h>. Keys that come
- * in order make it a list, so an insertion then costs as many steps as there are nodes; it is for tests only. */
+/* The tree of the minimal host: an unbalanced search tree with threads, to the contract of <qxesm/host.h>. Keys in
+ * ascending order make it a list, so an insertion then costs as many steps as there are nodes; it is for tests only. */
 #ifndef QXESM_TESTS_MINIMAL_TREE_H
 #define QXESM_TESTS_MINIMAL_TREE_H
 

@@ -1,16 +1,15 @@
-// A semidefinite fit from C++, its operations called by name. Exits 0 when every number is right.
+// A semidefinite fit from C++: handles from the host's header, operations by name. Exits 0 when every number is right.
 #include <qxesm/qxesm.h>
-#include <qxhost/qxhost.h>
 
 #include <array>
 #include <cmath>
 #include <cstdio>
-#include <memory>
+#include <qxhost/qxhost.hpp>
 
 namespace {
 
 struct Entry {
-  std::int64_t row, col;
+  std::size_t row, col;
   double value;
 };
 
@@ -26,11 +25,14 @@ std::array<double, 3> multiply(const std::array<double, 3>& x) {
   return y;
 }
 
-const char* fit(SmInstance* instance) {
-  SmMatrix* a = nullptr;
-  if (qxsmnewss(instance, &a, 3) != SM_OK) return "no matrix";
+// What went wrong, or null.
+const char* fit(qxhost::Instance& instance) {
+  const auto a = qxhost::Matrix::symmetric_sparse(instance, 3);
+  if (!a) return "no matrix";
   for (const auto& [row, col, value] : kEntries) {
-    if (qxsmassign(a, row, col, 1, value) != SM_OK) return "assign";
+    const auto i = static_cast<std::int64_t>(row);
+    const auto j = static_cast<std::int64_t>(col);
+    if (qxsmassign(a, i, j, 1, value) != SM_OK) return "assign";
   }
   if (qxsmclose(a, -1.0) != SM_OK) return "close";
   const std::array<double, 3> b = multiply({1.0, 2.0, 3.0});
@@ -48,16 +50,14 @@ const char* fit(SmInstance* instance) {
 }  // namespace
 
 int main() {
-  const std::unique_ptr<QxHost, void (*)(QxHost*)> host(qxhost_create(nullptr), qxhost_destroy);
-  auto* extension = static_cast<SmExtension*>(qxhost_load_extension(host.get(), L"qxesm", 5));
-  SmInstance* instance = extension ? CreateInstance(extension) : nullptr;
-  if (!instance) {
-    std::fprintf(stderr, "fit: no instance: %s\n", qxhost_last_error(host.get()));
-    return 1;
+  qxhost::Host host;
+  const char* wrong = nullptr;
+  {
+    qxhost::Extension extension(host);
+    qxhost::Instance instance(extension);
+    wrong = instance ? fit(instance) : host.last_error();
   }
-  const char* wrong = fit(instance);
-  qxsmDestroyInstance(&instance);
-  qxsmDestroyExtension(extension);
+  if (!wrong && host.usage().pools_live != 0) wrong = "a pool is left";
   if (wrong) {
     std::fprintf(stderr, "fit: %s\n", wrong);
     return 1;

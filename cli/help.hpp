@@ -1,0 +1,13 @@
+// The words of --help. The examples are real runs on the shipped files; a test repeats them.
+#pragma once
+
+namespace sm::cli::help {
+
+extern const char* const kMain;
+extern const char* const kInfo;
+extern const char* const kFactor;
+extern const char* const kSolve;
+extern const char* const kGrid;
+extern const char* const kExitCodes;
+
+}  // namespace sm::cli::help

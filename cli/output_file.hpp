@@ -1,0 +1,44 @@
+// A file that results are written to. It is opened before the work begins, so that a bad path does not cost a long run,
+// and changed only when there is something to write.
+#pragma once
+
+#include <fmt/format.h>
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+namespace sm::cli {
+
+class OutputFile {
+ public:
+  // "-" is standard output. Throws CommandError when the path cannot be written, or is one of the `inputs`.
+  OutputFile(std::string path, const std::vector<std::string>& inputs);
+  ~OutputFile();  // removes a file that this object created and did not finish
+  OutputFile(const OutputFile&) = delete;
+  OutputFile& operator=(const OutputFile&) = delete;
+
+  // The text is formatted into `buffer()`, and goes out through flush_if_full() and finish().
+  fmt::memory_buffer& buffer() { return buffer_; }
+  void flush_if_full();
+  void finish();
+
+  const std::string& path() const { return path_; }
+  bool is_standard_output() const;
+
+ private:
+  void refuse_inputs(const std::vector<std::string>& inputs) const;
+  void flush();
+
+  std::string path_;
+  int file_ = -1;
+  bool created_ = false;
+  bool finished_ = false;
+  fmt::memory_buffer buffer_;
+};
+
+// Writes columns as a Matrix Market array with 17 significant digits, enough for every double.
+void write_array(OutputFile& out, std::int64_t rows, std::int64_t cols, const double* values,
+                 const std::string& comment);
+
+}  // namespace sm::cli

@@ -1,0 +1,54 @@
+// A line on a terminal that says what a long run is at. Nothing appears in the first half second, nor where standard error
+// is no terminal.
+#pragma once
+
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <mutex>
+#include <string>
+#include <thread>
+
+namespace sm::cli {
+
+// The line is drawn by a thread of its own, as some phases run for long without a chance to report. Everything here is
+// called from one other thread.
+class Progress {
+ public:
+  using Milliseconds = std::chrono::milliseconds;
+
+  // Draws on the file descriptor `file` if `enabled`, for the first time after `quiet`, then every `interval`.
+  Progress(int file, bool enabled, Milliseconds quiet = Milliseconds(500), Milliseconds interval = Milliseconds(100));
+  ~Progress();  // takes the line away
+  Progress(const Progress&) = delete;
+  Progress& operator=(const Progress&) = delete;
+
+  // Starts a phase: "reading", or "numeric (1.5 Gflop)". Until the first update its share is unknown.
+  void phase(std::string name);
+  // How much of the phase is done, from 0 to 1. Cheap.
+  void update(double fraction) { fraction_.store(fraction, std::memory_order_relaxed); }
+
+  // The line itself: a bar, or the time so far where the share is unknown (negative).
+  static std::string line(const std::string& phase, double fraction, double seconds);
+
+ private:
+  void run();
+  void draw();
+
+  int file_;
+  Milliseconds quiet_;
+  Milliseconds interval_;
+  std::atomic<double> fraction_{-1.0};
+  std::mutex mutex_;  // guards the rest
+  std::condition_variable wake_;
+  std::string phase_;
+  std::chrono::steady_clock::time_point phase_start_;
+  bool drawn_ = false;
+  bool ended_ = false;
+  std::thread thread_;
+};
+
+// Whether progress may be shown on a file descriptor: a terminal that can move its cursor.
+bool is_capable_terminal(int file);
+
+}  // namespace sm::cli

@@ -1,0 +1,12 @@
+# Defined dynamic symbols: the entry points and nothing else. Undefined ones: no hidden new, throw or container.
+execute_process(COMMAND ${NM} -D --defined-only ${LIBRARY} OUTPUT_VARIABLE defined COMMAND_ERROR_IS_FATAL ANY)
+string(REGEX MATCHALL "[^ \n]+\n" names "${defined}")
+list(TRANSFORM names STRIP)
+list(SORT names)
+if(NOT names STREQUAL "qxeavl;qxextent;qxextver")
+  message(FATAL_ERROR "exported: ${names}")
+endif()
+execute_process(COMMAND ${NM} -D --undefined-only ${LIBRARY} OUTPUT_VARIABLE undefined COMMAND_ERROR_IS_FATAL ANY)
+if(undefined MATCHES "_Zn[wa]|_Zd[la]|_ZSt|_ZNSt|__cxa_(throw|allocate|begin|guard)|__gxx_personality|[ ]malloc|[ ]calloc")
+  message(FATAL_ERROR "imported: ${undefined}")
+endif()

@@ -1,0 +1,94 @@
+// The help teaches by examples; they are run here, and must print what the help shows.
+#include <regex>
+#include <sstream>
+
+#include "cli/command.hpp"
+
+namespace sm::test {
+namespace {
+
+class Help : public CommandTest {
+ protected:
+  // Numbers that differ between machines or runs are not compared: times, and what is rounding error.
+  static std::string comparable(const std::string& line) {
+    static const std::regex kVaries("^(relative residual[ 0-9]*|log-determinant|peak memory|numeric).*");
+    std::smatch match;
+    std::string text = std::regex_replace(line, std::regex(" +"), " ");
+    return std::regex_match(text, match, kVaries) ? match[1].str().substr(0, text.find_first_of("0123456789")) : text;
+  }
+
+  static std::vector<std::string> lines_of(const std::string& text) {
+    std::vector<std::string> lines;
+    std::istringstream stream(text);
+    for (std::string line; std::getline(stream, line);) lines.push_back(line);
+    return lines;
+  }
+
+  // Runs "qxsm ..." in a copy of the place where the help's paths lead somewhere.
+  Outcome run_line(const std::string& line) const {
+    std::istringstream words(line);
+    std::vector<std::string> arguments;
+    std::string word;
+    words >> word;
+    EXPECT_EQ(word, "qxsm");
+    while (words >> word) arguments.push_back(word.rfind("data/", 0) == 0 ? QXSM_SOURCE "/" + word : word);
+    return qxsm(arguments, {.folder = path("")});
+  }
+
+  // Answers how many lines of output were compared.
+  int repeat_examples(const std::string& help) const {
+    int compared = 0;
+    Outcome run;
+    for (const std::string& line : lines_of(help)) {
+      if (line.rfind("  $ ", 0) == 0) {
+        run = run_line(line.substr(4));
+        EXPECT_EQ(run.code, 0) << line << "\n" << run.err;
+        run.out = std::regex_replace(run.out, std::regex(QXSM_SOURCE "/"), "");
+      } else if (run.code == 0 && line.rfind("  ", 0) == 0 && line != "  ...") {
+        std::vector<std::string> printed;
+        for (const std::string& out : lines_of(run.out)) printed.push_back(comparable(out));
+        EXPECT_NE(std::find(printed.begin(), printed.end(), comparable(line.substr(2))), printed.end()) << line << "\n"
+                                                                                                        << run.out;
+        ++compared;
+      } else if (line.empty() && compared > 0) {
+        break;
+      }
+    }
+    return compared;
+  }
+};
+
+TEST_F(Help, explains_purpose_example_options_and_exit_codes) {
+  for (const char* command : {"info", "factor", "solve", "grid"}) {
+    const Outcome run = qxsm({command, "--help"});
+    EXPECT_EQ(run.code, 0);
+    EXPECT_EQ(run.err, "");
+    std::size_t position = 0;
+    for (const std::string& part :
+         {std::string("Example"), std::string("$ qxsm ") + command, std::string("Usage: qxsm ") + command,
+          std::string("Options:"), std::string("--json"), std::string("Exit codes:"), std::string("  0  "),
+          std::string("  1  "), std::string("  2  "), std::string("  3  ")}) {
+      position = run.out.find(part, position);
+      ASSERT_NE(position, std::string::npos) << part << " in order in\n" << run.out;
+    }
+  }
+}
+
+TEST_F(Help, lists_the_subcommands_with_their_purpose) {
+  const Outcome run = qxsm({"--help"});
+  EXPECT_EQ(run.code, 0);
+  for (const char* part : {"  info      Show what a file holds", "  factor    Order and factor",
+                           "  solve     Solve A x = b", "  grid      Write the matrix", "Exit codes:"}) {
+    EXPECT_NE(run.out.find(part), std::string::npos) << part << " in\n" << run.out;
+  }
+}
+
+TEST_F(Help, shows_examples_that_print_what_it_says) {
+  for (const std::vector<std::string>& command : std::vector<std::vector<std::string>>{
+           {"--help"}, {"info", "--help"}, {"factor", "--help"}, {"solve", "--help"}}) {
+    EXPECT_GE(repeat_examples(qxsm(command).out), 4) << command[0];
+  }
+}
+
+}  // namespace
+}  // namespace sm::test

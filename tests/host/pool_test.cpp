@@ -1,0 +1,298 @@
+// Pools in normal operation: tiers, zeros, alignment, accounts, ceilings, and what memory they cost.
+#include <gtest/gtest.h>
+#include <qxhost/qxhost.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <cstring>
+#include <limits>
+#include <set>
+#include <vector>
+
+namespace {
+
+constexpr std::uint64_t kMiB = std::uint64_t{1} << 20;
+// Around every border between size classes and tiers.
+const std::vector<std::uint64_t> kSizes = {0,    1,    15,   16,   17,     255,    256,    257,    320,  321,     1024,
+                                           4095, 4096, 4097, 8192, 131071, 131072, 131073, 200000, kMiB, 5 * kMiB};
+
+// Pages of the process that are in memory, in bytes.
+std::int64_t resident_bytes() {
+  long size = 0;
+  long resident = 0;
+  std::FILE* statm = std::fopen("/proc/self/statm", "r");
+  if (!statm) return -1;
+  const int read = std::fscanf(statm, "%ld %ld", &size, &resident);
+  std::fclose(statm);
+  return read == 2 ? resident * sysconf(_SC_PAGESIZE) : -1;
+}
+
+class PoolTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    ASSERT_NE(host, nullptr);
+    pool = create_pool();
+    ASSERT_NE(pool, nullptr);
+  }
+  void TearDown() override { qxhost_destroy(host); }
+
+  MemoryPool* create_pool() {
+    HostServices* services = qxhost_services(host);
+    const PoolParms parms = {SM_POOL_MATRIX, {0, 0}};
+    return services->create_pool(services, &parms, nullptr, nullptr);
+  }
+  char* take(std::uint64_t bytes, std::uint32_t flags = 0) {
+    return static_cast<char*>(pool->allocate(pool, bytes, flags));
+  }
+  QxHostUsage usage() { return qxhost_usage(host); }
+
+  QxHost* host = qxhost_create(nullptr);
+  MemoryPool* pool = nullptr;
+};
+
+bool all_equal(const char* block, std::uint64_t bytes, char value) {
+  return std::all_of(block, block + bytes, [value](char c) { return c == value; });
+}
+bool all_zero(const char* block, std::uint64_t bytes) { return all_equal(block, bytes, 0); }
+
+TEST_F(PoolTest, blocks_of_every_tier_are_aligned_and_hold_what_is_written_to_them) {
+  std::vector<char*> blocks;
+  for (std::size_t k = 0; k < kSizes.size(); ++k) {
+    blocks.push_back(take(kSizes[k]));
+    ASSERT_NE(blocks[k], nullptr) << kSizes[k];
+    EXPECT_EQ(reinterpret_cast<std::uintptr_t>(blocks[k]) % 16, 0U) << kSizes[k];
+    std::memset(blocks[k], static_cast<int>(k + 1), kSizes[k]);
+  }
+  for (std::size_t k = 0; k < kSizes.size(); ++k) {
+    EXPECT_TRUE(all_equal(blocks[k], kSizes[k], static_cast<char>(k + 1))) << kSizes[k];
+  }
+}
+
+TEST_F(PoolTest, a_zero_filled_block_is_zero_also_where_memory_is_used_again) {
+  for (const std::uint64_t bytes : kSizes) {
+    for (int round = 0; round < 3; ++round) {
+      char* block = take(bytes, SM_POOL_ZERO);
+      ASSERT_NE(block, nullptr) << bytes;
+      EXPECT_TRUE(all_zero(block, bytes)) << bytes << " bytes, round " << round;
+      std::memset(block, 0xFF, bytes);
+      pool->free(pool, block);
+    }
+  }
+}
+
+TEST_F(PoolTest, a_freed_small_block_is_served_again_for_the_same_size_class) {
+  char* first = take(100);
+  pool->free(pool, first);
+  EXPECT_EQ(take(112), first);
+  EXPECT_NE(take(112), first);
+}
+
+TEST_F(PoolTest, requests_for_no_bytes_are_answered_with_distinct_blocks) {
+  std::set<char*> blocks;
+  for (int k = 0; k < 10; ++k) blocks.insert(take(0));
+  EXPECT_EQ(blocks.size(), 10U);
+  EXPECT_EQ(blocks.count(nullptr), 0U);
+  EXPECT_EQ(usage().bytes_in_use, 0U);
+}
+
+TEST_F(PoolTest, sizes_that_nothing_can_hold_are_answered_with_null) {
+  constexpr std::uint64_t kLargest = std::numeric_limits<std::uint64_t>::max();
+  for (const std::uint64_t bytes : {kLargest, kLargest - 15, kLargest - 63, kLargest - 64, kLargest - 4159,
+                                    kLargest / 2 + 1, std::uint64_t{1} << 60, std::uint64_t{1} << 47}) {
+    EXPECT_EQ(take(bytes), nullptr) << bytes;
+    EXPECT_EQ(take(bytes, SM_POOL_ZERO), nullptr) << bytes;
+  }
+  EXPECT_EQ(usage().bytes_in_use, 0U);
+  EXPECT_EQ(usage().bytes_peak, 0U);
+  EXPECT_EQ(qxhost_ceiling_was_met(host), 0);
+}
+
+TEST_F(PoolTest, freeing_null_is_harmless) {
+  pool->free(pool, nullptr);
+  EXPECT_EQ(usage().bytes_in_use, 0U);
+}
+
+TEST_F(PoolTest, usage_counts_requested_bytes_and_remembers_the_peak) {
+  char* small = take(100);
+  char* medium = take(10'000);
+  char* large = take(kMiB);
+  EXPECT_EQ(usage().bytes_in_use, 100 + 10'000 + kMiB);
+  pool->free(pool, large);
+  EXPECT_EQ(usage().bytes_in_use, 10'100U);
+  pool->free(pool, small);
+  pool->free(pool, medium);
+  EXPECT_EQ(usage().bytes_in_use, 0U);
+  take(50);
+  EXPECT_EQ(usage().bytes_in_use, 50U);
+  EXPECT_EQ(usage().bytes_peak, 100 + 10'000 + kMiB);
+}
+
+TEST_F(PoolTest, outside_the_checking_mode_blocks_and_requests_are_not_counted) {
+  take(10);
+  EXPECT_EQ(usage().blocks_live, 0);
+  EXPECT_EQ(usage().requests, 0);
+}
+
+TEST_F(PoolTest, destroying_a_pool_gives_back_all_its_blocks_and_no_other) {
+  MemoryPool* other = create_pool();
+  auto* kept = static_cast<char*>(other->allocate(other, 1000, SM_POOL_ZERO));
+  for (const std::uint64_t bytes : kSizes) {
+    for (int k = 0; k < 20; ++k) ASSERT_NE(take(bytes), nullptr);
+  }
+  EXPECT_EQ(usage().pools_live, 2);
+  pool->destroy(pool);
+  EXPECT_EQ(usage().pools_live, 1);
+  EXPECT_EQ(usage().bytes_in_use, 1000U);
+  EXPECT_TRUE(all_zero(kept, 1000));
+}
+
+TEST_F(PoolTest, pools_go_in_any_order) {
+  std::vector<MemoryPool*> pools;
+  for (int k = 0; k < 5; ++k) pools.push_back(create_pool());
+  for (const int k : {2, 0, 4, 3, 1}) pools[static_cast<std::size_t>(k)]->destroy(pools[static_cast<std::size_t>(k)]);
+  EXPECT_EQ(usage().pools_live, 1);
+  EXPECT_NE(take(64), nullptr);
+}
+
+TEST_F(PoolTest, large_blocks_are_freed_in_any_order) {
+  std::vector<char*> blocks;
+  for (int k = 0; k < 6; ++k) blocks.push_back(take(k % 2 == 0 ? kMiB : 9000, SM_POOL_ZERO));
+  for (const std::size_t k : {3U, 0U, 5U, 2U}) pool->free(pool, blocks[k]);
+  EXPECT_EQ(usage().bytes_in_use, kMiB + 9000);
+  EXPECT_TRUE(all_zero(blocks[4], kMiB));
+  EXPECT_TRUE(all_zero(blocks[1], 9000));
+}
+
+// One of the module's slabs of nodes at its largest.
+TEST_F(PoolTest, a_slab_of_640_megabytes_that_is_not_touched_costs_no_memory) {
+  const std::int64_t before = resident_bytes();
+  char* zeroed = take(640 * kMiB, SM_POOL_ZERO);
+  char* plain = take(640 * kMiB - 64);  // with its head a whole number of huge pages
+  ASSERT_NE(zeroed, nullptr);
+  ASSERT_NE(plain, nullptr);
+  ASSERT_GT(before, 0);
+  EXPECT_LT(resident_bytes() - before, std::int64_t{kMiB} / 2);
+  EXPECT_EQ(zeroed[0], 0);
+  EXPECT_EQ(zeroed[320 * kMiB], 0);
+  EXPECT_EQ(zeroed[640 * kMiB - 1], 0);
+}
+
+TEST_F(PoolTest, a_freed_large_block_goes_back_to_the_system_at_once) {
+  char* block = take(64 * kMiB);
+  ASSERT_NE(block, nullptr);
+  const std::int64_t before = resident_bytes();
+  std::memset(block, 1, 64 * kMiB);
+  EXPECT_GT(resident_bytes() - before, 60 * std::int64_t{kMiB});
+  pool->free(pool, block);
+  EXPECT_LT(resident_bytes() - before, 4 * std::int64_t{kMiB});
+}
+
+TEST_F(PoolTest, a_large_block_is_made_of_fresh_pages_also_after_others_were_used_and_freed) {
+  for (int round = 0; round < 4; ++round) {
+    const std::int64_t before = resident_bytes();
+    char* block = take(20 * kMiB, SM_POOL_ZERO);
+    ASSERT_NE(block, nullptr);
+    EXPECT_LT(resident_bytes() - before, std::int64_t{kMiB}) << "round " << round;
+    std::memset(block, 1, 20 * kMiB);
+    pool->free(pool, block);
+  }
+}
+
+TEST_F(PoolTest, past_the_hosts_ceiling_requests_are_answered_with_null) {
+  qxhost_set_memory_ceiling(host, 10'000);
+  MemoryPool* other = create_pool();
+  char* first = take(6'000);
+  ASSERT_NE(first, nullptr);
+  EXPECT_EQ(qxhost_ceiling_was_met(host), 0);
+  EXPECT_EQ(other->allocate(other, 4'001, 0), nullptr);
+  EXPECT_NE(qxhost_ceiling_was_met(host), 0);
+  EXPECT_NE(other->allocate(other, 4'000, 0), nullptr);
+  EXPECT_EQ(take(1), nullptr);
+  EXPECT_NE(take(0), nullptr);
+  pool->free(pool, first);
+  EXPECT_NE(take(6'000), nullptr);
+  EXPECT_EQ(usage().bytes_peak, 10'000U);
+}
+
+TEST_F(PoolTest, a_destroyed_pool_makes_room_below_the_ceiling) {
+  qxhost_set_memory_ceiling(host, 2 * kMiB);
+  ASSERT_NE(take(2 * kMiB), nullptr);
+  EXPECT_EQ(take(1), nullptr);
+  pool->destroy(pool);
+  pool = create_pool();
+  EXPECT_NE(take(2 * kMiB), nullptr);
+}
+
+TEST_F(PoolTest, a_pools_own_ceiling_binds_that_pool_only) {
+  MemoryPool* other = create_pool();
+  ASSERT_EQ(qxhost_set_pool_ceiling(host, pool, 1'000), 0);
+  EXPECT_EQ(take(1'001), nullptr);
+  EXPECT_NE(qxhost_ceiling_was_met(host), 0);
+  EXPECT_NE(take(1'000), nullptr);
+  EXPECT_EQ(take(1), nullptr);
+  EXPECT_NE(other->allocate(other, 5'000, 0), nullptr);
+  ASSERT_EQ(qxhost_set_pool_ceiling(host, pool, 0), 0);
+  EXPECT_NE(take(5'000), nullptr);
+}
+
+TEST_F(PoolTest, a_pool_of_another_host_gets_no_ceiling) {
+  QxHost* stranger = qxhost_create(nullptr);
+  ASSERT_NE(stranger, nullptr);
+  EXPECT_EQ(qxhost_set_pool_ceiling(stranger, pool, 1), -1);
+  EXPECT_EQ(qxhost_set_pool_ceiling(host, nullptr, 1), -1);
+  EXPECT_NE(take(1'000), nullptr);
+  qxhost_destroy(stranger);
+}
+
+TEST_F(PoolTest, a_ceiling_below_what_is_out_refuses_until_enough_came_back) {
+  char* first = take(6'000);
+  char* second = take(3'000);
+  qxhost_set_memory_ceiling(host, 4'000);
+  EXPECT_EQ(take(1), nullptr);
+  pool->free(pool, first);
+  EXPECT_EQ(take(1'001), nullptr);
+  EXPECT_NE(take(1'000), nullptr);
+  pool->free(pool, second);
+  qxhost_set_memory_ceiling(host, 0);
+  EXPECT_NE(take(kMiB), nullptr);
+}
+
+TEST_F(PoolTest, sizes_near_two_to_the_64_do_not_wrap_past_a_ceiling) {
+  qxhost_set_memory_ceiling(host, 10'000);
+  take(5'000);
+  EXPECT_EQ(take(std::numeric_limits<std::uint64_t>::max() - 4'000), nullptr);
+  EXPECT_NE(qxhost_ceiling_was_met(host), 0);
+  EXPECT_EQ(usage().bytes_in_use, 5'000U);
+}
+
+TEST(Host, takes_its_ceiling_from_the_options) {
+  const QxHostOptions options = {1'000, 0};
+  QxHost* host = qxhost_create(&options);
+  ASSERT_NE(host, nullptr);
+  HostServices* services = qxhost_services(host);
+  const PoolParms parms = {};
+  MemoryPool* pool = services->create_pool(services, &parms, nullptr, nullptr);
+  EXPECT_EQ(pool->allocate(pool, 1'001, 0), nullptr);
+  EXPECT_NE(pool->allocate(pool, 1'000, 0), nullptr);
+  qxhost_destroy(host);
+}
+
+TEST(Host, destroying_null_is_harmless_and_destroying_a_host_ends_its_pools) {
+  qxhost_destroy(nullptr);
+  const std::int64_t before = resident_bytes();
+  QxHost* host = qxhost_create(nullptr);
+  HostServices* services = qxhost_services(host);
+  const PoolParms parms = {};
+  for (int k = 0; k < 4; ++k) {
+    MemoryPool* pool = services->create_pool(services, &parms, nullptr, nullptr);
+    void* block = pool->allocate(pool, 16 * kMiB, 0);
+    ASSERT_NE(block, nullptr);
+    std::memset(block, 1, 16 * kMiB);
+  }
+  EXPECT_GT(resident_bytes() - before, 60 * std::int64_t{kMiB});
+  qxhost_destroy(host);
+  EXPECT_LT(resident_bytes() - before, 4 * std::int64_t{kMiB});
+}
+
+}  // namespace
