@@ -173,5 +173,31 @@ TEST_P(ChangedValuesTest, resizing_drops_the_factor) {
   EXPECT_EQ(rank, 0);
 }
 
+TEST_P(ChangedValuesTest, a_refused_size_takes_the_state_to_1_with_the_rows_as_they_were_closed) {
+  Random random(12);
+  const Problem problem = positive_definite(random_graph(random, 12, 40), random);
+  for (std::int32_t state = SM_STATE_CLOSED; state <= SM_STATE_FACTORED; ++state) {
+    SmMatrix* m = new_sparse(session(), problem);
+    const StoredRows rows = rows_of(m);
+    ASSERT_EQ(bring_to(m, state), SM_OK);
+    EXPECT_EQ(fn().qxsmresize(m, 12, 11), SM_NOT_SQUARE);
+    EXPECT_EQ(m->state, SM_STATE_CLOSED);
+    EXPECT_TRUE(rows_of(m) == rows) << "from state " << state;
+    const std::vector<double> b = random.vector(12);
+    EXPECT_TRUE(near(product(problem.dense(), solve(m, b)), b, 1e-13)) << "from state " << state;
+  }
+}
+
+TEST_P(ChangedValuesTest, a_refused_size_leaves_no_separate_factor_in_use) {
+  for (SmMatrix* m :
+       {new_packed(session(), problem_of({{4, 2}, {2, 5}}), SM_FORMAT_COLUMNS),
+        new_packed(session(), problem_of({{4, 2}, {2, 5}}), SM_FORMAT_ROWS), new_diagonal(session(), {6.0, 7.0})}) {
+    ASSERT_EQ(fn().qxsmfact(m, 0), SM_OK);
+    EXPECT_EQ(fn().qxsmresize(m, 2, 3), SM_NOT_SQUARE);
+    EXPECT_EQ(m->state, SM_STATE_CLOSED);
+    EXPECT_TRUE(near(solve(m, {6.0, 7.0}), {1.0, 1.0}, 1e-15));
+  }
+}
+
 }  // namespace
 }  // namespace sm::test

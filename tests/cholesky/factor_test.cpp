@@ -194,6 +194,9 @@ TEST_P(FactorTest, a_separate_diagonal_that_failed_is_filled_again_or_given_back
   data[2] = 25.0;
   EXPECT_EQ(factor(m, 0), SM_OK);
   EXPECT_EQ(doubles(m->dense_factor, 3), (std::vector<double>{4.0, 1.0, 5.0}));
+  EXPECT_EQ(m->rank, 3);  // counted anew
+  EXPECT_EQ(m->definite, 1);
+  EXPECT_DOUBLE_EQ(m->log_det, std::log(400.0));
   EXPECT_EQ(host().live_blocks(), blocks + 1);
 
   std::vector<double> other{4.0, -1.0, 9.0};

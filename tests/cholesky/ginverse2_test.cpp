@@ -157,7 +157,10 @@ TEST_P(DenseInverseTest, order_one_gives_the_reciprocal_or_zero) {
     EXPECT_EQ(run({4.0}, 1, kFactor, format).array[0], 2.0);
     EXPECT_EQ(run({2.0}, 1, kInvertFactor, format).array[0], 0.25);
     EXPECT_EQ(run({0.0}, 1, kInvertFactor, format).array[0], 0.0);
-    EXPECT_EQ(run({-3.0}, 1, kInvertFactor, format).array[0], 0.0);  // no factor has it but a dropped row
+    const Answer negative = run({-3.0}, 1, kInvertFactor, format);  // counts as dropped
+    EXPECT_EQ(negative.array[0], 0.0);
+    EXPECT_EQ(negative.rank, 0);
+    EXPECT_EQ(negative.log_det, 0.0);
   }
 }
 

@@ -193,26 +193,4 @@ std::vector<Vertex> MinimumDegree::run() {
 
 std::vector<std::int64_t> minimum_degree_reference(const Graph& graph) { return MinimumDegree(graph).run(); }
 
-std::vector<std::vector<std::int64_t>> true_fill(const Graph& graph, const std::vector<std::int64_t>& perm) {
-  const auto n = static_cast<std::size_t>(graph.n);
-  std::vector<std::size_t> place(n);
-  for (std::size_t k = 0; k < n; ++k) place[static_cast<std::size_t>(perm[k])] = k;
-  std::vector<std::vector<bool>> linked(n, std::vector<bool>(n, false));
-  for (const auto& [i, j] : graph.edges) {
-    const std::size_t a = place[static_cast<std::size_t>(i)];
-    const std::size_t b = place[static_cast<std::size_t>(j)];
-    linked[a][b] = true;
-    linked[b][a] = true;
-  }
-  std::vector<std::vector<std::int64_t>> rows(n);
-  for (std::size_t k = 0; k < n; ++k) {
-    for (std::size_t j = k + 1; j < n; ++j)
-      if (linked[k][j]) rows[k].push_back(static_cast<std::int64_t>(j));
-    for (const std::int64_t a : rows[k])
-      for (const std::int64_t b : rows[k])
-        if (a != b) linked[static_cast<std::size_t>(a)][static_cast<std::size_t>(b)] = true;
-  }
-  return rows;
-}
-
 }  // namespace sm::test

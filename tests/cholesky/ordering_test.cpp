@@ -105,12 +105,13 @@ TEST_P(OrderingTest, a_matrix_without_edges_is_ordered_from_the_last_row_to_the_
 }
 
 TEST_P(OrderingTest, entries_below_the_diagonal_create_no_edges) {
-  SmMatrix* m = closed(path(3));  // rows {0, 1}, {1, 2}, {2}
+  SmMatrix* m = closed(path(4));  // rows {0, 1}, {1, 2}, {2, 3}, {3}
   m->col_index[1] = 0;            // two diagonals in row 0
   m->col_index[3] = 0;            // (1, 0) instead of (1, 2)
+  m->col_index[5] = 0;            // (2, 0) instead of (2, 3)
   const StoredRows before = rows_of(m);
   ASSERT_EQ(qxsmmd(m), SM_OK);
-  EXPECT_EQ(words(m->perm, 3), (Indices{2, 1, 0}));
+  EXPECT_EQ(words(m->perm, 4), (Indices{3, 2, 1, 0}));
   EXPECT_TRUE(rows_of(m) == before);
 }
 
@@ -145,7 +146,9 @@ TEST_P(OrderingTest, a_workspace_that_overflows_grows_and_gives_the_same_order) 
       SmMatrix* m = closed(graph);
       const StoredRows before = rows_of(m);
       m->work_capacity = given;
+      const std::int64_t blocks = host().live_blocks();
       ASSERT_EQ(qxsmmd(m), SM_OK);
+      EXPECT_EQ(host().live_blocks(), blocks + 3);  // smaller ones went back
       EXPECT_EQ(words(m->perm, graph.n), want) << "from " << given;
       EXPECT_EQ(m->work_capacity, expected_capacity(m, given, static_cast<std::int64_t>(graph.edges.size())))
           << graph.n << " vertices from " << given;

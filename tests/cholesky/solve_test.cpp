@@ -100,7 +100,7 @@ TEST_P(SubstitutionTest, a_negative_diagonal_of_a_packed_factor_counts_as_droppe
   for (const std::int32_t format : {SM_FORMAT_COLUMNS, SM_FORMAT_ROWS}) {
     SmMatrix* m = new_packed(session(), problem_of({{4, 2}, {2, 5}}), format);
     ASSERT_EQ(fn().qxsmfact(m, 1), SM_OK);  // R = [2 1; 0 2]
-    m->values[2] = -1.0;
+    m->values[2] = -2.0;
     const std::vector<double> b{2.0, 5.0};
     std::vector<double> x(2);
     ASSERT_EQ(fn().qxsmsubst(m, b.data(), x.data(), 1), SM_OK);

@@ -1,7 +1,7 @@
 #include <algorithm>
 
 #include "cholesky/cholesky_support.hpp"
-#include "cholesky/ordering_reference.hpp"
+#include "cholesky/structure_reference.hpp"
 
 namespace sm::test {
 namespace {
@@ -55,7 +55,10 @@ TEST_P(SymbolicTest, finds_the_true_fill_of_random_structures) {
     const StoredRows rows = rows_of(m);
     ASSERT_EQ(qxsmsymbfact(m), SM_OK) << "seed " << seed;
     expect_well_formed(m);
-    EXPECT_EQ(stored_structure(m), true_fill(graph, words(m->perm, graph.n))) << "seed " << seed;
+    const Indices perm = words(m->perm, graph.n);
+    EXPECT_EQ(stored_structure(m), true_fill(graph, perm)) << "seed " << seed;
+    EXPECT_EQ(words(m->factor_ju, m->factor_iju[graph.n - 1] + 1), compressed_subscripts(graph, perm))
+        << "seed " << seed;
     EXPECT_TRUE(rows_of(m) == rows);
     destroy(m);
     if (HasFailure()) FAIL() << "seed " << seed;
@@ -154,6 +157,18 @@ TEST_P(SymbolicTest, a_workspace_too_small_grows_by_the_shortfall_and_gives_the_
       destroy(m);
     }
   }
+}
+
+TEST_P(SymbolicTest, a_workspace_that_is_just_large_enough_stays) {
+  SmMatrix* large = reordered_matrix(grid(5, 5));
+  ASSERT_EQ(qxsmsymbfact(large), SM_OK);
+  SmMatrix* m = reordered_matrix(grid(5, 5));
+  replace_work(m, words_needed(large));
+  const std::int64_t* work = m->work;
+  host().fail_request(0, true);
+  EXPECT_EQ(qxsmsymbfact(m), SM_OK);
+  EXPECT_EQ(host().stop_failing(), 0);  // nothing was asked for
+  EXPECT_EQ(m->work, work);
 }
 
 TEST_P(SymbolicTest, the_smallest_workspace_that_ordering_leaves_serves) {
