@@ -1,0 +1,151 @@
+// Every request of the traces refused in turn, once and from then on.
+#include <gtest/gtest.h>
+
+#include "cholesky/cholesky_support.hpp"
+#include "store/filled.hpp"
+
+namespace sm::test {
+namespace {
+
+constexpr Shape kWithInverse[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalColumns, kDiagonalRows};
+
+struct Operands {
+  Filled a;
+  Filled b;
+};
+
+class TraceAllocation : public ::testing::TestWithParam<HostKind> {
+ protected:
+  // Positive definite where the shape can be, and the same each time.
+  static Operands operands(Session& session, Shape sa, Shape sb) {
+    Random random(11);
+    const auto make = [&](Shape shape) {
+      return shape.kind == SM_KIND_GENERAL ? filled(session, shape, 9, 9, random)
+                                           : filled_definite(session, shape, 9, random);
+    };
+    Filled a = make(sa);
+    Filled b = make(sb);
+    return {a, b};
+  }
+  static double trace_of_product(const Dense& a, const Dense& b) {
+    long double sum = 0.0L;
+    const Dense p = product(a, b);
+    for (std::int64_t i = 0; i < p.rows(); ++i) sum += p(i, i);
+    return static_cast<double>(sum);
+  }
+};
+
+TEST_P(TraceAllocation, a_diagonal_matrix_needs_one_vector_and_gives_it_back) {
+  for (const Shape sa : {kDiagonalColumns, kDiagonalRows})
+    for (const Shape sb : kShapes) {
+      SCOPED_TRACE(name_of(sa) + ", " + name_of(sb));
+      std::int64_t sessions = 0;
+      survives_every_allocation_failure(
+          GetParam(),
+          [&](Session& session) {
+            ++sessions;
+            return operands(session, sa, sb);
+          },
+          [](Session& session, Operands& o) {
+            const std::int64_t blocks = session.host().live_blocks();
+            double result = 0.0;
+            const SmStatus status = session.fn().qxsmtraceAB(o.a.matrix, o.b.matrix, &result);
+            if (status == SM_OK) {
+              EXPECT_EQ(result, trace_of_product(o.a.dense, o.b.dense));
+            } else {
+              EXPECT_TRUE(is_missing(result));
+            }
+            EXPECT_EQ(session.host().live_blocks(), blocks);
+            return status;
+          });
+      EXPECT_EQ(sessions, 4) << "one request, once and for ever";
+    }
+}
+
+TEST_P(TraceAllocation, two_sparse_matrices_without_a_vector_answer_0_and_the_missing_value) {
+  for (std::int32_t state = SM_STATE_CLOSED; state <= SM_STATE_FACTORED; ++state)
+    for (const bool for_ever : {false, true}) {
+      Session session(GetParam());
+      const Operands o = operands(session, kSymmetricSparse, kSymmetricSparse);
+      ASSERT_EQ(bring_to(o.a.matrix, state), SM_OK);
+      const std::int64_t blocks = session.host().live_blocks();
+      double result = 0.0;
+      session.host().fail_request(0, for_ever);
+      EXPECT_EQ(session.fn().qxsmtraceAB(o.a.matrix, o.b.matrix, &result), SM_OK);
+      EXPECT_EQ(session.host().stop_failing(), 1);
+      EXPECT_TRUE(is_missing(result));
+      EXPECT_EQ(session.host().live_blocks(), blocks);
+      EXPECT_EQ(session.fn().qxsmtraceAB(o.a.matrix, o.b.matrix, &result), SM_OK);
+      EXPECT_EQ(result, trace_of_product(o.a.dense, o.b.dense));
+      EXPECT_EQ(session.host().live_blocks(), blocks);
+      session.host().fail_request(1, for_ever);
+      EXPECT_EQ(session.fn().qxsmtraceAB(o.a.matrix, o.b.matrix, &result), SM_OK);
+      EXPECT_EQ(session.host().stop_failing(), 0) << "one vector is all it needs";
+      EXPECT_EQ(result, trace_of_product(o.a.dense, o.b.dense));
+    }
+}
+
+TEST_P(TraceAllocation, every_other_pair_and_the_trace_of_one_matrix_need_no_memory) {
+  for (const Shape sa : kShapes)
+    for (const Shape sb : kShapes) {
+      if (sa.kind == SM_KIND_DIAGONAL) continue;
+      if (sa.kind == SM_KIND_SYMMETRIC && is_sparse(sa) && sb.kind == SM_KIND_SYMMETRIC && is_sparse(sb)) continue;
+      Session session(GetParam());
+      const Operands o = operands(session, sa, sb);
+      double result = 0.0;
+      session.host().fail_request(0, true);
+      const SmStatus status = session.fn().qxsmtraceAB(o.a.matrix, o.b.matrix, &result);
+      EXPECT_EQ(session.host().stop_failing(), 0) << name_of(sa) << ", " << name_of(sb);
+      if (status == SM_OK) {
+        EXPECT_EQ(result, trace_of_product(o.a.dense, o.b.dense)) << name_of(sa) << ", " << name_of(sb);
+      } else {
+        EXPECT_EQ(status, SM_UNAVAILABLE);
+      }
+      session.host().fail_request(0, true);
+      EXPECT_EQ(session.fn().qxsmtrace(o.a.matrix, &result), SM_OK);
+      EXPECT_EQ(session.host().stop_failing(), 0);
+      EXPECT_EQ(result, trace_of_product(o.a.dense, identity(9)));
+    }
+}
+
+TEST_P(TraceAllocation, the_trace_with_an_inverse_leaves_nothing_but_the_factor) {
+  for (const Shape sa : kWithInverse)
+    for (const Shape sb : kShapes)
+      for (const bool factored : {false, true}) {
+        SCOPED_TRACE(name_of(sa) + ", " + name_of(sb));
+        for (const bool for_ever : {false, true}) {
+          std::int64_t k = 0;
+          for (bool met = true; met; ++k) {
+            Session session(GetParam());
+            const Operands o = operands(session, sa, sb);
+            if (factored) {
+              ASSERT_EQ(session.fn().qxsmfact(o.a.matrix, 0), SM_OK);
+            }
+            const std::int64_t others = session.host().live_blocks() - owned_blocks(o.a.matrix);
+            const double expected = trace_of_product(inverse(o.a.dense), transposed(o.b.dense));
+            double result = 0.0;
+            session.host().fail_request(k, for_ever);
+            const SmStatus status = qxsmtraceinvAB(o.a.matrix, o.b.matrix, 0, &result);
+            met = session.host().stop_failing() > 0;
+            EXPECT_EQ(status, met ? SM_NO_MEMORY : SM_OK) << k;
+            if (met) {
+              // Missing before the sum began, and else what was summed before the work of a solve could not be had.
+              EXPECT_TRUE(is_missing(result) || o.a.matrix->state == SM_STATE_FACTORED) << k;
+            } else {
+              EXPECT_NEAR(result, expected, 1e-10);
+            }
+            EXPECT_EQ(session.host().live_blocks(), others + owned_blocks(o.a.matrix)) << k;
+            EXPECT_EQ(qxsmtraceinvAB(o.a.matrix, o.b.matrix, 0, &result), SM_OK) << k;
+            EXPECT_NEAR(result, expected, 1e-10);
+            EXPECT_EQ(session.host().live_blocks(), others + owned_blocks(o.a.matrix)) << k;
+            EXPECT_EQ(session.host().violations(), 0);
+          }
+          EXPECT_GE(k - 1, 2) << "two vectors at least";
+        }
+      }
+}
+
+INSTANTIATE_BOTH_HOSTS(TraceAllocation);
+
+}  // namespace
+}  // namespace sm::test
