@@ -10,6 +10,15 @@ namespace {
 class Lifecycle : public StoreTest {
  protected:
   SmMatrix* last_registered() { return instance()->registry[instance()->matrix_count - 1]; }
+  // Ends a tree manager that no matrix knows any more.
+  static void let_go(NonzeroTree* tree) {
+    if (TreeInner* inner = tree->inner) {
+      inner->reset(inner, 1, 1);
+      tree->cleared_word = nullptr;
+      inner->release(inner);
+    }
+    tree->destroy(tree);
+  }
 };
 
 void expect_fresh(const SmMatrix* m, Shape shape) {
@@ -137,6 +146,45 @@ TEST_P(Lifecycle, a_record_in_use_is_typed_again_as_it_stands) {
   EXPECT_EQ(host().live_pools(), pools + 1);
   EXPECT_EQ(instance()->matrix_count, count);
   held->destroy(held);
+}
+
+TEST_P(Lifecycle, a_factored_record_typed_again_points_at_nothing_it_had) {
+  for (const Shape shape : kShapes) {
+    SCOPED_TRACE(name_of(shape));
+    SmMatrix* m = definite(kSymmetricSparse);
+    ASSERT_EQ(fn().qxsmfact(m, 0), SM_OK);
+    MemoryPool* held = m->pool;
+    NonzeroTree* tree = m->tree;
+    ASSERT_EQ(fn().qxsmnew(instance(), &m, shape.kind, shape.format), SM_OK);
+    EXPECT_EQ(m->kind, shape.kind);
+    EXPECT_EQ(m->row_start, nullptr);
+    EXPECT_EQ(m->values, nullptr);
+    EXPECT_EQ(m->solver_word, 0);
+    const bool tree_is_left = m->tree != tree;
+    if (is_sparse(shape)) {
+      EXPECT_TRUE(tree_is_left) << "a type of its own, a tree of its own";
+    }
+    if (shape.kind == SM_KIND_SYMMETRIC && is_sparse(shape)) expect_fresh(m, shape);
+    EXPECT_EQ(fn().qxsmresize(m, 3, 3), SM_OK);
+    EXPECT_EQ(fn().qxsmdelete(m), SM_OK);
+    held->destroy(held);
+    if (tree_is_left) let_go(tree);
+  }
+}
+
+TEST_P(Lifecycle, a_record_of_another_instance_is_registered_where_it_is_typed) {
+  SmInstance* other = CreateInstance(session().extension());
+  ASSERT_NE(other, nullptr);
+  SmMatrix* m = nullptr;
+  for (int k = 0; k < 15; ++k) m = typed(kGeneralRows);
+  ASSERT_EQ(fn().qxsmdelete(m), SM_OK);
+  ASSERT_EQ(fn().qxsmnew(other, &m, SM_KIND_GENERAL, SM_FORMAT_ROWS), SM_OK);
+  EXPECT_EQ(m->instance, other);
+  ASSERT_LE(m->registry_index, other->matrix_count);
+  ASSERT_GE(m->registry_index, 1);
+  EXPECT_EQ(other->registry[m->registry_index - 1], m);
+  EXPECT_EQ(qxsmDestroyInstance(&other), SM_OK);
+  EXPECT_EQ(m->kind, SM_KIND_NONE);
 }
 
 TEST_P(Lifecycle, a_reset_record_gets_its_registry_slot_back) {
