@@ -172,6 +172,18 @@ TEST_P(Lifecycle, a_factored_record_typed_again_points_at_nothing_it_had) {
   }
 }
 
+TEST_P(Lifecycle, an_open_record_typed_again_points_at_nothing_it_had) {
+  SmMatrix* m = square(kSymmetricSparse, 3);
+  MemoryPool* held[] = {m->pool, m->assembly_pool};
+  NonzeroTree* tree = m->tree;
+  ASSERT_EQ(fn().qxsmnew(instance(), &m, SM_KIND_SYMMETRIC, SM_FORMAT_SPARSE), SM_OK);
+  expect_fresh(m, kSymmetricSparse);
+  for (MemoryPool* pool : held) pool->destroy(pool);
+  let_go(tree);
+  EXPECT_EQ(fn().qxsmresize(m, 4, 4), SM_OK);
+  EXPECT_EQ(m->nnz, 4);
+}
+
 TEST_P(Lifecycle, a_record_of_another_instance_is_registered_where_it_is_typed) {
   SmInstance* other = CreateInstance(session().extension());
   ASSERT_NE(other, nullptr);
