@@ -11,6 +11,8 @@ namespace sm {
 [[nodiscard]] SmStatus factor_numeric(SmMatrix& m);
 
 [[nodiscard]] SmStatus factor(SmMatrix& m, bool in_place);
+// Runs ginverse2 in one of its modes from A on the values, or on a fresh copy of them in the separate array.
+[[nodiscard]] SmStatus transform_packed(SmMatrix& m, bool in_place, std::int32_t mode, double tolerance);
 [[nodiscard]] SmStatus factor_packed(SmMatrix& m, bool in_place);
 [[nodiscard]] SmStatus factor_diagonal(SmMatrix& m, bool in_place);
 [[nodiscard]] SmStatus log_determinant(SmMatrix& m, double& out);
