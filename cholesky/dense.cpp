@@ -24,11 +24,18 @@ SmStatus choose_array(SmMatrix& m, bool in_place, double*& array) {
   return SM_OK;
 }
 
-SmStatus factor_packed(SmMatrix& m, bool in_place) {
+SmStatus transform_packed(SmMatrix& m, bool in_place, std::int32_t mode, double tolerance) {
+  const bool had_separate_array = m.dense_factor != nullptr;
   double* array = nullptr;
   SM_TRY(choose_array(m, in_place, array));
-  SM_TRY(ginverse2(m.instance, array, m.rows, &m.log_det, &m.rank, kPackedFactor, singularity_tolerance(m), m.format,
-                   &m.definite));
+  const SmStatus status =
+      ginverse2(m.instance, array, m.rows, &m.log_det, &m.rank, mode, tolerance, m.format, &m.definite);
+  if (status == SM_NO_MEMORY && !had_separate_array) give_back(m.pool, m.dense_factor);
+  return status;
+}
+
+SmStatus factor_packed(SmMatrix& m, bool in_place) {
+  SM_TRY(transform_packed(m, in_place, kPackedFactor, singularity_tolerance(m)));
   m.state = SM_STATE_FACTORED;
   return SM_OK;
 }

@@ -44,7 +44,8 @@ class NumericRows {
   SmStatus pivot(i64 k, double d, double tolerance);
   void store(i64 k);
   void await(i64 row, i64 p);
-  const i64* columns(i64 row) const { return ju_ + iju_[row] - iu_[row]; }
+  // Columns of a row from its position p on.
+  const i64* columns(i64 row, i64 p) const { return ju_ + iju_[row] + (p - iu_[row]); }
 
   const SmMatrix& m_;
   i64 n_;
@@ -69,7 +70,7 @@ void NumericRows::load(i64 k) {
 // Row `row` is next used at its position p: chain it to the column that stands there.
 void NumericRows::await(i64 row, i64 p) {
   if (p >= iu_[row + 1]) return;
-  const i64 column = columns(row)[p];
+  const i64 column = *columns(row, p);
   position_[row] = p;
   jl_[row] = jl_[column];
   jl_[column] = row;
@@ -85,9 +86,9 @@ double NumericRows::subtract_earlier_rows(i64 k) {
     const double m = -u * diag_[i];
     values_[p] = m;
     d += u * m;
-    const i64* column = columns(i);
+    const i64* column = columns(i, p + 1);
     const i64 end = iu_[i + 1];
-    for (i64 q = p + 1; q < end; ++q) diag_[column[q]] += values_[q] * m;
+    for (i64 q = p + 1; q < end; ++q) diag_[*column++] += values_[q] * m;
     await(i, p + 1);
     i = following;
   }
@@ -107,10 +108,10 @@ SmStatus NumericRows::pivot(i64 k, double d, double tolerance) {
 }
 
 void NumericRows::store(i64 k) {
-  const i64* column = columns(k);
-  for (i64 p = iu_[k]; p < iu_[k + 1]; ++p) {
-    values_[p] = diag_[column[p]];
-    diag_[column[p]] = 0.0;
+  const i64* column = columns(k, iu_[k]);
+  for (i64 p = iu_[k]; p < iu_[k + 1]; ++p, ++column) {
+    values_[p] = diag_[*column];
+    diag_[*column] = 0.0;
   }
   await(k, iu_[k]);
 }

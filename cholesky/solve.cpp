@@ -27,21 +27,22 @@ class SparseSolve {
  private:
   void forward(i64 k) {
     const double wk = w_[k];
-    const i64* column = m_.factor_ju + m_.factor_iju[k] - iu_[k];
-    for (i64 p = iu_[k]; p < iu_[k + 1]; ++p) w_[column[p]] += values_[p] * wk;
+    const i64* column = m_.factor_ju + m_.factor_iju[k];
+    for (i64 p = iu_[k]; p < iu_[k + 1]; ++p) w_[*column++] += values_[p] * wk;
     w_[k] = m_.factor_diag[k] * wk;
   }
   // Eight lanes, which the header of the package promises nothing about but the last bits.
   double row_product(i64 k) const {
-    const i64* column = m_.factor_ju + m_.factor_iju[k] - iu_[k];
-    const i64 end = iu_[k + 1];
-    i64 p = iu_[k];
+    const i64* column = m_.factor_ju + m_.factor_iju[k];
+    const double* value = values_ + iu_[k];
+    const i64 length = iu_[k + 1] - iu_[k];
+    i64 t = 0;
     double s[8] = {};
-    for (; p + 8 <= end; p += 8) {
-      for (int lane = 0; lane < 8; ++lane) s[lane] += values_[p + lane] * w_[column[p + lane]];
+    for (; t + 8 <= length; t += 8) {
+      for (int lane = 0; lane < 8; ++lane) s[lane] += value[t + lane] * w_[column[t + lane]];
     }
     double sum = ((s[0] + s[4]) + (s[2] + s[6])) + ((s[1] + s[5]) + (s[3] + s[7]));
-    for (; p < end; ++p) sum += values_[p] * w_[column[p]];
+    for (; t < length; ++t) sum += value[t] * w_[column[t]];
     return sum;
   }
 
@@ -126,19 +127,15 @@ Gate may_apply_inverse(const SmMatrix& m, const double* b, const double* x) {
 
 SmStatus solve_diagonal(SmMatrix& m, const double* b, double* x, std::int32_t count) {
   const double tolerance = singularity_tolerance(m);
+  const auto refused = [](double d) { return d < kDiagonalRefusal; };
   m.definite = 1;
+  if (count < 1) return SM_OK;
+  if (std::any_of(m.values, m.values + m.rows, refused)) {  // before x is touched
+    m.definite = 0;
+    return SM_NOT_DEFINITE;
+  }
   for (i64 v = 0; v < count; ++v, b += m.rows, x += m.rows) {
-    for (i64 i = 0; i < m.rows; ++i) {
-      const double d = m.values[i];
-      if (d > tolerance) {
-        x[i] = b[i] / d;
-      } else if (d < kDiagonalRefusal) {
-        m.definite = 0;
-        return SM_NOT_DEFINITE;
-      } else {
-        x[i] = 0.0;
-      }
-    }
+    for (i64 i = 0; i < m.rows; ++i) x[i] = m.values[i] > tolerance ? b[i] / m.values[i] : 0.0;
   }
   return SM_OK;
 }

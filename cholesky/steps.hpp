@@ -14,6 +14,8 @@ namespace sm {
 // The array of a packed or diagonal matrix that is to be factored or inverted: the values themselves (a separate array goes
 // back then), or a fresh copy of them in the separate array.
 [[nodiscard]] SmStatus choose_array(SmMatrix& m, bool in_place, double*& array);
+// Runs ginverse2 in one of its modes from A on the values, or on a fresh copy of them in the separate array.
+[[nodiscard]] SmStatus transform_packed(SmMatrix& m, bool in_place, std::int32_t mode, double tolerance);
 [[nodiscard]] SmStatus factor_packed(SmMatrix& m, bool in_place);
 [[nodiscard]] SmStatus factor_diagonal(SmMatrix& m, bool in_place);
 [[nodiscard]] SmStatus log_determinant(SmMatrix& m, double& out);

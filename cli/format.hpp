@@ -16,8 +16,8 @@ std::string number_text(double value);     // shortest text that reads back as t
 // "3, 4, 5, ... (97 more)": at most `shown` of them; "none" when there are none.
 std::string list_text(std::span<const std::int64_t> numbers, std::size_t shown = 10);
 
-// "4G", "512m", "1048576": bytes with a suffix K, M, G or T in powers of 1024. Nothing for any other text, for 0 and for
-// what does not fit into 63 bits.
+// "4G", "512m", "1048576": bytes with a suffix K, M, G or T in powers of 1024. Nothing for any other text, for 0 and
+// for what does not fit into 63 bits.
 std::optional<std::uint64_t> parse_memory(std::string_view text);
 
 // The memory that this process can hope for: what the machine has, or the limit of its control group when that is less.

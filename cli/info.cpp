@@ -70,8 +70,8 @@ void report_need(Report& report, std::int64_t order, std::int64_t upper) {
   report.add_json("ordering_bytes", need.ordering);
 }
 
-// Orders the matrix and finds the structure of its factor. The numeric factorization takes no further memory, so the peak
-// so far is the peak of factoring.
+// Orders the matrix and finds the structure of its factor. The numeric factorization takes no further memory, so the
+// peak so far is the peak of factoring.
 void report_fill(Report& report, const LoadedMatrix& matrix, std::uint64_t ceiling, Progress& progress) {
   ModuleSession session(ceiling);
   Factorization factorization(session, matrix.rows, progress);

@@ -78,11 +78,12 @@ void announce(LineReader& lines, Header& header, std::string_view line) {
   const char* shape = coordinate ? "3 whole numbers (rows columns entries)" : "2 whole numbers (rows columns)";
   const char* advice = "correct the size line; counts are written without sign, point or separator";
   const auto fields = split_fields(line);
-  if (fields.size() != (coordinate ? 3u : 2u)) {
+  const std::size_t count = coordinate ? 3 : 2;
+  if (fields.size() != count) {
     refuse(lines, fmt::format("found {} fields ({})", fields.size(), quote(line)), shape, advice);
   }
   std::int64_t* const targets[] = {&header.rows, &header.cols, &header.entries};
-  for (std::size_t i = 0; i < fields.size(); ++i) {
+  for (std::size_t i = 0; i < count; ++i) {
     if (!parse_index(fields[i], *targets[i])) refuse(lines, "found " + quote(fields[i]), shape, advice);
   }
 }

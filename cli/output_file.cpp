@@ -13,7 +13,7 @@
 namespace sm::cli {
 namespace {
 
-constexpr std::size_t kFull = 1024 * 1024;
+constexpr std::size_t kFull = 1'048'576;
 constexpr int kMode = 0666;
 
 [[noreturn]] void refuse(const std::string& path, int error_number) {

@@ -1,5 +1,5 @@
-// A line on a terminal that says what a long run is at. Nothing appears in the first half second, nor where standard error
-// is no terminal.
+// A line on a terminal that says what a long run is at. Nothing appears in the first half second, nor where standard
+// error is no terminal.
 #pragma once
 
 #include <atomic>

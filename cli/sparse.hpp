@@ -43,7 +43,7 @@ class EntryStore : public EntrySink {
   CompressedRows compress(const std::string& name, std::uint64_t limit);
 
  private:
-  static constexpr std::size_t kChunk = 64 * 1024;
+  static constexpr std::size_t kChunk = 65'536;
   void scatter(CompressedRows& rows);
 
   Header header_;
@@ -51,8 +51,8 @@ class EntryStore : public EntrySink {
   std::vector<std::vector<Entry>> chunks_;
 };
 
-// How a general square matrix compares with its transpose. The first pair is the first in row order for which the values
-// differ (an absent entry counts as 0).
+// How a general square matrix compares with its transpose. The first pair is the first in row order for which the
+// values differ (an absent entry counts as 0).
 struct SymmetryCheck {
   bool pattern = true;  // every stored (i, j) has a stored (j, i)
   bool values = true;

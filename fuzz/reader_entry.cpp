@@ -54,7 +54,7 @@ std::string outcome(std::span<const char> bytes, std::size_t piece) {
     cli::MemoryBytes source(bytes, piece);
     cli::read_matrix_market(source, name, sink, kBuffer);
   } catch (const cli::CommandError& error) {
-    const std::string message = error.what();
+    std::string message = error.what();
     promise(message.rfind(name + ":", 0) == 0 && error.problem().code == cli::ExitCode::bad_input);
     promise(error.problem().line >= 1 && !error.problem().advice.empty());
     promise(std::all_of(message.begin(), message.end(), [](char c) { return c >= 0x20 && c < 0x7f; }));

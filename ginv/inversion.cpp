@@ -43,12 +43,6 @@ SmStatus invert_packed_factor(SmMatrix& a, bool in_place, double tolerance) {
   return ginverse2(a.instance, array, a.rows, &log_det, &rank, kPackedFactorToInverse, tolerance, a.format, &definite);
 }
 
-SmStatus invert_packed_values(SmMatrix& a, bool in_place, double tolerance) {
-  double* array = nullptr;
-  SM_TRY(choose_array(a, in_place, array));
-  return ginverse2(a.instance, array, a.rows, &a.log_det, &a.rank, kPackedInverse, tolerance, a.format, &a.definite);
-}
-
 SmStatus invert_diagonal_factor(SmMatrix& a, bool in_place) {
   double* array = nullptr;
   SM_TRY(choose_factor(a, in_place, array));
@@ -97,7 +91,8 @@ SmStatus invert(SmMatrix& a, bool in_place, double tolerance) {
   if (std::isnan(tolerance)) tolerance = singularity_tolerance(a);
   const bool factored = a.state == SM_STATE_FACTORED;
   if (a.kind == SM_KIND_SYMMETRIC && is_dense_format(a.format)) {
-    SM_TRY(factored ? invert_packed_factor(a, in_place, tolerance) : invert_packed_values(a, in_place, tolerance));
+    SM_TRY(factored ? invert_packed_factor(a, in_place, tolerance)
+                    : transform_packed(a, in_place, kPackedInverse, tolerance));
   } else if (a.kind == SM_KIND_DIAGONAL) {
     SM_TRY(factored ? invert_diagonal_factor(a, in_place) : invert_diagonal_values(a, in_place, tolerance));
   } else {

@@ -31,9 +31,9 @@ extern "C" SmStatus qxsmdelete(SmMatrix* matrix) {
 extern "C" SmStatus qxsmDestroyMatrix(SmInstance* instance, SmMatrix** matrix) {
   if (!matrix) return SM_OK;
   if (SmMatrix* record = *matrix) {
-    const SmInstance* own = record->instance;
-    if (own && own->functions && own->functions->qxsmdelete) own->functions->qxsmdelete(record);
-    instance->pool->free(instance->pool, record);
+    const SmInstance* own = record->instance ? record->instance : instance;
+    if (own->functions && own->functions->qxsmdelete) own->functions->qxsmdelete(record);
+    own->pool->free(own->pool, record);
   }
   *matrix = nullptr;
   return SM_OK;

@@ -33,6 +33,7 @@ SmStatus assign_symmetric(SmMatrix& m, i64 row, i64 col, bool add, double value)
   }
   if (row >= m.rows || col >= m.cols) return SM_BAD_ARGUMENT;
   if (!is_dense_format(m.format)) return SM_UNAVAILABLE;
+  if (m.value_count < 1.0) return SM_BAD_ARGUMENT;  // the size stays after a refused allocation, without bounds
   const i64 position = with_packed(m.format, m.rows, [&](auto layout) { return layout.at(row, col); });
   return put(m, position, add, value);
 }

@@ -7,7 +7,9 @@ namespace sm {
 
 namespace {
 
+// A record belongs to the instance that made it: its memory does.
 SmStatus enter_in_registry(SmInstance& instance, SmMatrix* m) {
+  if (m->instance && m->instance != &instance) return SM_BAD_ARGUMENT;
   if (m->registry_index < 1 || m->registry_index > instance.matrix_count) return register_matrix(instance, m);
   instance.registry[m->registry_index - 1] = m;
   return SM_OK;
@@ -26,7 +28,6 @@ void start_record(SmInstance& instance, SmMatrix& m) {
   m.row_start = nullptr;
   m.assembly_pool = nullptr;
   m.solver_word = 0;
-  m.node_size = sizeof(NonzeroNode);
 }
 
 void clear_factor(SmMatrix& m) {
@@ -100,6 +101,7 @@ SmStatus make(SmInstance& instance, SmMatrix*& matrix, std::int32_t kind, std::i
   start_record(instance, *m);
   m->pool = create_pool(SM_POOL_MATRIX, nullptr, nullptr);
   if (!m->pool) return SM_NO_MEMORY;
+  m->node_size = sizeof(NonzeroNode);
   if (const SmStatus status = check_type(kind, format); status != SM_OK) {
     destroy_pool(m->pool);
     return status;

@@ -56,8 +56,8 @@ QXESM_API SmStatus qxsmrank(SmMatrix* matrix, int64_t* out);
  * Dropped pivots: sparse and diagonal give 0 there. A packed factor passes the component on undivided, so that
  * A x = b for every b in the range of A; for other b the result belongs to another generalized inverse than the one
  * that inversion stores.
- * Answers: 0 with nothing done (empty); 1; 113; 102 (state other than 5); 104 (x is b); 124; 0 (count < 1);
- * 101 (a packed matrix needs n doubles of work). Cost: two passes over the factor for each right-hand side.
+ * Answers: 0 with nothing done (empty); 1; 113; 102 (state other than 5); 104 (x is b); 124; 101 (a packed matrix needs n
+ * doubles of work, whatever the count); 0. Cost: two passes over the factor for each right-hand side.
  * Uses the record's factor_scratch: one solve at a time for each matrix. */
 QXESM_API SmStatus qxsmsubst(SmMatrix* matrix, const double* b, double* x, int32_t count);
 

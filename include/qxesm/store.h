@@ -7,7 +7,7 @@
 /* A record of the given kind and format, without a size.
  *   matrix  in/out  *matrix null: a new record, registered in the instance; else that record is typed again, and what
  *                   it held before is not given back (reset it with qxsmdelete first)
- * Answers: 101 (record, registry or pool could not be had); 116 (format not allowed for the kind: 21, 22, 23 for
+ * Answers: 104 (the record is another instance's); 101 (record, registry or pool could not be had); 116 (format not allowed for the kind: 21, 22, 23 for
  * general and symmetric, 22, 23 for diagonal); 124 (no such kind); 0.
  * On 116 and 124 the record stays registered with kind none and without a pool, and *matrix is unchanged. A missing tree
  * manager is not an error here: the first assignment answers 101. */
@@ -28,8 +28,9 @@ QXESM_API SmStatus qxsmnewsd(SmInstance* instance, SmMatrix** matrix, int64_t n)
  * 0 x 0 is a size. Answers: 1; 122 (negative, or exactly one dimension zero); 111 (symmetric or diagonal and
  * rows != cols; the state is 1 afterwards, and while a symmetric sparse matrix has no compressed rows its readers answer
  * 113); 105 (more than 2^53 values, roots or nodes); 101; 124.
- * After 105 or 101 a dense or diagonal matrix has no values (nnz 0) and keeps rows and cols as asked. After 101 a
- * sparse one keeps its size and refuses entries with 101. Cost: the size of the storage; a symmetric sparse matrix pays n
+ * After 105 or 101 a dense or diagonal matrix has no values (nnz 0) and keeps rows and cols as asked; a sparse one keeps
+ * its size and refuses entries with 101. 111 takes a matrix that was factored or inverted in place to state 1 as well, with
+ * that factor or inverse as its values. Cost: the size of the storage; a symmetric sparse matrix pays n
  * insertions. */
 QXESM_API SmStatus qxsmresize(SmMatrix* matrix, int64_t rows, int64_t cols);
 
@@ -37,14 +38,14 @@ QXESM_API SmStatus qxsmresize(SmMatrix* matrix, int64_t rows, int64_t cols);
  * qxsmnew or qxsmtie can use it again. Null is harmless. Answers 0. */
 QXESM_API SmStatus qxsmdelete(SmMatrix* matrix);
 
-/* Resets the matrix, frees its record and stores null. A null address or record is harmless. Answers 0. */
+/* Resets the matrix, frees its record, in the instance that made it, and stores null. A null address or record is harmless. Answers 0. */
 QXESM_API SmStatus qxsmDestroyMatrix(SmInstance* instance, SmMatrix** matrix);
 
 /* Attaches the caller's array as the values of a dense or diagonal matrix.
  *   data  in/out, lent  rows*cols (general), n(n+1)/2 (symmetric) or n (diagonal) doubles in the layout of the format;
  *                       it stays the caller's and must outlive its use; the module never frees it
  * What the matrix held is dropped first. The state is 1 for a matrix that had a type (0 for one that was symmetric
- * sparse) and 0 for a reset record, which is registered again: qxsmclose makes it readable.
+ * sparse) and 0 for a reset record (1 if it was closed since), which is registered again: qxsmclose makes it readable.
  * Answers: 104 (data null with rows > 0 or cols >= 1; a negative size), with nothing changed; then, with the matrix
  * emptied: 111 (symmetric or diagonal, rows != cols); 124 (a format other than 22, 23; another kind); 105 (more than
  * 2^53 values); 0. */
@@ -62,9 +63,9 @@ QXESM_API SmStatus qxsmremove(SmMatrix* matrix, int64_t row, int64_t col);
  * Rank and log-determinant are voided. On a factored or inverted dense or diagonal matrix the separate factor array
  * goes back and the state returns to 1; one that was factored or inverted in place keeps its state, and its values are
  * then that factor or inverse with this element changed.
- * Answers: 0 with nothing done (rows < 1); 1; 104 (negative index; off the diagonal of a diagonal matrix; outside a dense
- * matrix's storage or size); 117 (below the diagonal of a symmetric matrix); 119 (symmetric sparse, closed);
- * 124 (format); 105 (2^53 entries, or an index that no root array can reach); 101; 0.
+ * Answers: 0 with nothing done (rows < 1); 1; 104 (negative index); 117 (below the diagonal of a symmetric matrix); 119
+ * (symmetric sparse, closed); 104 (off the diagonal of a diagonal matrix; outside a dense matrix's storage or size); 124
+ * (format); 105 (2^53 entries, or an index that no root array can reach); 101; 0.
  * After 101 from a sparse matrix that could not get a new slab the entry is in; further calls answer 101.
  * Cost: one tree insertion. */
 QXESM_API SmStatus qxsmassign(SmMatrix* matrix, int64_t row, int64_t col, int32_t add, double value);

@@ -20,8 +20,9 @@ SmMatrix* new_packed(Session& session, const Problem& problem, std::int32_t form
 SmMatrix* new_diagonal(Session& session, const std::vector<double>& d, std::int32_t format = SM_FORMAT_ROWS);
 // An untyped record: created and reset.
 SmMatrix* new_untyped(Session& session);
-// A general dense matrix of the size, closed (state 1), or still in state 0 when not: a reset record with `data` tied to it.
+// A general dense matrix of the size, closed.
 SmMatrix* new_general(Session& session, std::int64_t rows, std::int64_t cols);
+// Still in state 0: a reset record with `data` tied to it.
 SmMatrix* new_open_tied(Session& session, std::vector<double>& data, std::int64_t rows, std::int64_t cols,
                         std::int32_t kind, std::int32_t format);
 

@@ -1,5 +1,5 @@
-// Method: minimum degree with elements, mass elimination and indistinguishable vertices, as in Eisenstat, Gursky, Schultz,
-// Sherman, "Yale Sparse Matrix Package I: the symmetric codes", IJNME 18 (1982) 1145-1151.
+// Method: minimum degree with elements, mass elimination and indistinguishable vertices, as in Eisenstat, Gursky,
+// Schultz, Sherman, "Yale Sparse Matrix Package I: the symmetric codes", IJNME 18 (1982) 1145-1151.
 #include "cholesky/ordering_reference.hpp"
 
 #include <gtest/gtest.h>

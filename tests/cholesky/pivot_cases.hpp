@@ -42,8 +42,8 @@ inline Problem bordered(double a, std::int64_t subtracted, double unit) {
   return p;
 }
 
-// Diagonals a in [1, 2) for which a * tolerance rounds to a multiple x of 2^-52, so that a pivot can be exactly a * tolerance:
-// bordered(a, steps, 2^-26) has it.
+// Diagonals a in [1, 2) for which a * tolerance rounds to a multiple x of 2^-52, so that a pivot can be exactly
+// a * tolerance: bordered(a, steps, 2^-26) has it.
 struct ExactThreshold {
   double a;
   std::int64_t steps;  // (a - x) in units of 2^-52

@@ -71,5 +71,30 @@ TEST_P(WorkspaceTest, a_refused_resize_puts_reordered_rows_back_into_the_callers
   }
 }
 
+// Two requests: the separate array, and the copy that the inversion works in.
+TEST_P(WorkspaceTest, a_separate_array_taken_for_nothing_goes_back) {
+  for (const std::int32_t format : {SM_FORMAT_COLUMNS, SM_FORMAT_ROWS}) {
+    SmMatrix* m = new_packed(session(), spread_problem(5), format);
+    const std::int64_t blocks = host().live_blocks();
+    host().fail_request(1, false);
+    EXPECT_EQ(fn().qxsmfact(m, 0), SM_NO_MEMORY);
+    EXPECT_EQ(host().stop_failing(), 1);
+    EXPECT_EQ(host().live_blocks(), blocks);
+    EXPECT_EQ(m->dense_factor, nullptr);
+    EXPECT_EQ(fn().qxsmfact(m, 0), SM_OK);
+  }
+}
+
+TEST_P(WorkspaceTest, a_refused_diagonal_leaves_the_solution_alone) {
+  SmMatrix* m = new_diagonal(session(), {2.0, -1.0, 2.0});
+  const std::vector<double> b = {2.0, 2.0, 2.0};
+  std::vector<double> x = {7.0, 7.0, 7.0};
+  EXPECT_EQ(fn().qxsmsoldirect(m, b.data(), x.data(), 1), SM_NOT_DEFINITE);
+  EXPECT_EQ(m->definite, 0);
+  EXPECT_EQ(x, (std::vector<double>{7.0, 7.0, 7.0}));
+  EXPECT_EQ(fn().qxsmsoldirect(m, b.data(), x.data(), 0), SM_OK);
+  EXPECT_EQ(m->definite, 1);
+}
+
 }  // namespace
 }  // namespace sm::test

@@ -47,6 +47,7 @@ TEST_P(OuterProduct, refuses_in_order) {
     SmMatrix* m = square(shape, 3);
     EXPECT_EQ(fn().qxsmzscp(m, z.data(), nullptr, 4, 1.0), SM_BAD_ARGUMENT) << "longer than the matrix";
     EXPECT_EQ(fn().qxsmzscp(m, nullptr, nullptr, 3, 1.0), SM_BAD_ARGUMENT) << "no vector";
+    EXPECT_EQ(fn().qxsmzscp(m, nullptr, index, 1, 1.0), SM_BAD_ARGUMENT) << "no vector";
     EXPECT_EQ(fn().qxsmzscp(m, z.data(), nullptr, 3, 1.0), SM_UNAVAILABLE);
     EXPECT_EQ(fn().qxsmzscp(m, z.data(), index, 3, 1.0), SM_UNAVAILABLE);
     EXPECT_EQ(fn().qxsmzscp(m, z.data(), nullptr, kHuge, 1.0), SM_BAD_ARGUMENT);

@@ -10,6 +10,15 @@ namespace {
 class Lifecycle : public StoreTest {
  protected:
   SmMatrix* last_registered() { return instance()->registry[instance()->matrix_count - 1]; }
+  // Ends a tree manager that no matrix knows any more.
+  static void let_go(NonzeroTree* tree) {
+    if (TreeInner* inner = tree->inner) {
+      inner->reset(inner, 1, 1);
+      tree->cleared_word = nullptr;
+      inner->release(inner);
+    }
+    tree->destroy(tree);
+  }
 };
 
 void expect_fresh(const SmMatrix* m, Shape shape) {
@@ -137,6 +146,70 @@ TEST_P(Lifecycle, a_record_in_use_is_typed_again_as_it_stands) {
   EXPECT_EQ(host().live_pools(), pools + 1);
   EXPECT_EQ(instance()->matrix_count, count);
   held->destroy(held);
+}
+
+TEST_P(Lifecycle, a_factored_record_typed_again_points_at_nothing_it_had) {
+  for (const Shape shape : kShapes) {
+    SCOPED_TRACE(name_of(shape));
+    SmMatrix* m = definite(kSymmetricSparse);
+    ASSERT_EQ(fn().qxsmfact(m, 0), SM_OK);
+    MemoryPool* held = m->pool;
+    NonzeroTree* tree = m->tree;
+    ASSERT_EQ(fn().qxsmnew(instance(), &m, shape.kind, shape.format), SM_OK);
+    EXPECT_EQ(m->kind, shape.kind);
+    EXPECT_EQ(m->row_start, nullptr);
+    EXPECT_EQ(m->values, nullptr);
+    EXPECT_EQ(m->solver_word, 0);
+    const bool tree_is_left = m->tree != tree;
+    if (is_sparse(shape)) {
+      EXPECT_TRUE(tree_is_left) << "a type of its own, a tree of its own";
+    }
+    if (shape.kind == SM_KIND_SYMMETRIC && is_sparse(shape)) expect_fresh(m, shape);
+    EXPECT_EQ(fn().qxsmresize(m, 3, 3), SM_OK);
+    EXPECT_EQ(fn().qxsmdelete(m), SM_OK);
+    held->destroy(held);
+    if (tree_is_left) let_go(tree);
+  }
+}
+
+TEST_P(Lifecycle, an_open_record_typed_again_points_at_nothing_it_had) {
+  SmMatrix* m = square(kSymmetricSparse, 3);
+  MemoryPool* held[] = {m->pool, m->assembly_pool};
+  NonzeroTree* tree = m->tree;
+  ASSERT_EQ(fn().qxsmnew(instance(), &m, SM_KIND_SYMMETRIC, SM_FORMAT_SPARSE), SM_OK);
+  expect_fresh(m, kSymmetricSparse);
+  for (MemoryPool* pool : held) pool->destroy(pool);
+  let_go(tree);
+  EXPECT_EQ(fn().qxsmresize(m, 4, 4), SM_OK);
+  EXPECT_EQ(m->nnz, 4);
+}
+
+TEST_P(Lifecycle, a_record_of_another_instance_is_not_typed_and_changes_nothing) {
+  SmInstance* other = CreateInstance(session().extension());
+  ASSERT_NE(other, nullptr);
+  SmMatrix* theirs = nullptr;
+  ASSERT_EQ(fn().qxsmnewsd(other, &theirs, 3), SM_OK);
+  SmMatrix* m = typed(kGeneralRows);  // the same registry index
+  ASSERT_EQ(m->registry_index, theirs->registry_index);
+  ASSERT_EQ(fn().qxsmdelete(m), SM_OK);
+  SmMatrix* handle = m;
+  EXPECT_EQ(fn().qxsmnew(other, &handle, SM_KIND_GENERAL, SM_FORMAT_ROWS), SM_BAD_ARGUMENT);
+  EXPECT_EQ(handle, m);
+  EXPECT_EQ(m->kind, SM_KIND_NONE);
+  EXPECT_EQ(m->instance, instance());
+  EXPECT_EQ(other->registry[theirs->registry_index - 1], theirs);
+  EXPECT_EQ(qxsmDestroyInstance(&other), SM_OK);
+  EXPECT_EQ(fn().qxsmnew(instance(), &handle, SM_KIND_GENERAL, SM_FORMAT_ROWS), SM_OK);
+}
+
+TEST_P(Lifecycle, a_record_destroyed_through_another_instance_goes_back_to_its_own) {
+  SmInstance* other = CreateInstance(session().extension());
+  ASSERT_NE(other, nullptr);
+  SmMatrix* m = typed(kGeneralRows);
+  EXPECT_EQ(fn().qxsmDestroyMatrix(other, &m), SM_OK);
+  EXPECT_EQ(m, nullptr);
+  EXPECT_EQ(qxsmDestroyInstance(&other), SM_OK);
+  // The fixture counts a block given to the wrong pool.
 }
 
 TEST_P(Lifecycle, a_reset_record_gets_its_registry_slot_back) {

@@ -285,6 +285,18 @@ TEST_P(Sizing, a_kind_that_does_not_exist_answers_124_and_state_1) {
   m->kind = SM_KIND_GENERAL;
 }
 
+TEST_P(Sizing, a_packed_size_that_was_refused_has_no_room_at_any_index) {
+  // Orders and columns for which the packed position itself cannot be counted.
+  for (const Shape shape : kPacked) {
+    SmMatrix* m = typed(shape);
+    ASSERT_EQ(fn().qxsmresize(m, std::int64_t{1} << 62, std::int64_t{1} << 62), SM_TOO_LARGE);
+    for (const std::int64_t col : {std::int64_t{0}, std::int64_t{3037000500}, std::int64_t{1} << 61}) {
+      EXPECT_EQ(fn().qxsmassign(m, 0, col, 0, 1.0), SM_BAD_ARGUMENT);
+      EXPECT_EQ(fn().qxsmassign(m, col, col, 1, 1.0), SM_BAD_ARGUMENT);
+    }
+  }
+}
+
 INSTANTIATE_BOTH_HOSTS(Sizing);
 
 }  // namespace

@@ -133,6 +133,15 @@ TEST_P(Tie, nothing_can_be_tied_without_data) {
   EXPECT_EQ(m->nnz, 0);
 }
 
+TEST_P(Tie, counts_to_2_to_the_53) {
+  SmMatrix* m = typed(kGeneralRows);
+  EXPECT_EQ(tie(m, data(), SM_MAX_ELEMENTS, 1, kGeneralRows), SM_OK) << "nobody reads behind what is there";
+  EXPECT_EQ(m->nnz, SM_MAX_ELEMENTS);
+  EXPECT_EQ(at(m, 11, 0), 12.0);
+  EXPECT_EQ(refused_at(m, SM_MAX_ELEMENTS, 0), SM_OUTSIDE);
+  EXPECT_EQ(set(m, SM_MAX_ELEMENTS, 0, 1.0), SM_BAD_ARGUMENT);
+}
+
 TEST_P(Tie, gives_an_owned_array_and_its_factor_back) {
   for (const Shape shape : kSquareFactored) {
     SCOPED_TRACE(name_of(shape));
@@ -275,6 +284,20 @@ TEST_P(Tie, a_reset_record_gets_a_pool_when_an_operation_needs_one) {
     for (const double value : mine) EXPECT_TRUE(value == 0.0 || value == 4.0);
     EXPECT_EQ(add(m, 1, 1, 1.0), SM_OK);
     EXPECT_EQ(m->dense_factor, nullptr);
+  }
+}
+
+TEST_P(Tie, a_reset_record_gets_a_pool_for_the_one_call_solve) {
+  for (const Shape shape : kPacked) {
+    SCOPED_TRACE(name_of(shape));
+    std::vector<double> mine(6, 0.0);
+    for (std::int64_t i = 0; i < 3; ++i) mine[static_cast<std::size_t>(slot_of(shape, 3, 3, i, i))] = 4.0;
+    const double b[] = {1.0, 2.0, 3.0};
+    double x[3] = {};
+    SmMatrix* m = reset_record();
+    ASSERT_EQ(tie(m, mine.data(), 3, 3, shape), SM_OK);
+    EXPECT_EQ(fn().qxsmsoldirect(m, b, x, 1), SM_OK);
+    for (int i = 0; i < 3; ++i) EXPECT_NEAR(x[i], b[i] / 4.0, 1e-15);
   }
 }
 
