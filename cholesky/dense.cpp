@@ -40,8 +40,8 @@ SmStatus factor_packed(SmMatrix& m, bool in_place) {
   return SM_OK;
 }
 
-// Stores square roots, where the sparse factor stores reciprocals, and judges by absolute limits, where the sparse one is
-// relative: both are part of the interface.
+// Stores square roots, where the sparse factor stores reciprocals, and judges by absolute limits, where the sparse one
+// is relative: both are part of the interface.
 SmStatus factor_diagonal(SmMatrix& m, bool in_place) {
   double* array = nullptr;
   SM_TRY(choose_array(m, in_place, array));

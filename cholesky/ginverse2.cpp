@@ -1,5 +1,5 @@
-// Everything happens in a copy of the triangle by columns, whatever the format: column k of R, of its inverse and of the
-// result are contiguous there, and the caller's array is written when nothing can fail any more.
+// Everything happens in a copy of the triangle by columns, whatever the format: column k of R, of its inverse and of
+// the result are contiguous there, and the caller's array is written when nothing can fail any more.
 //
 // Inversion by R^-1 R^-T as in LAPACK's packed routines: Anderson et al., "LAPACK Users' Guide", 3rd ed., SIAM (1999).
 #include "cholesky/ginverse2.hpp"
@@ -34,8 +34,8 @@ void store(const double* t, std::int32_t format, i64 n, double* array) {
   });
 }
 
-// A -> R, column by column: entry (i, k) needs columns i and k above row i. A dropped row i has r_ii = 0, and its entries
-// are set to 0.
+// A -> R, column by column: entry (i, k) needs columns i and k above row i. A dropped row i has r_ii = 0, and its
+// entries are set to 0.
 SmStatus to_factor(double* t, i64 n, double tolerance) {
   for (i64 k = 0; k < n; ++k) {
     double* rk = column(t, k);

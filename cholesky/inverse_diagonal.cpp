@@ -1,7 +1,7 @@
 // The diagonal of the generalized inverse, from the factor and without forming the inverse.
 //
-// With A^- = V D^- V', V = U^-1: element i of the diagonal is the sum over columns j of V[i][j]^2 / D[j]. Each column of
-// V D^(-1/2) is a back substitution that starts at row j.
+// With A^- = V D^- V', V = U^-1: element i of the diagonal is the sum over columns j of V[i][j]^2 / D[j]. Each column
+// of V D^(-1/2) is a back substitution that starts at row j.
 #include <algorithm>
 #include <cmath>
 

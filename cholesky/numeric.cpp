@@ -1,11 +1,11 @@
 // Numeric factorization of a symmetric sparse matrix: the values of U and D, one row at a time.
 //
 // Method: Eisenstat, Gursky, Schultz, Sherman, "Yale Sparse Matrix Package I: the symmetric codes", Int. J. Numer.
-// Methods Eng. 18 (1982) 1145-1151. Row k gathers its entries of A in a dense row; the earlier rows that have an entry in
-// column k, chained from jl[k], are subtracted; what is left of the diagonal is the pivot.
+// Methods Eng. 18 (1982) 1145-1151. Row k gathers its entries of A in a dense row; the earlier rows that have an entry
+// in column k, chained from jl[k], are subtracted; what is left of the diagonal is the pivot.
 //
-// The dense row shares storage with the finished reciprocal pivots: those are below k, the row is at k and above. Rows of U
-// are stored as -U, so that every later use adds.
+// The dense row shares storage with the finished reciprocal pivots: those are below k, the row is at k and above. Rows
+// of U are stored as -U, so that every later use adds.
 #include <cmath>
 
 #include "cholesky/steps.hpp"

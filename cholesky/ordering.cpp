@@ -126,8 +126,8 @@ i64 MinimumDegree::take_minimum() {
   return vertex;
 }
 
-// Chains the uneliminated neighbours of the element, its own and those of the elements it absorbs, behind it; their items
-// are reused. Returns the last item.
+// Chains the uneliminated neighbours of the element, its own and those of the elements it absorbs, behind it; their
+// items are reused. Returns the last item.
 i64 MinimumDegree::form_element(i64 element) {
   i64 tail = element;
   const auto append = [&](i64 item) {
@@ -245,7 +245,8 @@ i64 MinimumDegree::degree_of(i64 vertex, i64 element, i64 tag) {
   return degree;
 }
 
-// The tags used here lie between that of the element before its boundary was counted and its own: no other use has them.
+// The tags used here lie between that of the element before its boundary was counted and its own: no other use has
+// them.
 void MinimumDegree::update_degrees(i64 element) {
   i64 tag = mark(element) - last_[element];
   i64 item = element;

@@ -11,8 +11,8 @@ namespace sm {
 [[nodiscard]] SmStatus factor_numeric(SmMatrix& m);
 
 [[nodiscard]] SmStatus factor(SmMatrix& m, bool in_place);
-// The array of a packed or diagonal matrix that is to be factored or inverted: the values themselves (a separate array goes
-// back then), or a fresh copy of them in the separate array.
+// The array of a packed or diagonal matrix that is to be factored or inverted: the values themselves (a separate array
+// goes back then), or a fresh copy of them in the separate array.
 [[nodiscard]] SmStatus choose_array(SmMatrix& m, bool in_place, double*& array);
 // Runs ginverse2 in one of its modes from A on the values, or on a fresh copy of them in the separate array.
 [[nodiscard]] SmStatus transform_packed(SmMatrix& m, bool in_place, std::int32_t mode, double tolerance);

@@ -1,12 +1,12 @@
 // Symbolic factorization: the structure of U in compressed subscripts.
 //
 // Method: Eisenstat, Gursky, Schultz, Sherman, "Yale Sparse Matrix Package I: the symmetric codes", Int. J. Numer.
-// Methods Eng. 18 (1982) 1145-1151; compressed subscripts: A. H. Sherman, "On the efficient solution of sparse systems of
-// linear and nonlinear equations", thesis, Yale University (1975).
+// Methods Eng. 18 (1982) 1145-1151; compressed subscripts: A. H. Sherman, "On the efficient solution of sparse systems
+// of linear and nonlinear equations", thesis, Yale University (1975).
 //
-// Row k of U is its own entries joined with the tails of the earlier rows whose first column is k; those rows are chained
-// from jl[k]. Workspace, in words: iju [0, n), iu [n, 2n], jl [2n+1, 3n+1), ju from 3n+1; and at the top, while this runs,
-// mark [C-2n, C-n) and the merge list q [C-n, C).
+// Row k of U is its own entries joined with the tails of the earlier rows whose first column is k; those rows are
+// chained from jl[k]. Workspace, in words: iju [0, n), iu [n, 2n], jl [2n+1, 3n+1), ju from 3n+1; and at the top, while
+// this runs, mark [C-2n, C-n) and the merge list q [C-n, C).
 #include <algorithm>
 #include <cmath>
 

@@ -19,8 +19,8 @@ void empty_row(SmMatrix& a, i64 k) {
   }
 }
 
-// Row k becomes v. Only components below epsilon are written: that direction of the test is the operation's, whatever it
-// does to larger ones.
+// Row k becomes v. Only components below epsilon are written: that direction of the test is the operation's, whatever
+// it does to larger ones.
 SmStatus rewrite_row(SmMatrix& a, i64 k, const double* v, double epsilon) {
   empty_row(a, k);
   for (i64 j = 0; j < a.cols; ++j) {

@@ -39,8 +39,8 @@ bool agrees(const double* x, const double* z, i64 n, double tolerance) {
   return true;
 }
 
-// Runs product(x, z) for every vector and takes those off the count of failures whose product comes back as x. Answers the
-// status of the last product.
+// Runs product(x, z) for every vector and takes those off the count of failures whose product comes back as x. Answers
+// the status of the last product.
 template <class Product>
 SmStatus check_each(const SmMatrix& m, const double* vectors, std::int32_t k, i64& failed, std::int32_t* flags,
                     double tolerance, double* z, Product&& product) {

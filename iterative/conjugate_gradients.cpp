@@ -1,7 +1,7 @@
 // Conjugate gradients with a diagonal preconditioner.
 //
-// Method: Hestenes and Stiefel, "Methods of conjugate gradients for solving linear systems", J. Res. Nat. Bur. Standards
-// 49 (1952) 409-436, with the Jacobi preconditioner; the residual is recomputed every 50 steps against drift.
+// Method: Hestenes and Stiefel, "Methods of conjugate gradients for solving linear systems", J. Res. Nat. Bur.
+// Standards 49 (1952) 409-436, with the Jacobi preconditioner; the residual is recomputed every 50 steps against drift.
 #include <algorithm>
 #include <bit>
 #include <cmath>
@@ -20,7 +20,8 @@ namespace {
 constexpr i64 kExactResidualEvery = 50;
 constexpr double kSingularDiagonal = std::bit_cast<double>(SM_TOLERANCE_BITS);
 
-// Where an instance keeps its progress callback: the two words that the zeroing allocator leaves behind the one-word block.
+// Where an instance keeps its progress callback: the two words that the zeroing allocator leaves behind the one-word
+// block.
 struct ProgressWords {
   std::int64_t spare;
   SmProgress callback;

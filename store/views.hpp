@@ -1,12 +1,13 @@
-// The storage of a closed matrix as a view: it knows where elements live and walks the stored ones. An operation is written
-// once, as a template over views, and visit() picks the view by kind and format.
+// The storage of a closed matrix as a view: it knows where elements live and walks the stored ones. An operation is
+// written once, as a template over views, and visit() picks the view by kind and format.
 //
 //   view          serves                        one_triangle  a stored row holds
 //   TreeRows      general, 21                   no            its nodes, columns ascending
 //   FullArray     general, 22 and 23            no            every column
-//   UpperRows     symmetric, 21                 yes           columns ascending from the diagonal on; once reordered, the
-//                                                             diagonal first and then the others in no order, (i, j) standing
-//                                                             for the pair whichever index is larger
+//   UpperRows     symmetric, 21                 yes           columns ascending from the diagonal on; once reordered,
+//                 the
+//                                                             diagonal first and then the others in no order, (i, j)
+//                                                             standing for the pair whichever index is larger
 //   Packed<L>     symmetric, 22 and 23          yes           columns i .. n-1
 //   DiagonalArray diagonal                      no            column i
 //
@@ -14,12 +15,12 @@
 //
 // Each view has rows, cols;
 //   row(i, f)      f(j, value) for the stored entries of row i, in the order of the table
-//   line(k, f)     f(i, j, value) for the stored entries of the k-th of lines() lines in storage: a column where columns
-//                  are stored, else a row
+//   line(k, f)     f(i, j, value) for the stored entries of the k-th of lines() lines in storage: a column where
+//                  columns are stored, else a row
 //   entries(f)     f(i, j, value) for every stored entry, in storage order
 //   any(f)         whether f(i, j, value) holds for one of them; lines after the first that has one are not looked at
-//   find(i, j)     the address of the stored element, or null; one_triangle views want i <= j, and UpperRows rows that have
-//                  not been reordered
+//   find(i, j)     the address of the stored element, or null; one_triangle views want i <= j, and UpperRows rows that
+//                  have not been reordered
 //   diagonal(i)    the address of the stored element (i, i), or null; in any order of the rows
 // Values are passed as double&, so that the same walk reads and writes.
 #pragma once
@@ -172,8 +173,8 @@ struct DiagonalArray : StoredLines<DiagonalArray> {
   }
 };
 
-// Calls f(view) -> SmStatus for the matrix's kind and format, and answers what it answers; `otherwise` for a format that the
-// kind does not know, 124 for another kind. The matrix must be readable (is_closed) and not empty.
+// Calls f(view) -> SmStatus for the matrix's kind and format, and answers what it answers; `otherwise` for a format
+// that the kind does not know, 124 for another kind. The matrix must be readable (is_closed) and not empty.
 template <class F>
 SmStatus visit(SmMatrix& m, F&& f, SmStatus otherwise = SM_UNAVAILABLE) {
   const bool sparse = m.format == SM_FORMAT_SPARSE;

@@ -56,8 +56,8 @@ QXESM_API SmStatus qxsmrank(SmMatrix* matrix, int64_t* out);
  * Dropped pivots: sparse and diagonal give 0 there. A packed factor passes the component on undivided, so that
  * A x = b for every b in the range of A; for other b the result belongs to another generalized inverse than the one
  * that inversion stores.
- * Answers: 0 with nothing done (empty); 1; 113; 102 (state other than 5); 104 (x is b); 124; 101 (a packed matrix needs n
- * doubles of work, whatever the count); 0. Cost: two passes over the factor for each right-hand side.
+ * Answers: 0 with nothing done (empty); 1; 113; 102 (state other than 5); 104 (x is b); 124; 101 (a packed matrix needs
+ * n doubles of work, whatever the count); 0. Cost: two passes over the factor for each right-hand side.
  * Uses the record's factor_scratch: one solve at a time for each matrix. */
 QXESM_API SmStatus qxsmsubst(SmMatrix* matrix, const double* b, double* x, int32_t count);
 
@@ -69,15 +69,16 @@ QXESM_API SmStatus qxsminvmultv(SmMatrix* matrix, const double* b, double* x, in
 
 /* The one-call solve: closes an open matrix (dropping nothing), factors or inverts it, x <- A^- b.
  *   symmetric sparse   qxsmfact and qxsmsubst
- *   symmetric 22, 23   replaces the factor, or the matrix, by its generalized inverse (in the separate array when there is
- *                      one, else in the values): state 6; then x <- G b
+ *   symmetric 22, 23   replaces the factor, or the matrix, by its generalized inverse (in the separate array when there
+ *                      is one, else in the values): state 6; then x <- G b
  *   diagonal           divides by the stored values; d <= t gives 0; d < -0.0001 ends with 103
  * Shapes as in qxsmsubst. Answers: 0 with nothing done (empty); 1; 104 (x is b); qxsmclose's; 124 (general);
  * 101; 103; qxsmfact's; qxsmsubst's; 0. */
 QXESM_API SmStatus qxsmsoldirect(SmMatrix* matrix, const double* b, double* x, int32_t count);
 
-/* x <- the diagonal of A^-, factoring when needed; n doubles, in the matrix's own numbering. Rows of dropped pivots give 0.
- * A diagonal matrix that has not been inverted answers its factor, the square roots of its elements, as it stands.
+/* x <- the diagonal of A^-, factoring when needed; n doubles, in the matrix's own numbering. Rows of dropped pivots
+ * give 0. A diagonal matrix that has not been inverted answers its factor, the square roots of its elements, as it
+ * stands.
  * Answers: 0 with nothing done (empty); 1; 113; 111; then, with x cleared: 124 (general); qxsmfact's; 101 (packed: n
  * doubles of work); 0. Cost: n partial back substitutions. Uses the record's factor_scratch. */
 QXESM_API SmStatus qxsminvdiag(SmMatrix* matrix, double* x);

@@ -7,14 +7,15 @@
 /* A record of the given kind and format, without a size.
  *   matrix  in/out  *matrix null: a new record, registered in the instance; else that record is typed again, and what
  *                   it held before is not given back (reset it with qxsmdelete first)
- * Answers: 104 (the record is another instance's); 101 (record, registry or pool could not be had); 116 (format not allowed for the kind: 21, 22, 23 for
- * general and symmetric, 22, 23 for diagonal); 124 (no such kind); 0.
- * On 116 and 124 the record stays registered with kind none and without a pool, and *matrix is unchanged. A missing tree
- * manager is not an error here: the first assignment answers 101. */
+ * Answers: 104 (the record is another instance's); 101 (record, registry or pool could not be had); 116 (format not
+ * allowed for the kind: 21, 22, 23 for general and symmetric, 22, 23 for diagonal); 124 (no such kind); 0.
+ * On 116 and 124 the record stays registered with kind none and without a pool, and *matrix is unchanged. A missing
+ * tree manager is not an error here: the first assignment answers 101. */
 QXESM_API SmStatus qxsmnew(SmInstance* instance, SmMatrix** matrix, int32_t kind, int32_t format);
 
 /* qxsmnew and qxsmresize in one: symmetric sparse n x n, open, with its zero diagonal; symmetric in format 22, n x n;
- * general sparse rows x cols; diagonal in format 23, n x n. The answer of qxsmnew unless it is 0, else of qxsmresize. */
+ * general sparse rows x cols; diagonal in format 23, n x n. The answer of qxsmnew unless it is 0, else of
+ * qxsmresize. */
 QXESM_API SmStatus qxsmnewss(SmInstance* instance, SmMatrix** matrix, int64_t n);
 QXESM_API SmStatus qxsmnewds(SmInstance* instance, SmMatrix** matrix, int64_t n);
 QXESM_API SmStatus qxsmnewsg(SmInstance* instance, SmMatrix** matrix, int64_t rows, int64_t cols);
@@ -26,11 +27,11 @@ QXESM_API SmStatus qxsmnewsd(SmInstance* instance, SmMatrix** matrix, int64_t n)
  *   general sparse      no entries, state 1
  *   symmetric sparse    a zero on every diagonal position (nnz = n), state 0: open for qxsmassign
  * 0 x 0 is a size. Answers: 1; 122 (negative, or exactly one dimension zero); 111 (symmetric or diagonal and
- * rows != cols; the state is 1 afterwards, and while a symmetric sparse matrix has no compressed rows its readers answer
- * 113); 105 (more than 2^53 values, roots or nodes); 101; 124.
- * After 105 or 101 a dense or diagonal matrix has no values (nnz 0) and keeps rows and cols as asked; a sparse one keeps
- * its size and refuses entries with 101. 111 takes a matrix that was factored or inverted in place to state 1 as well, with
- * that factor or inverse as its values. Cost: the size of the storage; a symmetric sparse matrix pays n
+ * rows != cols; the state is 1 afterwards, and while a symmetric sparse matrix has no compressed rows its readers
+ * answer 113); 105 (more than 2^53 values, roots or nodes); 101; 124.
+ * After 105 or 101 a dense or diagonal matrix has no values (nnz 0) and keeps rows and cols as asked; a sparse one
+ * keeps its size and refuses entries with 101. 111 takes a matrix that was factored or inverted in place to state 1 as
+ * well, with that factor or inverse as its values. Cost: the size of the storage; a symmetric sparse matrix pays n
  * insertions. */
 QXESM_API SmStatus qxsmresize(SmMatrix* matrix, int64_t rows, int64_t cols);
 
@@ -38,7 +39,8 @@ QXESM_API SmStatus qxsmresize(SmMatrix* matrix, int64_t rows, int64_t cols);
  * qxsmnew or qxsmtie can use it again. Null is harmless. Answers 0. */
 QXESM_API SmStatus qxsmdelete(SmMatrix* matrix);
 
-/* Resets the matrix, frees its record, in the instance that made it, and stores null. A null address or record is harmless. Answers 0. */
+/* Resets the matrix, frees its record, in the instance that made it, and stores null. A null address or record is
+ * harmless. Answers 0. */
 QXESM_API SmStatus qxsmDestroyMatrix(SmInstance* instance, SmMatrix** matrix);
 
 /* Attaches the caller's array as the values of a dense or diagonal matrix.
@@ -64,8 +66,8 @@ QXESM_API SmStatus qxsmremove(SmMatrix* matrix, int64_t row, int64_t col);
  * goes back and the state returns to 1; one that was factored or inverted in place keeps its state, and its values are
  * then that factor or inverse with this element changed.
  * Answers: 0 with nothing done (rows < 1); 1; 104 (negative index); 117 (below the diagonal of a symmetric matrix); 119
- * (symmetric sparse, closed); 104 (off the diagonal of a diagonal matrix; outside a dense matrix's storage or size); 124
- * (format); 105 (2^53 entries, or an index that no root array can reach); 101; 0.
+ * (symmetric sparse, closed); 104 (off the diagonal of a diagonal matrix; outside a dense matrix's storage or size);
+ * 124 (format); 105 (2^53 entries, or an index that no root array can reach); 101; 0.
  * After 101 from a sparse matrix that could not get a new slab the entry is in; further calls answer 101.
  * Cost: one tree insertion. */
 QXESM_API SmStatus qxsmassign(SmMatrix* matrix, int64_t row, int64_t col, int32_t add, double value);
@@ -85,17 +87,17 @@ QXESM_API SmStatus qxsmsetee(SmMatrix* matrix, double value);
 
 /* Adds weight * z * z' to a symmetric matrix.
  *   z      length doubles
- *   index  null: z lies along rows 0 .. length-1, and zeros of z add nothing; else length row numbers, in any order, and
- *          every pair is entered, zeros included
+ *   index  null: z lies along rows 0 .. length-1, and zeros of z add nothing; else length row numbers, in any order,
+ *          and every pair is entered, zeros included
  * Answers: 0 with nothing done (empty); 104 (length > rows; z null with length > 0); 124 (not symmetric); 119 (sparse
  * and not open); else the first answer of qxsmassign that is not 0 (what was added before stays); 0.
  * Cost: length^2 / 2 assignments. */
 QXESM_API SmStatus qxsmzscp(SmMatrix* matrix, const double* z, const int64_t* index, int64_t length, double weight);
 
-/* Ends assembly: state 1. Entries with |value| <= tolerance are dropped (dense and diagonal: set to 0; the diagonal of a
- * symmetric sparse matrix: kept as 0). A negative tolerance stands for setting 3 of the instance; a NaN drops nothing. A
- * symmetric sparse matrix turns into compressed rows of its upper triangle, diagonal first, columns ascending, every
- * diagonal present; its trees go back to the host. Only a matrix in state 0 is touched.
+/* Ends assembly: state 1. Entries with |value| <= tolerance are dropped (dense and diagonal: set to 0; the diagonal of
+ * a symmetric sparse matrix: kept as 0). A negative tolerance stands for setting 3 of the instance; a NaN drops
+ * nothing. A symmetric sparse matrix turns into compressed rows of its upper triangle, diagonal first, columns
+ * ascending, every diagonal present; its trees go back to the host. Only a matrix in state 0 is touched.
  * Answers: 0 with state 1 (empty); 1; 0 with nothing done (closed already); 105; 101 (the matrix stays open);
  * 124; 0. Cost: one walk over the entries. */
 QXESM_API SmStatus qxsmclose(SmMatrix* matrix, double tolerance);

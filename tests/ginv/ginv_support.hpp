@@ -39,7 +39,7 @@ SmMatrix* sized(Session& session, Shape shape, std::int64_t rows, std::int64_t c
 SmMatrix* build_without_values(Session& session, Shape shape, std::int64_t n);
 
 Shape shape_of(const SmMatrix* matrix);
-// What is stored, in whatever state; both triangles of a symmetric matrix. An array may be given in place of the values.
+// What is stored, in whatever state; both triangles of a symmetric matrix. An array may take the place of the values.
 Dense contents(SmMatrix* matrix, const double* values = nullptr);
 // The stored entries of a sparse matrix, upper triangle first index first, whatever order the rows are in.
 Nonzeros entries(SmMatrix* matrix);
@@ -51,7 +51,7 @@ struct Snapshot {
 };
 Snapshot snapshot(SmMatrix* matrix);
 
-// The generalized inverse without the pivots that are dropped in the order: the inverse of the accepted block, and zeros.
+// The generalized inverse without the pivots that are dropped in the order: the inverse of the accepted block, else 0.
 struct Reference {
   Dense inverse;
   std::vector<bool> accepted;
