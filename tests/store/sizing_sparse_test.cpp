@@ -251,11 +251,15 @@ TEST_P(SizingSparse, more_roots_or_nodes_than_can_be_counted_answer_105) {
     SmMatrix* g = typed(kGeneralSparse);
     EXPECT_EQ(fn().qxsmresize(g, n, 1), SM_TOO_LARGE) << n;
     EXPECT_EQ(g->nnz, 0);
+    EXPECT_EQ(g->rows, n);
+    EXPECT_EQ(set(g, 0, 0, 1.0), SM_NO_MEMORY);
     EXPECT_EQ(fn().qxsmresize(g, 3, 1), SM_OK);
     EXPECT_EQ(set(g, 2, 0, 1.0), SM_OK);
     SmMatrix* s = typed(kSymmetricSparse);
     EXPECT_EQ(fn().qxsmresize(s, n, n), SM_TOO_LARGE) << n;
     EXPECT_EQ(s->nnz, 0);
+    EXPECT_EQ(s->rows, n);
+    EXPECT_EQ(set(s, 0, n - 1, 1.0), SM_NO_MEMORY);
     EXPECT_EQ(fn().qxsmresize(s, 3, 3), SM_OK);
     EXPECT_EQ(set(s, 0, 2, 1.0), SM_OK);
   }

@@ -259,6 +259,14 @@ TEST_P(Tie, a_reset_record_is_registered_again) {
   EXPECT_EQ(at(m, 0, 0), 1.0);
 }
 
+TEST_P(Tie, a_reset_record_that_was_closed_is_readable_at_once) {
+  SmMatrix* m = reset_record();
+  ASSERT_EQ(fn().qxsmclose(m, 0.0), SM_OK);
+  ASSERT_EQ(tie(m, data(), 3, 3, kGeneralRows), SM_OK);
+  EXPECT_EQ(m->state, SM_STATE_CLOSED);
+  EXPECT_EQ(at(m, 1, 0), 4.0);
+}
+
 // What a reset record takes after it was tied must be found when the instance goes: the fixture counts.
 TEST_P(Tie, a_reset_record_gets_a_pool_when_an_operation_needs_one) {
   for (const Shape shape : kSquareFactored) {
