@@ -71,6 +71,21 @@ TEST_P(FormsAllocationTest, forms_of_more_rows_than_a_slab_has_nodes) {
   }
 }
 
+TEST_P(FormsAllocationTest, only_several_rows_by_columns_are_copied) {
+  const auto requests_for = [&](Shape outer, std::int64_t rows) {
+    return survive({[=](Session& s) {
+                      return Matrices{build(s, kSymmetricRows, known_of(kSymmetricRows, 5, 5)),
+                                      build(s, outer, known_of(outer, rows, 5)),
+                                      new_sized(s, kSymmetricRows, rows, rows)};
+                    },
+                    [](Session& s, const Matrices& m) { return s.fn().qxsmquad(m[0], m[1], m[2], 0); }, last_of});
+  };
+  EXPECT_EQ(requests_for(kGeneralRows, 1), 1);
+  EXPECT_EQ(requests_for(kGeneralRows, 2), 1);
+  EXPECT_EQ(requests_for(kGeneralColumns, 1), 1);
+  EXPECT_EQ(requests_for(kGeneralColumns, 2), 2);
+}
+
 TEST_P(FormsAllocationTest, forms_of_packed_arrays_between_sparse_rows) {
   Random random(3);
   const std::vector<double> s_of = random.vector(15);

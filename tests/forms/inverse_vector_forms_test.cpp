@@ -199,6 +199,29 @@ TEST_P(InverseVectorFormsTest, without_vectors_the_matrix_is_factored_and_nothin
   }
 }
 
+// 1/4 on the diagonal: every order of a sum gives the same bits.
+TEST_P(InverseVectorFormsTest, longer_vectors_are_summed_whole) {
+  Random random(4);
+  for (const std::int64_t n : {249, 250, 499, 500, 501})
+    for (const Shape shape : {kSymmetricSparse, kSymmetricRows, kDiagonalColumns}) {
+      Known known(n, n);
+      for (std::int64_t i = 0; i < n; ++i) known.set(i, i, 4.0);
+      SmMatrix* m = build(shape, known);
+      const std::vector<double> x = random.vector(2 * n);
+      std::vector<double> want(4);
+      for (std::size_t e = 0; e < 4; ++e)
+        for (std::int64_t i = 0; i < n; ++i)
+          want[e] += x[at(i + n * (e % 2 ? 1 : 0))] * x[at(i + n * (e / 2 ? 1 : 0))] / 4.0;
+      Output r(3);
+      ASSERT_EQ(quadratic(m, x, r, 2, 22), SM_OK);
+      EXPECT_TRUE(same(r.values(), {want[0], want[1], want[3]})) << name_of(shape) << ' ' << n;
+      Output t(4);
+      ASSERT_EQ(bilinear(m, x, x, t, 2, 2), SM_OK);
+      EXPECT_TRUE(same(t.values(), want)) << name_of(shape) << ' ' << n;
+      destroy(m);
+    }
+}
+
 TEST_P(InverseVectorFormsTest, infinities_and_nans_of_the_vectors_propagate) {
   for (const Operand& operand : symmetric_and_diagonal()) {
     if (!solvable(operand)) continue;

@@ -81,6 +81,28 @@ TEST_P(MultiplyTest, every_length_around_a_lane_of_the_processor_is_summed_whole
     }
 }
 
+TEST_P(MultiplyTest, a_vector_that_a_library_would_take_is_summed_with_its_zeros_and_infinities) {
+  Random random(9);
+  const std::int64_t n = 513;
+  for (const Shape shape : kShapes) {
+    SCOPED_TRACE(name_of(shape));
+    Known known = random_known(random, shape, n, n);
+    std::vector<double> x = random.vector(n);
+    for (const bool special : {false, true}) {
+      if (special) {
+        known.set(7, 7, kInfinity);
+        x[7] = 0.0;
+      }
+      SmMatrix* m = build(shape, known);
+      Output y(n);
+      ASSERT_EQ(qxsmmultv(m, x.data(), y.data(), 0, n - 1, 0, n - 1, 1, 0), SM_OK);
+      EXPECT_TRUE(same(y.values(), block_times(shape, known, {0, n - 1, 0, n - 1}, x, 1, std::vector<double>(at(n)))));
+      EXPECT_EQ(std::isnan(y.values()[7]), special);
+      destroy(m);
+    }
+  }
+}
+
 TEST_P(MultiplyTest, elements_outside_the_block_never_reach_the_result) {
   Random random(12);
   for (const Shape shape : kShapes) {
