@@ -1,0 +1,132 @@
+// Drives the module with random calls beside the model, and compares after each of them.
+#pragma once
+
+#include <deque>
+#include <functional>
+#include <map>
+#include <memory>
+#include <optional>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include "model/algebra.hpp"
+#include "model/model.hpp"
+#include "support/module_test.hpp"
+#include "support/random_matrices.hpp"
+
+namespace sm::test {
+
+// What a call should leave in an output array: each element within its slack (0: equal).
+class Wanted {
+ public:
+  static constexpr double kUntouched = 777.25;
+  explicit Wanted(Index n) : value_(static_cast<std::size_t>(n), kUntouched), slack_(value_.size(), 0.0) {}
+  Index size() const { return static_cast<Index>(value_.size()); }
+  void clear(Index n) {
+    for (Index i = 0; i < n; ++i) set(i, 0.0);
+  }
+  void set(Index i, double value, double slack = 0) {
+    value_.at(static_cast<std::size_t>(i)) = value;
+    slack_.at(static_cast<std::size_t>(i)) = slack;
+  }
+  void set(Index i, const Sum& sum) { set(i, sum.value(), sum.slack()); }
+  double value(Index i) const { return value_.at(static_cast<std::size_t>(i)); }
+  double slack(Index i) const { return slack_.at(static_cast<std::size_t>(i)); }
+
+ private:
+  std::vector<double> value_;
+  std::vector<double> slack_;
+};
+
+struct Count {
+  Index calls = 0;
+  Index served = 0;  // answered 0
+};
+
+class Machine {
+ public:
+  Machine(HostKind host, std::uint64_t seed);
+  // Makes the calls; the account of the first difference, or nothing.
+  std::string run(Index steps);
+  const std::map<std::string, Count>& counts() const { return counts_; }
+
+  // For the calls.
+  Random random;
+  SmInstance* instance() { return session_.instance(); }
+  const SmFunctionTable& fn() { return session_.fn(); }
+  // A record of the pool with a handle; one whose model passes the test, as far as a few draws find it; or null.
+  Model* any();
+  Model* any(const std::function<bool(const Model&)>& test);
+  Model* vacant();                                  // without a handle
+  double* lend(const std::vector<double>& values);  // an array that lives as long as the session
+  // An array of n places that holds kUntouched.
+  std::vector<double> blank(Index n) const {
+    return std::vector<double>(static_cast<std::size_t>(n), Wanted::kUntouched);
+  }
+  double dyadic() { return random.chance(10) ? 0.0 : random.dyadic(); }
+  std::vector<double> dyadics(Index n);
+  Index number(const Model& model) const { return &model - records_.data(); }
+
+  template <class... Arguments>
+  void begin(const char* name, const Arguments&... arguments) {
+    std::ostringstream text;
+    text.precision(17);
+    text << name << "(";
+    ((text << " " << arguments), ...);
+    text << " )";
+    name_ = name;
+    trail_.push_back(text.str());
+    if (trail_.size() > 40) trail_.pop_front();
+  }
+  // The answer of the call that was begun last.
+  void answer(SmStatus got, SmStatus want);
+  void output(const double* got, const Wanted& want);
+  void same(double got, double want, double slack, const char* what);
+  void wrong(const std::string& text);
+
+ private:
+  void compare_all();
+  void keep_small();
+
+  Session session_;
+  std::vector<Model> records_;
+  std::vector<std::unique_ptr<double[]>> arrays_;
+  std::deque<std::string> trail_;
+  std::string name_;
+  std::map<std::string, Count> counts_;
+  std::string wrong_;
+};
+
+// One operation's generator: chooses arguments, makes the call, predicts it. It may find nothing to do.
+struct Call {
+  void (*make)(Machine&);
+  int weight;
+};
+const std::vector<Call>& all_calls();
+
+void add_store_calls(std::vector<Call>& list);
+void add_assembly_calls(std::vector<Call>& list);
+void add_reading_calls(std::vector<Call>& list);
+void add_copying_calls(std::vector<Call>& list);
+void add_factor_calls(std::vector<Call>& list);
+void add_solve_calls(std::vector<Call>& list);
+void add_form_calls(std::vector<Call>& list);
+void add_product_calls(std::vector<Call>& list);
+void add_trace_calls(std::vector<Call>& list);
+void add_estimability_calls(std::vector<Call>& list);
+
+// The steps that operations have in common, on the model alone.
+SmStatus model_resize(Model& m, Index rows, Index cols);
+void model_reset(Model& m);
+void model_new(Model& m, std::int32_t kind, std::int32_t format);
+SmStatus model_assign(Model& m, Index row, Index col, bool add, double value);
+SmStatus model_close(Model& m, double tolerance);
+// The checks that most operations begin with: empty 0, none 1, not closed 113.
+std::optional<SmStatus> not_readable(const Model& m);
+// Factors the model as qxsmfact would; call it after the module's call, when a sparse record tells its order.
+SmStatus model_factor(Model& m, bool in_place);
+// Whether that can be predicted: no pivot near a limit.
+bool factor_is_clear(const Model& m);
+
+}  // namespace sm::test
