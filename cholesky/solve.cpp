@@ -118,7 +118,7 @@ void multiply_by_diagonal(const SmMatrix& m, const double* g, const double* b, d
 Gate may_apply_inverse(const SmMatrix& m, const double* b, const double* x) {
   SM_STOP_IF(m.nnz < 1, SM_OK);
   SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(m), SM_NOT_CLOSED);
+  SM_STOP_IF(m.state < SM_STATE_FACTORED && !is_closed(m), SM_NOT_CLOSED);
   SM_STOP_IF(m.state >= SM_STATE_FACTORED && !m.row_start, SM_NO_FACTOR);
   SM_STOP_IF(b == x, SM_BAD_ARGUMENT);
   SM_STOP_IF(m.rows != m.cols, SM_NOT_SQUARE);

@@ -43,10 +43,22 @@ SmStatus form_by_vectors(SmMatrix& a, SmMatrix& x, SmMatrix& r) {
   return store_packed(packed.data(), x.rows, entry_tolerance(a), r);
 }
 
-// Zeros of a row of X that meet an infinity or a NaN: 0, or a NaN that no form of that row escapes.
-double zeros_times(const double* w, i64 n) {
+// Whether zeros of X that are not stored make no difference to a product with w: they do where they meet an infinity
+// or a NaN.
+bool is_finite(const double* w, i64 n) {
+  return std::all_of(w, w + n, [](double v) { return std::isfinite(v); });
+}
+
+// Row j of X times w; `dense` is n doubles of work for the case that every element counts.
+template <class Rows>
+double row_times(Rows& rows, i64 j, const double* w, i64 n, bool finite, double* dense) {
   double sum = 0.0;
-  for (i64 k = 0; k < n; ++k) sum += 0.0 * w[k];
+  if (finite) {
+    rows.row(j, [&](i64 k, double v) { sum += v * w[k]; });
+    return sum;
+  }
+  scatter_row(rows, j, dense, n);
+  for (i64 k = 0; k < n; ++k) sum += dense[k] * w[k];
   return sum;
 }
 
@@ -57,10 +69,9 @@ SmStatus enter_forms(Rows& rows, const View& view, i64 count, double* x, double*
     if (!scatter_row(rows, i, x, view.rows)) continue;
     std::fill_n(w, view.rows, 0.0);
     add_product(view, x, w);
-    const double from_zeros = zeros_times(w, view.rows);
+    const bool finite = is_finite(w, view.rows);
     for (i64 j = i; j < count; ++j) {
-      double sum = from_zeros;
-      rows.row(j, [&](i64 k, double v) { sum += v * w[k]; });
+      const double sum = row_times(rows, j, w, view.rows, finite, x);
       if (std::fabs(sum) > tolerance) SM_TRY(assign(r, i, j, true, sum));
     }
   }

@@ -28,7 +28,8 @@ SmStatus accumulate_general(SmMatrix& a, SmMatrix& b, double s) {
 
 // In storage order, never re-mapped: with the packing by columns that is the leading block of a larger A.
 SmStatus accumulate_values(SmMatrix& a, const SmMatrix& b, i64 count, double s) {
-  if (count > static_cast<i64>(a.value_count) || count > static_cast<i64>(b.value_count)) return SM_BAD_ARGUMENT;
+  if (b.rows > 0 && !b.values) return SM_BAD_ARGUMENT;
+  if (count > static_cast<i64>(a.value_count)) return SM_BAD_ARGUMENT;
   drop_separate_factor(a);
   for (i64 i = 0; i < count; ++i) a.values[i] += s * b.values[i];
   void_results(a);

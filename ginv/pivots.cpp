@@ -15,7 +15,7 @@ namespace {
 Gate may_ask_pivots(const SmMatrix& m) {
   SM_STOP_IF(m.nnz < 1, SM_OK);
   SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(m), SM_NOT_CLOSED);
+  SM_STOP_IF(m.state < SM_STATE_FACTORED && !is_closed(m), SM_NOT_CLOSED);
   SM_STOP_IF(m.rows != m.cols, SM_NOT_SQUARE);
   return {};
 }
