@@ -51,10 +51,10 @@ void add_common(CLI::App& command, CommonOptions& common) {
 void add_memory(CLI::App& command, CommonOptions& common) {
   command
       .add_option("--memory", common.memory,
-                  "Ceiling for the memory of the computation:\n"
-                  "512M, 4G (K, M, G, T are powers of 1024).\n"
-                  "Past it the run ends with exit code 3.\n"
-                  "Default: what this machine has")
+                  "Ceiling for the memory pools of the computation,\n"
+                  "and for what is kept of a file: 512M, 4G (K, M,\n"
+                  "G, T are powers of 1024). Past it the run ends\n"
+                  "with exit code 3. Default: what this machine has")
       ->check(CLI::Validator(check_memory, ""))
       ->type_name("SIZE");
 }

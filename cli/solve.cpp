@@ -140,7 +140,7 @@ Report run_solve(const SolveOptions& options, const CommonOptions& common, Progr
   std::optional<OutputFile> output;
   if (!options.output.empty()) output.emplace(options.output, std::vector{options.matrix, options.right_hand_sides});
 
-  ModuleSession session(common.ceiling);
+  ModuleSession session(pool_ceiling(common));
   Factorization factorization(session, matrix.rows, progress);
   factorization.analyse();
   if (!factorization.factor()) {
