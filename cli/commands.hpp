@@ -31,6 +31,12 @@ struct InvdiagOptions {
   std::string output;  // empty: the diagonal is not written
 };
 
+struct TraceOptions {
+  std::string matrix;
+  std::string other;  // empty: there is no second matrix
+  bool inverse = false;
+};
+
 struct SolveOptions {
   std::string matrix;
   std::string right_hand_sides;  // empty: b = A * 1
@@ -49,6 +55,7 @@ struct GridOptions {
 Report run_info(const InfoOptions& options, const CommonOptions& common, Progress& progress);
 Report run_factor(const FactorOptions& options, const CommonOptions& common, Progress& progress);
 Report run_invdiag(const InvdiagOptions& options, const CommonOptions& common, Progress& progress);
+Report run_trace(const TraceOptions& options, const CommonOptions& common, Progress& progress);
 Report run_solve(const SolveOptions& options, const CommonOptions& common, Progress& progress);
 Report run_grid(const GridOptions& options);
 

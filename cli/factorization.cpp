@@ -6,11 +6,11 @@
 #include <chrono>
 
 #include "cli/error.hpp"
+#include "cli/module_matrix.hpp"
 
 namespace sm::cli {
 namespace {
 
-constexpr std::int64_t kRowsPerUpdate = 4096;
 constexpr std::int64_t kSolvesPerCall = 16;  // right-hand sides between two updates of the progress bar
 
 }  // namespace
@@ -38,17 +38,8 @@ Factorization::Factorization(ModuleSession& session, const CompressedRows& upper
 }
 
 void Factorization::enter(const CompressedRows& upper) {
-  const std::string doing = "assembling the matrix";
-  session_.expect_ok(session_.fn().qxsmnewss(session_.instance(), &matrix_, order_), doing);
-  const auto assign = session_.fn().qxsmassign;
-  for (std::int64_t i = 0; i < order_; ++i) {
-    const auto end = static_cast<std::size_t>(upper.start[static_cast<std::size_t>(i + 1)]);
-    for (auto p = static_cast<std::size_t>(upper.start[static_cast<std::size_t>(i)]); p < end; ++p) {
-      const SmStatus status = assign(matrix_, i, upper.col[p], 1, upper.value[p]);
-      if (status != SM_OK) session_.expect_ok(status, doing);
-    }
-    if (i % kRowsPerUpdate == 0) progress_.update(static_cast<double>(i) / static_cast<double>(order_));
-  }
+  session_.expect_ok(session_.fn().qxsmnewss(session_.instance(), &matrix_, order_), "assembling the matrix");
+  enter_rows(session_, matrix_, upper, progress_);
 }
 
 void Factorization::analyse() {
@@ -105,6 +96,10 @@ std::vector<double> Factorization::inverse_diagonal() {
   const SmStatus status = timed("inverting", [&] { return session_.fn().qxsminvdiag(matrix_, diagonal.data()); });
   session_.expect_ok(status, "computing the diagonal of the inverse");
   return diagonal;
+}
+
+SmStatus Factorization::inverse_trace(SmMatrix* other, double& trace) {
+  return timed("tracing", [&] { return session_.steps().qxsmtraceinvAB(matrix_, other, 0, &trace); });
 }
 
 std::vector<std::int64_t> Factorization::dropped_rows() const {

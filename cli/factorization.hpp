@@ -46,6 +46,9 @@ class Factorization {
   // The diagonal of the inverse, or of the generalized inverse that dropped pivots leave. After factor().
   std::vector<double> inverse_diagonal();
 
+  // The trace of the inverse times a closed matrix of that order; the module's own answer. After factor().
+  SmStatus inverse_trace(SmMatrix* other, double& trace);
+
   std::int64_t order() const { return order_; }
   const FactorCounts& counts() const { return counts_; }
   std::int64_t rank() const { return rank_; }

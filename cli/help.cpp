@@ -108,6 +108,24 @@ Example: which joints of a structure give way most, and how far.
   ...
 )";
 
+const char* const kTrace =
+    R"(Compute the trace of A, A B, A^- or A^- B
+
+Without --inverse, A and B are any real matrices whose product is square, general or symmetric. With --inverse, A is
+symmetric and factored as 'qxsm factor' does: the trace is then that of its inverse, or of the inverse times B, with a
+solution for each row of B. When A is singular, the inverse is the generalized inverse that dropped pivots leave. A
+matrix that is not positive semidefinite is refused, with exit code 1.
+
+Example: the inverse of A times A itself has the rank of A as its trace.
+
+  $ qxsm trace data/bcsstk01.mtx data/bcsstk01.mtx --inverse
+  second matrix    data/bcsstk01.mtx (coordinate real symmetric), 48 x 48
+  rank             48 of 48
+  rows dropped     none
+  tr(A^- B)        47.99999999999997
+  ...
+)";
+
 const char* const kGrid =
     R"(Write the matrix of a five-point grid, for trials of any size
 

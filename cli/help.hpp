@@ -8,6 +8,7 @@ extern const char* const kInfo;
 extern const char* const kFactor;
 extern const char* const kSolve;
 extern const char* const kInvdiag;
+extern const char* const kTrace;
 extern const char* const kGrid;
 extern const char* const kExitCodes;
 

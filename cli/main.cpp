@@ -31,6 +31,8 @@ Report run_command(const Options& options) {
       return run_solve(options.solve, options.common, progress);
     case Command::invdiag:
       return run_invdiag(options.invdiag, options.common, progress);
+    case Command::trace:
+      return run_trace(options.trace, options.common, progress);
     case Command::grid:
       return run_grid(options.grid);
     case Command::none:

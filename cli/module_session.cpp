@@ -65,6 +65,7 @@ void ModuleSession::find_steps() {
   find(steps_.qxsmsymbfact, "qxsmsymbfact");
   find(steps_.qxsmnumfact, "qxsmnumfact");
   find(steps_.qxsminvmultv, "qxsminvmultv");
+  find(steps_.qxsmtraceinvAB, "qxsmtraceinvAB");
 }
 
 void ModuleSession::expect_ok(SmStatus status, const std::string& doing) const {

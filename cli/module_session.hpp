@@ -16,6 +16,7 @@ struct ExportedSteps {
   SmStatus (*qxsmsymbfact)(SmMatrix* matrix) = nullptr;
   SmStatus (*qxsmnumfact)(SmMatrix* matrix) = nullptr;
   SmStatus (*qxsminvmultv)(SmMatrix* matrix, const double* b, double* x, int64_t count) = nullptr;
+  SmStatus (*qxsmtraceinvAB)(SmMatrix* a, SmMatrix* b, int64_t start, double* result) = nullptr;
 };
 
 class ModuleSession {

@@ -135,6 +135,18 @@ void add_invdiag(CLI::App& app, Options& options) {
   command->callback([&] { options.command = Command::invdiag; });
 }
 
+void add_trace(CLI::App& app, Options& options) {
+  CLI::App* command = add_command(app, "trace", help::kTrace);
+  command->add_option("A.mtx", options.trace.matrix, kMatrixHelp)->required()->type_name("");
+  command->add_option("B.mtx", options.trace.other, "The second matrix of a product, if any")->type_name("");
+  command->add_flag("--inverse", options.trace.inverse,
+                    "tr(A^-) or tr(A^- B), with A symmetric; A is\n"
+                    "factored");
+  add_common(*command, options.common);
+  add_memory(*command, options.common);
+  command->callback([&] { options.command = Command::trace; });
+}
+
 void add_grid(CLI::App& app, Options& options) {
   CLI::App* command = add_command(app, "grid", help::kGrid);
   command->add_option("NX", options.grid.nx, "Points in the first direction")
@@ -165,7 +177,7 @@ std::string help_command(const CLI::App& app) {
   const auto word = std::find_if(argv + 1, argv + argc, [](const char* argument) { return argument[0] != '-'; });
   if (app.get_subcommands().empty() && word != argv + argc) {
     throw CommandError({.what = "found the subcommand " + quote(*word),
-                        .expected = "info, factor, solve, invdiag or grid",
+                        .expected = "info, factor, solve, invdiag, trace or grid",
                         .advice = "see qxsm --help"});
   }
   throw CommandError({.what = error.what(), .advice = "see " + help_command(app)});
@@ -190,6 +202,7 @@ Options parse_options(int argc, const char* const* argv) {
   add_factor(app, options);
   add_solve(app, options);
   add_invdiag(app, options);
+  add_trace(app, options);
   add_grid(app, options);
   try {
     app.parse(argc, argv);

@@ -13,7 +13,7 @@ class App;
 
 namespace sm::cli {
 
-enum class Command { none, info, factor, solve, invdiag, grid };
+enum class Command { none, info, factor, solve, invdiag, trace, grid };
 
 struct Options {
   Command command = Command::none;
@@ -22,6 +22,7 @@ struct Options {
   FactorOptions factor;
   SolveOptions solve;
   InvdiagOptions invdiag;
+  TraceOptions trace;
   GridOptions grid;
   std::string answer;  // help or version that was asked for: to be printed instead of a run
 };
