@@ -144,7 +144,7 @@ Example: a problem with a million unknowns.
 const char* const kExitCodes =
     R"(Exit codes:
   0  done
-  1  a numerical "no": not positive semidefinite, or an inconsistent right-hand side
+  1  a numerical "no": not positive semidefinite, an inconsistent right-hand side, or a result that overflows
   2  wrong usage, or a file that cannot be read, understood or written
   3  out of memory (see --memory), or the module cannot be loaded)";
 
