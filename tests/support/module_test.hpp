@@ -45,8 +45,8 @@ class ModuleTest : public ::testing::TestWithParam<HostKind> {
 };
 
 // Runs a suite under both hosts: INSTANTIATE_BOTH_HOSTS(MySuite);
-#define INSTANTIATE_BOTH_HOSTS(suite)                                                                              \
-  INSTANTIATE_TEST_SUITE_P(Hosts, suite,                                                                           \
+#define INSTANTIATE_BOTH_HOSTS(suite)                                                                        \
+  INSTANTIATE_TEST_SUITE_P(Hosts, suite,                                                                     \
                            ::testing::Values(::sm::test::HostKind::embedded, ::sm::test::HostKind::minimal), \
                            [](const auto& i) { return ::sm::test::name_of(i.param); })
 
