@@ -292,8 +292,9 @@ void MinimumDegree::number_from_zero() {
 SmStatus grow_workspace(SmMatrix& m) {
   const double limit = static_cast<double>(SM_MAX_ELEMENTS);
   if (m.work_capacity == 0) {
+    const i64 words_an_entry = 4 / m.factor_block;
     const double first =
-        4.0 * static_cast<double>(m.rows) + static_cast<double>(m.nnz) * static_cast<double>(4 / m.factor_block);
+        4.0 * static_cast<double>(m.rows) + static_cast<double>(m.nnz) * static_cast<double>(words_an_entry);
     if (first > limit) return SM_TOO_LARGE;
     m.work_capacity = static_cast<i64>(first);
   }
@@ -301,6 +302,7 @@ SmStatus grow_workspace(SmMatrix& m) {
   const double capacity = static_cast<double>(m.work_capacity) + static_cast<double>(m.nnz);
   if (capacity * static_cast<double>(m.factor_block) >= limit) return SM_TOO_LARGE;
   m.work_capacity += m.nnz;
+  if (m.work_capacity < 1) return SM_TOO_LARGE;  // no size that this operation set
   return allocate(m.pool, m.work_capacity, Fill::none, m.work);
 }
 

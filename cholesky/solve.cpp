@@ -75,6 +75,7 @@ void substitute_diagonal(SmMatrix& m, const double* b, double* x, std::int32_t c
 }
 
 SmStatus substitute_symmetric(SmMatrix& m, const double* b, double* x, std::int32_t count) {
+  if (!x) count = 0;  // nothing to write to, nothing to solve
   if (x) std::fill_n(x, m.rows, 0.0);
   if (is_dense_format(m.format)) return substitute_packed(m, b, x, count);
   if (m.format != SM_FORMAT_SPARSE) return SM_UNAVAILABLE;
