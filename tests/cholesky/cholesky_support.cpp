@@ -184,7 +184,7 @@ std::int64_t owned_blocks(const SmMatrix* matrix) {
   const auto one = [](const void* p) { return static_cast<std::int64_t>(p != nullptr); };
   if (matrix->kind == SM_KIND_SYMMETRIC && matrix->format == SM_FORMAT_SPARSE) {
     return one(matrix->row_start) + one(matrix->col_index) + one(matrix->nz_values) + one(matrix->perm) +
-           one(matrix->inv_perm) + one(matrix->work);
+           one(matrix->inv_perm) + one(matrix->work) + one(matrix->factor_reserved);
   }
   return one(matrix->dense_factor) + (matrix->owns_values ? one(matrix->values) : 0);
 }
