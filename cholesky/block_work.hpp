@@ -23,9 +23,7 @@ struct Target {
   const i64* place;
   double* diag;
 
-  i64 place_of(i64 column) const {
-    return column < block.first + block.width ? column - block.first : place[column];
-  }
+  i64 place_of(i64 column) const { return column < block.first + block.width ? column - block.first : place[column]; }
 };
 
 // Subtracts what block `s` has for the rows of its first `rows` columns, which are rows of the target.

@@ -15,7 +15,8 @@
 
 namespace sm {
 
-inline constexpr i64 kMostBlockRows = 128;  // wider ones are cut: a block and its target then fit the second-level cache
+inline constexpr i64 kMostBlockRows =
+    128;  // wider ones are cut: a block and its target then fit the second-level cache
 
 struct Block {
   i64 first;
