@@ -20,12 +20,21 @@ add_library(qxesm_objects OBJECT
   cholesky/ginverse2.cpp
   cholesky/given_order.cpp
   cholesky/inverse_diagonal.cpp
+  cholesky/block_factor.cpp
+  cholesky/block_update.cpp
+  cholesky/blocks.cpp
   cholesky/numeric.cpp
+  cholesky/numeric_blocked.cpp
+  cholesky/numeric_rows.cpp
   cholesky/ordering.cpp
   cholesky/refill.cpp
   cholesky/reorder.cpp
   cholesky/solve.cpp
   cholesky/symbolic.cpp
+  cholesky/tiles.cpp
+  cholesky/tiles_avx2.cpp
+  cholesky/tiles_avx512.cpp
+  cholesky/tiles_portable.cpp
   forms/api.cpp
   forms/inverse_forms.cpp
   forms/kernels.cpp

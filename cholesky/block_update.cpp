@@ -1,0 +1,159 @@
+// A finished block updates rows of a later block: the dense product of a few strips of coefficients with the rows of
+// the source, added at places that are found once for the pair.
+#include <algorithm>
+
+#include "cholesky/block_work.hpp"
+
+namespace sm {
+
+namespace {
+
+constexpr i64 kInPlaceWidth = 16;  // narrower sources are read where they stand
+
+class BlockUpdate {
+ public:
+  BlockUpdate(const Target& target, const Source& s, i64 rows, Panels& panels)
+      : target_(target), s_(s), rows_(rows), panels_(panels), tiles_(tile_kernels()) {
+    packed_ = s.width > kInPlaceWidth && rows > 2 * tiles_.strip_rows;
+  }
+  void run();
+
+ private:
+  double* coefficients(i64 first_row) { return panels_.coefficient + first_row * s_.width; }
+  void find_coefficients();
+  void keep_multipliers();
+  void find_places(i64 begin, i64 end);
+  void pack(i64 begin, i64 end);
+  void strip(i64 first_row, i64 begin, i64 end);
+  i64 head_of_strip(i64 first_row, int rows, i64 end);
+  TileSource in_place(i64 column) const { return {s_.value + column, s_.step, 1, tiles_.tile_columns}; }
+
+  const Target& target_;
+  const Source& s_;
+  i64 rows_;
+  Panels& panels_;
+  const TileKernels& tiles_;
+  bool packed_;
+  i64 runs_ = 0;
+};
+
+// -V D of the source's first columns, strip by strip, row s of a strip's coefficients being that of source row s.
+void BlockUpdate::find_coefficients() {
+  const i64 height = tiles_.strip_rows;
+  for (i64 r = 0; r < rows_; r += height) {
+    const i64 rows = std::min(height, rows_ - r);
+    double* out = coefficients(r);
+    const double* v = s_.value + r;
+    for (i64 s = 0; s < s_.width; ++s) {
+      const double d = -s_.pivot[s];
+      for (i64 i = 0; i < rows; ++i) out[i] = v[i] * d;
+      out += height;
+      v += s_.step - s;
+    }
+  }
+}
+
+void BlockUpdate::keep_multipliers() {
+  const i64 height = tiles_.strip_rows;
+  for (i64 r = 0; r < rows_; r += height) {
+    const i64 rows = std::min(height, rows_ - r);
+    const double* from = coefficients(r);
+    double* v = s_.value + r;
+    for (i64 s = 0; s < s_.width; ++s) {
+      for (i64 i = 0; i < rows; ++i) v[i] = from[i];
+      from += height;
+      v += s_.step - s;
+    }
+  }
+}
+
+// Places of the columns [begin, end) in the rows of the target, as they are and in runs.
+void BlockUpdate::find_places(i64 begin, i64 end) {
+  Run* run = panels_.run - 1;
+  i64 next = -1;
+  for (i64 j = begin; j < end; ++j) {
+    const i64 to = target_.place_of(s_.column[j]);
+    const auto at = static_cast<std::int32_t>(to);
+    panels_.to[j - begin] = at;
+    if (to != next) *++run = {static_cast<std::int32_t>(j - begin), at, 0};
+    ++run->length;
+    next = to + 1;
+  }
+  runs_ = run + 1 - panels_.run;
+}
+
+// Columns [begin, end) of the source, tile by tile, the last one filled up with zeros.
+void BlockUpdate::pack(i64 begin, i64 end) {
+  const i64 columns = tiles_.tile_columns;
+  double* out = panels_.source;
+  for (i64 j = begin; j < end; j += columns) {
+    const i64 n = std::min(columns, end - j);
+    const double* v = s_.value + j;
+    for (i64 s = 0; s < s_.width; ++s) {
+      std::copy_n(v, n, out);
+      std::fill_n(out + n, columns - n, 0.0);
+      out += columns;
+      v += s_.step - s;
+    }
+  }
+}
+
+// The columns of the strip's own rows, where every row begins one later, and what must be added through `to` with them.
+// Answers where the rest begins.
+i64 BlockUpdate::head_of_strip(i64 first_row, int rows, i64 end) {
+  const i64 columns = tiles_.tile_columns;
+  i64 stop = first_row + rows;
+  if (packed_) stop = (stop + columns - 1) / columns * columns;
+  stop = std::min(stop, end);
+  double* out[kMostStripRows];
+  for (int i = 0; i < rows; ++i) out[i] = panels_.sums + i * kPanelColumns;
+  tiles_.strip(rows, s_.width, coefficients(first_row), in_place(first_row), stop - first_row, out, Finish::store);
+  for (int i = 0; i < rows; ++i) {
+    const i64 column = s_.column[first_row + i];
+    double* row = target_.block.row(column - target_.block.first);
+    target_.diag[column] += out[i][i];
+    for (i64 j = i + 1; j < stop - first_row; ++j) row[panels_.to[first_row + j]] += out[i][j];
+  }
+  return stop;
+}
+
+// Columns [begin, end), of which places and packed rows are at hand, for the strip of rows that begins at first_row.
+void BlockUpdate::strip(i64 first_row, i64 begin, i64 end) {
+  const int rows = static_cast<int>(std::min<i64>(tiles_.strip_rows, rows_ - first_row));
+  const i64 from = begin == 0 ? head_of_strip(first_row, rows, end) : begin;
+  if (from >= end) return;
+  TileSource source = in_place(from);
+  if (packed_) {
+    source = {panels_.source + (from - begin) * s_.width, tiles_.tile_columns, 0, tiles_.tile_columns * s_.width};
+  }
+  double* row[kMostStripRows];
+  for (int i = 0; i < rows; ++i) row[i] = target_.block.row(s_.column[first_row + i] - target_.block.first);
+  if (runs_ == 1) {
+    for (int i = 0; i < rows; ++i) row[i] += panels_.to[from - begin];
+    tiles_.strip(rows, s_.width, coefficients(first_row), source, end - from, row, Finish::add);
+    return;
+  }
+  double* sums[kMostStripRows];
+  for (int i = 0; i < rows; ++i) sums[i] = panels_.sums + i * kPanelColumns;
+  tiles_.strip(rows, s_.width, coefficients(first_row), source, end - from, sums, Finish::store);
+  tiles_.spread(rows, panels_.sums, kPanelColumns, from - begin, panels_.run, panels_.run + runs_, row);
+}
+
+void BlockUpdate::run() {
+  find_coefficients();
+  for (i64 begin = 0; begin < s_.count; begin += kPanelColumns) {
+    const i64 end = std::min(begin + kPanelColumns, s_.count);
+    find_places(begin, end);
+    if (packed_) pack(begin, end);
+    for (i64 r = 0; r < rows_; r += tiles_.strip_rows) strip(r, begin, end);
+  }
+  keep_multipliers();
+}
+
+}  // namespace
+
+void update_block(const Target& target, const Source& s, i64 rows, Panels& panels) {
+  BlockUpdate(target, s, rows, panels).run();
+}
+
+}  // namespace sm

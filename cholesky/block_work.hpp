@@ -1,0 +1,35 @@
+// The two dense steps of the blocked factorization: a block updating a later one, and the factorization of a block.
+#pragma once
+
+#include "cholesky/blocks.hpp"
+#include "cholesky/tiles.hpp"
+
+namespace sm {
+
+inline constexpr i64 kPanelColumns = 240;  // a multiple of every tile
+
+// Work memory of fixed size, on the stack: 395 kB.
+struct Panels {
+  alignas(64) double source[kMostBlockRows * kPanelColumns];
+  alignas(64) double coefficient[kMostBlockRows * kMostBlockRows];
+  alignas(64) double sums[kMostStripRows * kPanelColumns];
+  Run run[kPanelColumns];
+  std::int32_t to[kPanelColumns];
+};
+
+// A block that takes updates: place[c] is, for the columns c of its tail, their place in a row of it.
+struct Target {
+  const Block& block;
+  const i64* place;
+  double* diag;
+
+  i64 place_of(i64 column) const { return column < block.first + block.width ? column - block.first : place[column]; }
+};
+
+// Subtracts what block `s` has for the rows of its first `rows` columns, which are rows of the target.
+void update_block(const Target& target, const Source& s, i64 rows, Panels& panels);
+
+// Factors the block, all of whose updates are in: pivots from diag, multipliers among its own rows, raw values behind.
+[[nodiscard]] SmStatus factor_block(const Block& block, double* diag, Pivots& pivots, Panels& panels);
+
+}  // namespace sm

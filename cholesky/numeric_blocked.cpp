@@ -1,0 +1,218 @@
+// Numeric factorization in blocks of rows of U that share their structure.
+//
+// Left-looking: block by block, everything that finished blocks have for its rows is subtracted, then the block is
+// factored. A finished block waits in the list of the block that holds the next column of its tail, as the rows of the
+// plain road do (numeric_rows.cpp; Eisenstat, Gursky, Schultz, Sherman 1982); rows with equal structure as blocks for
+// dense kernels: Ng, Peyton, "Block sparse Cholesky algorithms on advanced uniprocessor computers", SIAM J. Sci. Comput.
+// 14 (1993) 1034-1056. The storage is that of the plain road, with its fill: blocks are what is found in it, and no zero
+// is ever stored to make one.
+//
+//   blocks.hpp        what a block is, and the lists
+//   block_update.cpp  a block updates a later one: strips of coefficients -V D times the rows of the source
+//   block_factor.cpp  a block is factored
+//   tiles.hpp         the kernels under both
+//
+// Most blocks of two-dimensional and of pedigree matrices are single rows, and so are most updates. A single row gathers
+// its updates in the dense row, by column; a wider block in its stored rows, at places that the words of the dense row
+// behind it hold for the columns of its tail. Small products are added one by one, without a kernel.
+#include <algorithm>
+#include <bit>
+
+#include "cholesky/block_work.hpp"
+
+namespace sm {
+
+namespace {
+
+constexpr i64 kFewProducts = 200;  // below, a kernel's overhead is larger than its gain
+
+// target[to[j]] += sum over the rows of factor[s] * row s of the source, for j < count.
+template <class Place>
+void add_rows(double* target, const Place* to, i64 count, const double* source, i64 step, const double* factor,
+              i64 rows) {
+  for (; rows >= 4; rows -= 4, factor += 4) {
+    const double *a = source, *b = a + step, *c = b + step - 1, *d = c + step - 2;
+    const double fa = factor[0], fb = factor[1], fc = factor[2], fd = factor[3];
+    for (i64 j = 0; j < count; ++j) target[to[j]] += (fa * a[j] + fb * b[j]) + (fc * c[j] + fd * d[j]);
+    source = d + step - 3;
+    step -= 4;
+  }
+  if (rows >= 2) {
+    const double *a = source, *b = a + step;
+    const double fa = factor[0], fb = factor[1];
+    for (i64 j = 0; j < count; ++j) target[to[j]] += fa * a[j] + fb * b[j];
+    source = b + step - 1;
+    factor += 2;
+    rows -= 2;
+  }
+  if (rows > 0) {
+    const double f = *factor;
+    for (i64 j = 0; j < count; ++j) target[to[j]] += f * source[j];
+  }
+}
+
+class BlockedRows {
+ public:
+  BlockedRows(const NumericArrays& a, Pivots& pivots, Panels& panels)
+      : a_(a), blocks_(a), pivots_(pivots), panels_(panels), place_(reinterpret_cast<i64*>(a.diag)) {}
+  SmStatus run();
+
+ private:
+  SmStatus single_row(i64 k);
+  double load_row(i64 k);
+  double update_row(i64 k, double d);
+  double subtract_block(const Source& s, double d);
+  SmStatus block(i64 first);
+  void load_block(const Target& target);
+  void update_target(const Target& target, const Source& s);
+  void subtract_products(const Target& target, const Source& s, i64 rows);
+
+  const NumericArrays& a_;
+  const Blocks blocks_;
+  Pivots& pivots_;
+  Panels& panels_;
+  i64* place_;  // the words of the dense row, as places
+};
+
+// Row k of A into the dense row, which is 0 elsewhere in the row's structure. Answers the diagonal.
+double BlockedRows::load_row(i64 k) {
+  const SmMatrix& m = a_.m;
+  const i64 row = m.perm[k];
+  double d = 0.0;
+  for (i64 p = m.row_start[row]; p < m.row_start[row + 1]; ++p) {
+    const i64 j = m.inv_perm[m.col_index[p]];
+    if (j > k) {
+      a_.diag[j] = m.nz_values[p];
+    } else if (j == k) {
+      d = m.nz_values[p];
+    }
+  }
+  return d;
+}
+
+// What a wider block has for the dense row.
+double BlockedRows::subtract_block(const Source& s, double d) {
+  double factor[kMostBlockRows];
+  double* v = s.value;
+  for (i64 r = 0; r < s.width; ++r) {
+    const double u = *v;
+    factor[r] = *v = -u * s.pivot[r];
+    d += u * factor[r];
+    v += s.step - r;
+  }
+  add_rows(a_.diag, s.column + 1, s.count - 1, s.value + 1, s.step, factor, s.width);
+  return d;
+}
+
+// Everything that waits for row k. Answers the pivot.
+double BlockedRows::update_row(i64 k, double d) {
+  for (i64 i = blocks_.waiting(k); i >= 0;) {
+    const i64 following = blocks_.waiting(i);
+    const Source s = blocks_.source(i);
+    if (s.width == 1) {
+      const double u = *s.value;
+      const double f = -u * *s.pivot;
+      *s.value = f;
+      d += u * f;
+      for (i64 j = 1; j < s.count; ++j) a_.diag[s.column[j]] += f * s.value[j];
+    } else {
+      d = subtract_block(s, d);
+    }
+    blocks_.await(s, 1);
+    i = following;
+  }
+  return d;
+}
+
+SmStatus BlockedRows::single_row(i64 k) {
+  const Block b = blocks_.at(k, 1);
+  for (i64 j = 0; j < b.length; ++j) a_.diag[b.tail[j]] = 0.0;
+  const double d = update_row(k, load_row(k));
+  SM_TRY(pivots_.judge(k, d, a_.diag[k]));
+  for (i64 j = 0; j < b.length; ++j) b.values[j] = a_.diag[b.tail[j]];
+  blocks_.await(b);
+  return SM_OK;
+}
+
+void BlockedRows::load_block(const Target& target) {
+  const SmMatrix& m = a_.m;
+  const Block& b = target.block;
+  std::fill_n(b.values, b.row(b.width) + b.width + 1 - b.values, 0.0);
+  for (i64 j = 0; j < b.tail_length(); ++j) place_[b.tail[j]] = b.width + j;
+  for (i64 r = 0; r < b.width; ++r) {
+    const i64 k = b.first + r;
+    const i64 row = m.perm[k];
+    a_.diag[k] = 0.0;
+    for (i64 p = m.row_start[row]; p < m.row_start[row + 1]; ++p) {
+      const i64 j = m.inv_perm[m.col_index[p]];
+      if (j > k) {
+        b.row(r)[target.place_of(j)] = m.nz_values[p];
+      } else if (j == k) {
+        a_.diag[k] = m.nz_values[p];
+      }
+    }
+  }
+}
+
+// The update of a few products.
+void BlockedRows::subtract_products(const Target& target, const Source& s, i64 rows) {
+  for (i64 j = 0; j < s.count; ++j) panels_.to[j] = static_cast<std::int32_t>(target.place_of(s.column[j]));
+  double factor[kMostBlockRows];
+  for (i64 i = 0; i < rows; ++i) {
+    double d = a_.diag[s.column[i]];
+    double* v = s.value + i;
+    for (i64 r = 0; r < s.width; ++r) {
+      const double u = *v;
+      factor[r] = *v = -u * s.pivot[r];
+      d += u * factor[r];
+      v += s.step - r;
+    }
+    a_.diag[s.column[i]] = d;
+    add_rows(target.block.row(s.column[i] - target.block.first), panels_.to + i + 1, s.count - i - 1, s.value + i + 1,
+             s.step, factor, s.width);
+  }
+}
+
+void BlockedRows::update_target(const Target& target, const Source& s) {
+  const i64 end = target.block.first + target.block.width;
+  i64 rows = 1;
+  while (rows < s.count && s.column[rows] < end) ++rows;
+  if (s.count <= kPanelColumns && (s.width == 1 || s.width * rows * s.count < kFewProducts)) {
+    subtract_products(target, s, rows);
+  } else {
+    update_block(target, s, rows, panels_);
+  }
+  blocks_.await(s, rows);
+}
+
+SmStatus BlockedRows::block(i64 first) {
+  const Block b = blocks_.at(first, blocks_.width(first));
+  const Target target = {b, place_, a_.diag};
+  load_block(target);
+  for (i64 i = blocks_.waiting(first); i >= 0;) {
+    const i64 following = blocks_.waiting(i);
+    update_target(target, blocks_.source(i));
+    i = following;
+  }
+  SM_TRY(factor_block(b, a_.diag, pivots_, panels_));
+  blocks_.await(b);
+  return SM_OK;
+}
+
+SmStatus BlockedRows::run() {
+  Blocks(a_).find();
+  for (i64 k = 0, width = 0; k < a_.n; k += width) {
+    width = blocks_.width(k);
+    SM_TRY(width == 1 ? single_row(k) : block(k));
+  }
+  return SM_OK;
+}
+
+}  // namespace
+
+SmStatus factor_in_blocks(const NumericArrays& a, Pivots& pivots) {
+  Panels panels;
+  return BlockedRows(a, pivots, panels).run();
+}
+
+}  // namespace sm

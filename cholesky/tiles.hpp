@@ -1,0 +1,62 @@
+// The dense kernels of the blocked factorization: sums of products on strips of a few rows, in register tiles.
+//
+// One set of kernels is chosen when the module is loaded, by what the CPU has. They use fused multiply-adds at the
+// widest vector there is: results differ between the sets in the last bits, and only there.
+#pragma once
+
+#include "frame/core.hpp"
+
+namespace sm {
+
+inline constexpr int kMostStripRows = 8;  // of any set
+
+// Rows of doubles that are read together. Row s + 1 begins `step` behind row s, and the step falls by `shrink` from row
+// to row: 1 for rows of U where they stand, 0 for a packed panel. Tile t of the columns begins t * tile_step behind the
+// first.
+struct TileSource {
+  const double* first;
+  i64 step;
+  i64 shrink;
+  i64 tile_step;
+};
+
+enum class Finish {
+  store,  // targets = sums
+  add,    // targets += sums
+  // targets += sums, and then each row of the strip also takes the ones above it: coefficients behind those of the
+  // source rows, row q of the strip standing for source row depth + q.
+  solve,
+};
+
+// Neighbouring columns that stay neighbours: column `from` + x of a source is at `to` + x in the rows of a target.
+struct Run {
+  std::int32_t from;
+  std::int32_t to;
+  std::int32_t length;
+};
+
+struct TileKernels {
+  const char* name;
+  int strip_rows;    // rows of a full strip
+  int tile_columns;  // columns of a full tile
+  // target[i][j] gets sum over s < depth of coefficient[s * strip_rows + i] * source(s, j), for i < rows, j < columns.
+  void (*strip)(int rows, i64 depth, const double* coefficient, const TileSource& source, i64 columns,
+                double* const* target, Finish finish);
+  // target[i][to + x] += sums[i * sums_step + from + x - first] for i < rows over the runs, what is before `first` of
+  // them left out.
+  void (*spread)(int rows, const double* sums, i64 sums_step, i64 first, const Run* run, const Run* end,
+                 double* const* target);
+};
+
+enum class TileSet { portable, avx2, avx512 };
+
+const TileKernels& tile_kernels();
+// For tests. False, and nothing changed, where the CPU does not have it.
+bool use_tiles(TileSet set);
+
+// null where the build is for another processor.
+extern const TileKernels* const kPortableTiles;
+extern const TileKernels* const kAvx2Tiles;
+extern const TileKernels* const kAvx512Tiles;
+
+}  // namespace sm

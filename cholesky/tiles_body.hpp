@@ -1,0 +1,139 @@
+// The tile kernels, written once over a vector type. A file that defines SM_TILE_TARGET (the attribute that lets the
+// compiler use the instructions) and, in its own namespace, a struct X includes this there:
+//   X::Vector; X::kWidth lanes, X::kRows rows of a strip, X::kVectors vectors of a tile's row; zero, all(x), load(p),
+//   load(p, n) and store(p, v), store(p, v, n) for the first n lanes only, fma(a, b, c) = a * b + c, add(a, b).
+//
+// Deliberately without an include guard.
+
+// The last vector of a row has `last` lanes; kFull says that it has them all.
+template <bool kFull, class V>
+SM_TILE_INLINE V load_last(const double* p, int last) {
+  if constexpr (kFull) return X::load(p);
+  return X::load(p, last);
+}
+
+template <int kTileRows, int kTileVectors, bool kFull>
+SM_TILE_TARGET void tile(i64 depth, const double* coefficient, const double* source, i64 step, i64 shrink, int last,
+                         double* const* target, i64 column, Finish finish) {
+  using V = typename X::Vector;
+  V sum[kTileRows][kTileVectors];
+#pragma GCC unroll 8
+  for (int i = 0; i < kTileRows; ++i) {
+#pragma GCC unroll 8
+    for (int v = 0; v < kTileVectors; ++v) sum[i][v] = X::zero();
+  }
+  for (i64 s = 0; s < depth; ++s) {
+    V row[kTileVectors];
+#pragma GCC unroll 8
+    for (int v = 0; v + 1 < kTileVectors; ++v) row[v] = X::load(source + v * X::kWidth);
+    row[kTileVectors - 1] = load_last<kFull, V>(source + (kTileVectors - 1) * X::kWidth, last);
+#pragma GCC unroll 8
+    for (int i = 0; i < kTileRows; ++i) {
+      const V factor = X::all(coefficient[i]);
+#pragma GCC unroll 8
+      for (int v = 0; v < kTileVectors; ++v) sum[i][v] = X::fma(factor, row[v], sum[i][v]);
+    }
+    coefficient += X::kRows;
+    source += step;
+    step -= shrink;
+  }
+  if (finish != Finish::store) {
+#pragma GCC unroll 8
+    for (int i = 0; i < kTileRows; ++i) {
+      const double* old = target[i] + column;
+#pragma GCC unroll 8
+      for (int v = 0; v + 1 < kTileVectors; ++v) sum[i][v] = X::add(sum[i][v], X::load(old + v * X::kWidth));
+      sum[i][kTileVectors - 1] =
+          X::add(sum[i][kTileVectors - 1], load_last<kFull, V>(old + (kTileVectors - 1) * X::kWidth, last));
+    }
+  }
+  if (finish == Finish::solve) {
+#pragma GCC unroll 8
+    for (int q = 0; q + 1 < kTileRows; ++q) {
+#pragma GCC unroll 8
+      for (int i = q + 1; i < kTileRows; ++i) {
+        const V factor = X::all(coefficient[q * X::kRows + i]);
+#pragma GCC unroll 8
+        for (int v = 0; v < kTileVectors; ++v) sum[i][v] = X::fma(factor, sum[q][v], sum[i][v]);
+      }
+    }
+  }
+#pragma GCC unroll 8
+  for (int i = 0; i < kTileRows; ++i) {
+    double* out = target[i] + column;
+#pragma GCC unroll 8
+    for (int v = 0; v + 1 < kTileVectors; ++v) X::store(out + v * X::kWidth, sum[i][v]);
+    if constexpr (kFull) {
+      X::store(out + (kTileVectors - 1) * X::kWidth, sum[i][kTileVectors - 1]);
+    } else {
+      X::store(out + (kTileVectors - 1) * X::kWidth, sum[i][kTileVectors - 1], last);
+    }
+  }
+}
+
+// The columns of a strip behind its last full tile.
+template <int kTileRows, int kTileVectors>
+SM_TILE_TARGET void tile_rest(i64 depth, const double* coefficient, const double* source, const TileSource& s,
+                              int columns, double* const* target, i64 column, Finish finish) {
+  if constexpr (kTileVectors > 1) {
+    if (columns <= (kTileVectors - 1) * X::kWidth) {
+      tile_rest<kTileRows, kTileVectors - 1>(depth, coefficient, source, s, columns, target, column, finish);
+      return;
+    }
+  }
+  tile<kTileRows, kTileVectors, false>(depth, coefficient, source, s.step, s.shrink,
+                                       columns - (kTileVectors - 1) * X::kWidth, target, column, finish);
+}
+
+template <int kTileRows>
+SM_TILE_TARGET void strip_of(i64 depth, const double* coefficient, const TileSource& source, i64 columns,
+                             double* const* target, Finish finish) {
+  constexpr int kColumns = X::kVectors * X::kWidth;
+  const double* tile_source = source.first;
+  i64 column = 0;
+  for (; column + kColumns <= columns; column += kColumns, tile_source += source.tile_step) {
+    tile<kTileRows, X::kVectors, true>(depth, coefficient, tile_source, source.step, source.shrink, X::kWidth, target,
+                                       column, finish);
+  }
+  if (column < columns) {
+    tile_rest<kTileRows, X::kVectors>(depth, coefficient, tile_source, source, static_cast<int>(columns - column),
+                                      target, column, finish);
+  }
+}
+
+template <int kTileRows>
+SM_TILE_TARGET void strip_up_to(int rows, i64 depth, const double* coefficient, const TileSource& source, i64 columns,
+                                double* const* target, Finish finish) {
+  if constexpr (kTileRows > 1) {
+    if (rows < kTileRows) {
+      strip_up_to<kTileRows - 1>(rows, depth, coefficient, source, columns, target, finish);
+      return;
+    }
+  }
+  strip_of<kTileRows>(depth, coefficient, source, columns, target, finish);
+}
+
+SM_TILE_TARGET void strip(int rows, i64 depth, const double* coefficient, const TileSource& source, i64 columns,
+                          double* const* target, Finish finish) {
+  strip_up_to<X::kRows>(rows, depth, coefficient, source, columns, target, finish);
+}
+
+SM_TILE_TARGET void spread(int rows, const double* sums, i64 sums_step, i64 first, const Run* run, const Run* end,
+                           double* const* target) {
+  for (; run != end; ++run) {
+    const i64 skipped = run->from < first ? first - run->from : 0;
+    const i64 length = run->length - skipped;
+    if (length <= 0) continue;
+    const double* from = sums + (run->from + skipped - first);
+    const i64 to = run->to + skipped;
+    for (int i = 0; i < rows; ++i, from += sums_step) {
+      double* out = target[i] + to;
+      i64 x = 0;
+      for (; x + X::kWidth <= length; x += X::kWidth) X::store(out + x, X::add(X::load(out + x), X::load(from + x)));
+      if (x < length) {
+        const int last = static_cast<int>(length - x);
+        X::store(out + x, X::add(X::load(out + x, last), X::load(from + x, last)), last);
+      }
+    }
+  }
+}
