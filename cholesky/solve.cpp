@@ -12,46 +12,6 @@ namespace sm {
 
 namespace {
 
-// U'D then U, in the new order. w is the record's scratch.
-class SparseSolve {
- public:
-  explicit SparseSolve(const SmMatrix& m)
-      : m_(m), w_(reinterpret_cast<double*>(m.factor_scratch)), iu_(m.factor_iu), values_(m.factor_values) {}
-
-  void run(const double* b, double* x) {
-    for (i64 k = 0; k < m_.rows; ++k) w_[k] = b[m_.perm[k]];
-    for (i64 k = 0; k < m_.rows; ++k) forward(k);
-    for (i64 k = m_.rows - 1; k >= 0; --k) x[m_.perm[k]] = w_[k] += row_product(k);
-  }
-
- private:
-  void forward(i64 k) {
-    const double wk = w_[k];
-    const i64* column = m_.factor_ju + m_.factor_iju[k];
-    for (i64 p = iu_[k]; p < iu_[k + 1]; ++p) w_[*column++] += values_[p] * wk;
-    w_[k] = m_.factor_diag[k] * wk;
-  }
-  // Eight lanes, which the header of the package promises nothing about but the last bits.
-  double row_product(i64 k) const {
-    const i64* column = m_.factor_ju + m_.factor_iju[k];
-    const double* value = values_ + iu_[k];
-    const i64 length = iu_[k + 1] - iu_[k];
-    i64 t = 0;
-    double s[8] = {};
-    for (; t + 8 <= length; t += 8) {
-      for (int lane = 0; lane < 8; ++lane) s[lane] += value[t + lane] * w_[column[t + lane]];
-    }
-    double sum = ((s[0] + s[4]) + (s[2] + s[6])) + ((s[1] + s[5]) + (s[3] + s[7]));
-    for (; t < length; ++t) sum += value[t] * w_[column[t]];
-    return sum;
-  }
-
-  const SmMatrix& m_;
-  double* w_;
-  const i64* iu_;
-  const double* values_;
-};
-
 SmStatus substitute_packed(SmMatrix& m, const double* b, double* x, std::int32_t count) {
   Scratch<double> work;
   SM_TRY(need_pool(m));
@@ -79,8 +39,7 @@ SmStatus substitute_symmetric(SmMatrix& m, const double* b, double* x, std::int3
   if (x) std::fill_n(x, m.rows, 0.0);
   if (is_dense_format(m.format)) return substitute_packed(m, b, x, count);
   if (m.format != SM_FORMAT_SPARSE) return SM_UNAVAILABLE;
-  SparseSolve solve(m);
-  for (i64 v = 0; v < count; ++v) solve.run(b + v * m.rows, x + v * m.rows);
+  substitute_sparse(m, b, x, count);
   return SM_OK;
 }
 

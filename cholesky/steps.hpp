@@ -24,6 +24,8 @@ namespace sm {
 [[nodiscard]] SmStatus log_determinant(SmMatrix& m, double& out);
 [[nodiscard]] SmStatus rank(SmMatrix& m, i64& out);
 
+// x <- A^- b in the factor of a symmetric sparse matrix, with the record's scratch.
+void substitute_sparse(const SmMatrix& m, const double* b, double* x, i64 count);
 [[nodiscard]] SmStatus substitute(SmMatrix& m, const double* b, double* x, std::int32_t count);
 [[nodiscard]] SmStatus apply_inverse(SmMatrix& m, const double* b, double* x, i64 count);
 [[nodiscard]] SmStatus inverse_diagonal(SmMatrix& m, double* x);

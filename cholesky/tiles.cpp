@@ -26,6 +26,7 @@ const TileKernels* kernels_of(TileSet set) {
 }
 
 const TileKernels* chosen = nullptr;
+TileSet chosen_set = TileSet::portable;
 
 [[gnu::constructor]] void choose_tiles() {
   if (!use_tiles(TileSet::avx512) && !use_tiles(TileSet::avx2)) use_tiles(TileSet::portable);
@@ -35,9 +36,12 @@ const TileKernels* chosen = nullptr;
 
 const TileKernels& tile_kernels() { return *chosen; }
 
+TileSet chosen_tiles() { return chosen_set; }
+
 bool use_tiles(TileSet set) {
   if (!cpu_has(set)) return false;
   chosen = kernels_of(set);
+  chosen_set = set;
   return true;
 }
 

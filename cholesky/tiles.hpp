@@ -53,6 +53,7 @@ enum class TileSet { portable, avx2, avx512 };
 const TileKernels& tile_kernels();
 // For tests. False, and nothing changed, where the CPU does not have it.
 bool use_tiles(TileSet set);
+TileSet chosen_tiles();
 
 // null where the build is for another processor.
 extern const TileKernels* const kPortableTiles;

@@ -30,6 +30,10 @@ add_library(qxesm_objects OBJECT
   cholesky/refill.cpp
   cholesky/reorder.cpp
   cholesky/solve.cpp
+  cholesky/sparse_solve.cpp
+  cholesky/substitution_avx2.cpp
+  cholesky/substitution_avx512.cpp
+  cholesky/substitution_portable.cpp
   cholesky/symbolic.cpp
   cholesky/tiles.cpp
   cholesky/tiles_avx2.cpp

@@ -1,0 +1,43 @@
+// Passes over a finished sparse factor: U'D forward and U backward, for one vector, or for eight side by side.
+//
+// Both walk blocks of rows with one structure (cholesky/blocks.hpp) in strips of up to eight rows: a column behind the
+// strip is then fetched, and stored, once for all of its rows. The passes are compiled for the widest vectors of a few
+// processors. They multiply and add without fusing, lane by lane: the bits are the same on all of them.
+#pragma once
+
+#include "frame/core.hpp"
+
+namespace sm {
+
+inline constexpr int kLanes = 8;
+
+struct FactorRows {
+  explicit FactorRows(const SmMatrix& m)
+      : n(m.rows), iju(m.factor_iju), iu(m.factor_iu), ju(m.factor_ju), values(m.factor_values), diag(m.factor_diag) {}
+
+  // Rows k and k + 1 have the same structure but for column k + 1.
+  bool continues(i64 k) const {
+    const i64 length = iu[k + 1] - iu[k];
+    return k + 1 < n && length > 0 && iu[k + 2] - iu[k + 1] == length - 1 && ju[iju[k]] == k + 1;
+  }
+
+  i64 n;
+  const i64 *iju, *iu, *ju;
+  const double *values, *diag;
+};
+
+// y is in the order of the factor; with lanes, element k of vector v is y[k * kLanes + v].
+struct SubstitutionPasses {
+  void (*forward)(const FactorRows& f, double* y);
+  void (*backward)(const FactorRows& f, double* y);
+  void (*forward_lanes)(const FactorRows& f, double* y);
+  void (*backward_lanes)(const FactorRows& f, double* y);
+};
+
+extern const SubstitutionPasses kPortableSubstitution;
+extern const SubstitutionPasses kAvx2Substitution;
+extern const SubstitutionPasses kAvx512Substitution;
+
+const SubstitutionPasses& substitution_passes();
+
+}  // namespace sm

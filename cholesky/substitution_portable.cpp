@@ -1,0 +1,16 @@
+// The passes of substitution with the vectors that every processor of the build has.
+#include "cholesky/substitution.hpp"
+
+#define SM_PASS_TARGET
+
+namespace sm {
+
+namespace {
+
+#include "cholesky/substitution_body.hpp"
+
+}  // namespace
+
+const SubstitutionPasses kPortableSubstitution = kPasses;
+
+}  // namespace sm
