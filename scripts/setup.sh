@@ -15,6 +15,7 @@ packages_build=(g++=g++ cmake=cmake ninja-build=ninja libblas-dev libcli11-dev l
 packages_tests=(pkgconf=pkg-config binutils=readelf libgtest-dev libeigen3-dev)
 packages_clang=(clang=clang++ libclang-rt-dev clang-format=clang-format clang-tidy=run-clang-tidy)
 packages_coverage=(gcovr=gcovr)
+packages_bench=(libsuitesparse-dev libmetis-dev libeigen3-dev libopenblas-dev python3=python3)
 
 has_package() {
   case $1 in

@@ -1,0 +1,14 @@
+// What the times were taken on.
+#pragma once
+
+#include <string>
+
+#include "bench/harness/clock.hpp"
+#include "bench/harness/records.hpp"
+
+namespace sm::bench {
+
+// Processor, libraries, compiler, load, and the rates of dgemm and of copying, measured now.
+Json describe_machine(const std::string& module_file, Clock clock);
+
+}  // namespace sm::bench

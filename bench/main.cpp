@@ -1,0 +1,106 @@
+// The benchmark: one process, one thread, the module and its peers in turns. bench/run builds and starts it.
+#include <unistd.h>
+
+#include <CLI/CLI.hpp>
+#include <cstdio>
+#include <cstdlib>
+#include <iostream>
+
+#include "bench/cases.hpp"
+#include "bench/harness/clock.hpp"
+#include "bench/machine.hpp"
+#include "bench/peers/lapack.hpp"
+#include "bench/phases/phases.hpp"
+
+namespace sm::bench {
+namespace {
+
+struct Options {
+  Size size = Size::full;
+  Clock clock = Clock::cpu;
+  std::vector<std::string> families, phases;
+  std::string output = "results.jsonl";
+  int rounds = 5;
+  double longest = 120.0;
+};
+
+bool wanted(const std::vector<std::string>& list, std::string_view name) {
+  return list.empty() || std::find(list.begin(), list.end(), name) != list.end();
+}
+
+bool wanted(const Options& options, const Case& c, const Phase& phase) {
+  return std::any_of(phase.names.begin(), phase.names.end(),
+                     [&](std::string_view name) { return wanted(options.phases, name) && wanted(c.phases, name); });
+}
+
+void run_cases(const Options& options, Module& module, Records& records) {
+  Forecast forecast(options.longest);
+  for (const Case& c : cases_of(options.size)) {
+    if (!wanted(options.families, c.family)) continue;
+    std::optional<Workbench> bench;  // made for the first phase that is wanted
+    for (const Phase& phase : phases()) {
+      if (!wanted(options, c, phase)) continue;
+      if (!bench) bench.emplace(module, c.make(), records, forecast, options.rounds);
+      phase.run(*bench);
+    }
+  }
+  if (!wanted(options.families, "dense") || !wanted(options.phases, "dense")) return;
+  for (const int n : dense_orders(options.size)) measure_dense(module, records, n, options.rounds);
+}
+
+int run(const Options& options) {
+  chosen_clock() = options.clock;
+  use_one_thread();
+  Module module;
+  Records records(options.output);
+  records.write(describe_machine(module.file(), options.clock));
+  run_cases(options, module, records);
+  if (records.faults() == 0) return 0;
+  std::fprintf(stderr, "%d results were wrong\n", records.faults());
+  return 1;
+}
+
+int main_of(int argc, char** argv) {
+  CLI::App app("Times the module beside its peers, checks every result, writes one JSON object a line.");
+  Options options;
+  const std::map<std::string, Size> sizes = {
+      {"quick", Size::quick}, {"moderate", Size::moderate}, {"full", Size::full}};
+  const std::map<std::string, Clock> clocks = {{"cpu", Clock::cpu}, {"wall", Clock::wall}};
+  app.add_option("--size", options.size, "quick, moderate or full")->transform(CLI::CheckedTransformer(sizes));
+  app.add_flag_callback(
+      "--quick", [&] { options.size = Size::quick; }, "The same as --size quick");
+  app.add_option("--family", options.families, "a, b, c, d, e, f, arrow, crossed, hubs, row, dense; default all")
+      ->delimiter(',');
+  app.add_option("--phase", options.phases,
+                 "assembly, closing, ordering, symbolic, numeric, total, solve, inverse, trace, refactor, product, "
+                 "iteration, memory, rank, dense; default all")
+      ->delimiter(',');
+  app.add_option("--rounds", options.rounds, "Runs of everybody; fewer where one takes long")
+      ->check(CLI::Range(1, 100));
+  app.add_option("--longest", options.longest, "Seconds; a job that is expected to take longer is left out");
+  app.add_option("--clock", options.clock, "cpu or wall")->transform(CLI::CheckedTransformer(clocks));
+  app.add_option("-o,--output", options.output, "The file of results");
+  CLI11_PARSE(app, argc, argv);
+  return run(options);
+}
+
+// Libraries read these when they are loaded, so they must be there before the process starts.
+void start_again_with_one_thread(char** argv) {
+  if (std::getenv("OPENBLAS_NUM_THREADS") && std::getenv("OMP_NUM_THREADS")) return;
+  setenv("OPENBLAS_NUM_THREADS", "1", 1);
+  setenv("OMP_NUM_THREADS", "1", 1);
+  execv("/proc/self/exe", argv);
+}
+
+}  // namespace
+}  // namespace sm::bench
+
+int main(int argc, char** argv) {
+  try {
+    sm::bench::start_again_with_one_thread(argv);
+    return sm::bench::main_of(argc, argv);
+  } catch (const std::exception& e) {
+    std::fprintf(stderr, "qxbench: %s\n", e.what());
+    return 2;
+  }
+}

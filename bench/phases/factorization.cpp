@@ -1,0 +1,107 @@
+// Symbolic and numeric factorization with the module's own permutation given to every peer. Each run starts from a
+// matrix that is ordered and nothing more, so that everyone meets fresh memory.
+#include <cmath>
+#include <memory>
+#include <optional>
+
+#include "bench/harness/clock.hpp"
+#include "bench/peers/cholmod.hpp"
+#include "bench/phases/phases.hpp"
+
+namespace sm::bench {
+namespace {
+
+constexpr double kLogTolerance = 1e-9;
+
+class Ours {
+ public:
+  explicit Ours(Workbench& bench) : bench_(bench) {}
+
+  double run() {
+    const Exports& steps = bench_.module().by_name();
+    matrix_.reset();
+    matrix_ = bench_.copy_of(bench_.ordered());
+    symbolic.push_back(seconds_of([&] {
+      expect_ok(steps.qxsmreorder(*matrix_), "reordering");
+      expect_ok(steps.qxsmsymbfact(*matrix_), "symbolic factorization");
+    }));
+    return seconds_of([&] { expect_ok(steps.qxsmnumfact(*matrix_), "numeric factorization"); });
+  }
+
+  // `peer` is a factorization of the same matrix in the same order, or null.
+  std::string fault(const Cholmod* peer) {
+    const Problem& problem = bench_.problem();
+    const SmMatrix& m = **matrix_;
+    if (m.rank != problem.rank) return number_fault("rank", static_cast<double>(m.rank), problem.rank, 0.0, 0.0);
+    std::vector<double> x(problem.rhs.size());
+    expect_ok(bench_.module().fn().qxsmsubst(*matrix_, problem.rhs.data(), x.data(), 1), "solving");
+    if (std::string fault = solution_fault(bench_.rows(), x.data(), problem.rhs); !fault.empty()) return fault;
+    if (!peer) return "";
+    const auto entries = static_cast<double>(m.factor_iu[m.rows] + m.rows);
+    if (entries != peer->fill().entries) return number_fault("entries", entries, peer->fill().entries, 0.0, 0.0);
+    return number_fault("log-determinant", m.log_det, peer->log_determinant(), problem.n, kLogTolerance);
+  }
+
+  std::vector<double> symbolic;
+
+ private:
+  Workbench& bench_;
+  std::optional<qxhost::Matrix> matrix_;
+};
+
+class Peer {
+ public:
+  Peer(Workbench& bench, Kind kind) : bench_(bench), kind_(kind) {}
+
+  double run() {
+    cholmod.reset();
+    cholmod = std::make_unique<Cholmod>(bench_.rows(), Ordering::given, kind_, &bench_.permutation());
+    symbolic.push_back(seconds_of([&] { cholmod->analyse(); }));
+    return seconds_of([&] { cholmod->factorize(); });
+  }
+  std::string fault() {
+    const Problem& problem = bench_.problem();
+    return solution_fault(bench_.rows(), cholmod->solve(problem.rhs.data(), 1), problem.rhs);
+  }
+
+  std::unique_ptr<Cholmod> cholmod;
+  std::vector<double> symbolic;
+
+ private:
+  Workbench& bench_;
+  Kind kind_;
+};
+
+}  // namespace
+
+void measure_factorization(Workbench& bench) {
+  for (const char* phase : {"symbolic", "numeric"}) {
+    if (!bench.can_factor(phase)) return;
+  }
+  Ours ours(bench);
+  Peer simplicial(bench, Kind::simplicial), supernodal(bench, Kind::supernodal);
+  // The peers run first in each round and stand as references then.
+  const auto reference = [&]() -> const Cholmod* {
+    return supernodal.cholmod ? supernodal.cholmod.get() : simplicial.cholmod.get();
+  };
+  std::vector<Contestant> contestants;
+  if (bench.problem().definite()) {  // CHOLMOD has no answer to a singular matrix
+    contestants.push_back({"CHOLMOD simplicial", [&] { return simplicial.run(); }, [&] { return simplicial.fault(); }});
+    contestants.push_back({"CHOLMOD supernodal", [&] { return supernodal.run(); }, [&] { return supernodal.fault(); }});
+  }
+  contestants.push_back({kOurs, [&] { return ours.run(); }, [&] { return ours.fault(reference()); }});
+  const std::vector<Outcome> numeric = bench.race("numeric", contestants);
+
+  std::vector<Outcome> symbolic = numeric;
+  for (Outcome& outcome : symbolic) {
+    outcome.seconds = outcome.name == kOurs                  ? ours.symbolic
+                      : outcome.name == "CHOLMOD simplicial" ? simplicial.symbolic
+                                                             : supernodal.symbolic;
+  }
+  const Fill fill = fill_of(bench.rows(), bench.permutation());
+  const Json facts = {{"flops", fill.flops}, {"factor_entries", fill.entries}};
+  bench.record("symbolic", "", symbolic, facts);
+  bench.record("numeric", "", numeric, facts);
+}
+
+}  // namespace sm::bench

@@ -1,0 +1,47 @@
+// The peak of a factorization job once the matrix is closed: what the closed matrix holds, and by how much the resident
+// set of the process grew above that while it was factored.
+#include <cstdio>
+#include <fstream>
+#include <string>
+
+#include "bench/phases/phases.hpp"
+
+namespace sm::bench {
+namespace {
+
+// "VmHWM" or "VmRSS" in bytes; 0 when the system does not say.
+double resident(const std::string& what) {
+  std::ifstream status("/proc/self/status");
+  for (std::string line; std::getline(status, line);) {
+    if (line.rfind(what + ":", 0) == 0) return 1024.0 * std::stod(line.substr(what.size() + 1));
+  }
+  return 0.0;
+}
+
+bool forget_peak() {
+  std::ofstream file("/proc/self/clear_refs");
+  file << "5\n";
+  return static_cast<bool>(file.flush());
+}
+
+}  // namespace
+
+void measure_memory(Workbench& bench) {
+  if (!bench.can_factor("memory")) return;
+  const Problem& problem = bench.problem();
+  const std::uint64_t before = bench.module().bytes_in_use();
+  auto matrix = qxhost::Matrix::symmetric_sparse(bench.module().instance(), problem.n);
+  enter(bench.module().fn(), matrix, problem.upper);
+  expect_ok(bench.module().fn().qxsmclose(matrix, 0.0), "closing");
+  const auto closed = static_cast<double>(bench.module().bytes_in_use() - before);
+  if (!forget_peak()) return;
+  const double begin = resident("VmRSS");
+  expect_ok(bench.module().fn().qxsmfact(matrix, 0), "factoring");
+  const double peak = closed + resident("VmHWM") - begin;
+  const auto factor = static_cast<double>(matrix->factor_iu[problem.n]);
+  const double bound = 9.5 * factor + 60.0 * static_cast<double>(matrix->nnz) + 120.0 * problem.n;
+  bench.record("memory", "", {}, {{"closed", closed}, {"peak", peak}, {"bound", bound}, {"factor_entries", factor}});
+  std::fprintf(stderr, "    peak %.1f MB, bound %.1f MB\n", 1e-6 * peak, 1e-6 * bound);
+}
+
+}  // namespace sm::bench

@@ -1,0 +1,57 @@
+// From a closed matrix to a solution, everyone with an ordering of their own.
+#include <fmt/format.h>
+
+#include "bench/harness/clock.hpp"
+#include "bench/peers/cholmod.hpp"
+#include "bench/peers/eigen.hpp"
+#include "bench/phases/phases.hpp"
+
+namespace sm::bench {
+namespace {
+
+double run_ours(Workbench& bench, std::vector<double>& x) {
+  const qxhost::Matrix matrix = bench.copy_of(bench.closed());
+  const SmFunctionTable& fn = bench.module().fn();
+  x.resize(bench.problem().rhs.size());
+  return seconds_of([&] {
+    expect_ok(fn.qxsmfact(matrix, 0), "factoring");
+    expect_ok(fn.qxsmsubst(matrix, bench.problem().rhs.data(), x.data(), 1), "solving");
+  });
+}
+
+double run_cholmod(Workbench& bench, Ordering ordering, Kind kind, std::vector<double>& x) {
+  Cholmod cholmod(bench.rows(), ordering, kind);
+  const double* solution = nullptr;
+  const double seconds = seconds_of([&] {
+    cholmod.analyse();
+    cholmod.factorize();
+    solution = cholmod.solve(bench.problem().rhs.data(), 1);
+  });
+  x.assign(solution, solution + bench.problem().n);
+  return seconds;
+}
+
+}  // namespace
+
+void measure_total(Workbench& bench) {
+  if (!bench.can_factor("total")) return;
+  const std::vector<double>& b = bench.problem().rhs;
+  std::vector<double> x;
+  std::vector<Contestant> contestants;
+  const auto add = [&](std::string name, std::function<double()> run) {
+    contestants.push_back({std::move(name), std::move(run), [&] { return solution_fault(bench.rows(), x.data(), b); }});
+  };
+  add(kOurs, [&] { return run_ours(bench, x); });
+  if (bench.problem().definite()) {  // the peers have no answer to a singular matrix
+    for (const auto& [name, ordering] : {std::pair{"AMD", Ordering::amd}, {"METIS", Ordering::metis}}) {
+      for (const auto& [form, kind] : {std::pair{"simplicial", Kind::simplicial}, {"supernodal", Kind::supernodal}}) {
+        add(fmt::format("CHOLMOD {}, {}", form, name),
+            [&bench, &x, ordering, kind] { return run_cholmod(bench, ordering, kind, x); });
+      }
+    }
+    add("Eigen SimplicialLDLT", [&] { return seconds_of([&] { solve_by_eigen(bench.rows(), b, x); }); });
+  }
+  bench.record("total", "", bench.race("total", contestants));
+}
+
+}  // namespace sm::bench

@@ -1,0 +1,201 @@
+"""The page: what was measured, against what it was to be."""
+
+import text
+from results import OURS, definite, exponent
+from targets import TARGETS
+
+FAMILIES = {
+    "a": "5-point grids",
+    "b": "7-point grids in three dimensions",
+    "c": "ratings of lecturers by students (mixed-model equations)",
+    "d": "animal models",
+    "e": "squares of 5-point grids (13 points)",
+    "f": "subjects with six coefficients, ten fixed effects",
+}
+PHASES = [
+    ("assembly", "Assembly", "Every contribution entered by itself; Eigen takes them all at once."),
+    ("closing", "Closing", "From trees, or from the maps, to compressed rows."),
+    ("ordering", "Ordering", "Minimum degree here and in AMD, nested dissection in METIS, which is given its graph."),
+    ("symbolic", "Symbolic factorization",
+     "The module's own permutation given to all. CHOLMOD's simplicial analysis counts but leaves the subscripts to the "
+     "numeric phase; the supernodal one makes them and is the peer here."),
+    ("numeric", "Numeric factorization", "The module's own permutation given to all, memory fresh for all."),
+    ("total", "Order, factor and solve", "From a closed matrix to one solution, everybody with orderings of their own."),
+    ("solve", "Solves", "With a factor that is there."),
+    ("inverse", "Diagonal of the inverse", "Beside a column by column Takahashi on CHOLMOD's factor, in the same order."),
+    ("trace", "Trace of an inverse product", "tr(A⁻B), B on the pattern of A."),
+    ("refactor", "Refactor loop", "New values on the same pattern."),
+    ("product", "Symmetric product", "From one stored triangle. Bytes: 16 for each entry, and the vectors."),
+    ("iteration", "Conjugate gradients", "Time of a step; one stored triangle, diagonal preconditioner."),
+    ("dense factor", "Dense factor", "Packed here, full for dpotrf, packed for dpptrf."),
+    ("dense inverse", "Dense inverse", "Packed here, full for LAPACK."),
+]
+
+
+def explanations(file):
+    """Why targets are missed: lines "phase family: reason"."""
+    reasons = {}
+    try:
+        with open(file, encoding="utf-8") as lines:
+            for line in lines:
+                key, colon, reason = line.strip().partition(": ")
+                if colon and not line.startswith("#"):
+                    reasons[key] = reason
+    except FileNotFoundError:
+        pass
+    return reasons
+
+
+def conditions(run):
+    m = run.machine
+    clock = {"cpu": "processor time of the process", "wall": "the wall's time"}[m["clock"]]
+    rows = [
+        ["processor", f"{m['processor']}, {m['cores']} cores, one used"],
+        ["memory", f"{m['memory'] / 2**30:.0f} GiB"],
+        ["system, compiler", f"{m['system']}, GCC {m['compiler']}"],
+        ["module", f"commit {m['commit']}"],
+        ["peers", f"CHOLMOD {m['cholmod']}, METIS {m['metis']}, Eigen {m['eigen']}, {m['openblas'].strip()}"],
+        ["dgemm, order 2000", f"{m['dgemm'] / 1e9:.1f} GFLOP/s"],
+        ["copy, read and written", f"{m['copy'] / 1e9:.1f} GB/s"],
+        ["load when the run began", f"{m['load']:.1f} (one minute)"],
+        ["clock", clock],
+    ]
+    return text.table(["", ""], rows, left=2)
+
+
+def disturbed(run):
+    """A sentence when the machine was not ours alone."""
+    if run.machine["load"] <= 0.7:
+        return ""
+    return ("**The machine was busy with other work during this run** (see the load below). Processor time leaves out "
+            "the time of others but not what they did to caches and memory, so ratios here are worth less than those "
+            "of a quiet run.\n\n")
+
+
+def shown(verdict, target):
+    need = ("at most " if verdict.at_most else "at least ") + text.number(verdict.required) + " " + target.unit
+    return f"{text.number(verdict.measured)} {target.unit}, {need}"
+
+
+def overview(run, reasons):
+    rows = []
+    for target in TARGETS:
+        verdicts = target.judge(run)
+        known = [v for v in verdicts if v.known]
+        families = ", ".join(target.families)
+        if not known:
+            rows.append([target.phase, families, target.text, "not measured", ""])
+            continue
+        worst = max(known, key=lambda v: v.shortfall)
+        met = sum(v.met for v in known)
+        outcome = "met" if met == len(known) else f"**missed** in {len(known) - met} of {len(known)}"
+        rows.append([target.phase, families, target.text, outcome,
+                     f"{worst.result.family} {worst.result.case}: {shown(worst, target)}"])
+    return text.table(["phase", "families", "target", "outcome", "worst case"], rows, left=5)
+
+
+def misses(run, reasons):
+    """Every missed target with its reason, when somebody has written one down."""
+    lines = []
+    for target in TARGETS:
+        missed = [v for v in target.judge(run) if v.known and not v.met]
+        for family in sorted({v.result.family for v in missed}):
+            worst = max((v for v in missed if v.result.family == family), key=lambda v: v.shortfall)
+            reason = reasons.get(f"{target.phase} {family}", "not explained yet")
+            lines.append(f"- {target.phase}, {family} ({worst.result.case}), {target.text}: {shown(worst, target)}. "
+                         f"{reason[0].upper()}{reason[1:]}.")
+    return "\n".join(lines) + "\n" if lines else "None.\n"
+
+
+def extra(run, r):
+    """A column of its own for some phases: heading and value."""
+    ours = r.ours()
+    if r.phase == "assembly":
+        return "million/s", text.number(r.facts["contributions"] / ours / 1e6) if ours else "–"
+    if r.phase == "ordering":
+        fill = {k: v["flops"] for k, v in r.facts.get("fill", {}).items()}
+        return "Gflop of the factor: " + ", ".join(fill), ", ".join(text.number(f / 1e9) for f in fill.values())
+    if r.phase == "numeric":
+        return "GFLOP/s", text.number(r.facts["flops"] / ours / 1e9) if ours else "–"
+    if r.phase == "product":
+        return "of the copy rate", text.number(r.facts["bytes"] / ours / run.machine["copy"]) if ours else "–"
+    return None
+
+
+def phase_table(run, phase):
+    results = run.of(phase)
+    names = []
+    for r in results:
+        names += [n for n in r.times if n not in names]
+    names.sort(key=lambda name: not name.startswith(OURS))
+    variants = any(r.variant for r in results)
+    head = ["family", "case"] + (["variant"] if variants else []) + ["n", "entries"] + names + ["faster than the best by"]
+    rows, added = [], None
+    for r in results:
+        peers = ("CHOLMOD supernodal",) if phase == "symbolic" else ("std::map",) if phase == "assembly" else None
+        row = [r.family, r.case] + ([r.variant] if variants else []) + [text.count(r.n), text.count(r.entries)]
+        row += [text.time_of(r, name) for name in names] + [text.number(r.ratio(peers))]
+        column = extra(run, r)
+        if column:
+            added = added or column[0]
+            row.append(column[1])
+        rows.append(row)
+    return text.table(head + ([added] if added else []), rows, left=3 if variants else 2)
+
+
+def wrong_results(run):
+    lines = [f"- {r.phase} {r.variant}, {r.family} {r.case}, {name}: {record['wrong']}"
+             for r in run.results for name, record in r.times.items() if "wrong" in record]
+    return "\n".join(lines) + "\n" if lines else "None: every result was checked, and right.\n"
+
+
+def memory_table(run):
+    rows = []
+    for r in run.of("memory"):
+        f = r.facts
+        rows.append([r.family, r.case, text.count(r.n), text.count(f["factor_entries"]), f"{f['peak'] / 1e6:,.1f}",
+                     f"{f['bound'] / 1e6:,.1f}", text.number(f["peak"] / f["bound"])])
+    return text.table(["family", "case", "n", "entries of U", "peak, MB", "bound, MB", "peak / bound"], rows, left=2)
+
+
+def rank_table(run):
+    rows = []
+    for r in run.of("rank"):
+        f = r.facts
+        rows.append([r.case, text.count(r.n), text.count(f["rank"]), text.count(f["expected"]),
+                     text.count(f["plain_rank"]), text.number(f["largest_dropped"]),
+                     text.number(f["smallest_accepted"])])
+    return text.table(["case", "n", "rank", "by construction", "of a plain factorization",
+                       "largest dropped pivot / bound", "smallest accepted / bound"], rows)
+
+
+def series(run, family, phase, variant=""):
+    """For each program its (n, seconds); only the systems that peers can do."""
+    lines = {}
+    for r in run.of(phase, (family,), variant):
+        if not definite(r):
+            continue
+        for name in r.times:
+            if r.seconds(name):
+                lines.setdefault(name, []).append((r.n, r.seconds(name)))
+    return lines
+
+
+SCALING = [("ordering", ""), ("symbolic", ""), ("numeric", ""), ("total", ""), ("solve", "1 right-hand side"),
+           ("inverse", "")]
+
+
+def scaling_table(run):
+    rows = []
+    for family in FAMILIES:
+        row = [family]
+        for phase, variant in SCALING:
+            lines = series(run, family, phase, variant)
+            ours = exponent(lines.get(OURS, []))
+            best = {}
+            for name, points in lines.items():
+                for n, s in points if name != OURS else []:
+                    best[n] = min(s, best.get(n, s))
+            row.append(f"{text.number(ours)} ({text.number(exponent(best.items()))})")
+        rows.append(row)
+    return text.table(["family"] + [p for p, _ in SCALING], rows)
