@@ -1,4 +1,6 @@
 // The passes of substitution with AVX2 vectors.
+#include <algorithm>
+
 #include "cholesky/substitution.hpp"
 
 #if defined(__x86_64__)

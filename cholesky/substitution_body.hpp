@@ -140,21 +140,29 @@ struct Several {
   }
 };
 
-// Strips of a block from `first` to `end`: as many of kRows rows as there are, then halves.
-template <class Road, int kRows>
-SM_PASS_INLINE void forward_strips(const FactorRows& f, i64 block, i64 first, i64 end, double* y) {
-  for (; first + kRows <= end; first += kRows) Road::forward(f, strip_of<kRows>(f, block, first), first, y);
+constexpr int kMostRows = 8;
+
+// A strip of `rows` <= kRows rows of a block.
+template <class Road, int kRows = kMostRows>
+SM_PASS_INLINE void forward_strip(const FactorRows& f, i64 block, i64 first, i64 rows, double* y) {
   if constexpr (kRows > 1) {
-    if (first < end) forward_strips<Road, kRows / 2>(f, block, first, end, y);
+    if (rows < kRows) {
+      forward_strip<Road, kRows - 1>(f, block, first, rows, y);
+      return;
+    }
   }
+  Road::forward(f, strip_of<kRows>(f, block, first), first, y);
 }
 
-template <class Road, int kRows>
-SM_PASS_INLINE void backward_strips(const FactorRows& f, i64 block, i64 end, double* y) {
-  for (; end - kRows >= block; end -= kRows) Road::backward(strip_of<kRows>(f, block, end - kRows), end - kRows, y);
+template <class Road, int kRows = kMostRows>
+SM_PASS_INLINE void backward_strip(const FactorRows& f, i64 block, i64 first, i64 rows, double* y) {
   if constexpr (kRows > 1) {
-    if (end > block) backward_strips<Road, kRows / 2>(f, block, end, y);
+    if (rows < kRows) {
+      backward_strip<Road, kRows - 1>(f, block, first, rows, y);
+      return;
+    }
   }
+  Road::backward(strip_of<kRows>(f, block, first), first, y);
 }
 
 template <class Road>
@@ -165,7 +173,8 @@ SM_PASS_TARGET void forward_pass(const FactorRows& f, double* y) {
     if (end == block + 1) {
       Road::forward(f, strip_of<1>(f, block, block), block, y);
     } else {
-      forward_strips<Road, 8>(f, block, block, end, y);
+      for (i64 k = block; k < end; k += kMostRows)
+        forward_strip<Road>(f, block, k, std::min<i64>(kMostRows, end - k), y);
     }
     block = end;
   }
@@ -179,7 +188,11 @@ SM_PASS_TARGET void backward_pass(const FactorRows& f, double* y) {
     if (end == block + 1) {
       Road::backward(strip_of<1>(f, block, block), block, y);
     } else {
-      backward_strips<Road, 8>(f, block, end, y);
+      for (i64 k = end; k > block;) {
+        const i64 rows = std::min<i64>(kMostRows, k - block);
+        k -= rows;
+        backward_strip<Road>(f, block, k, rows, y);
+      }
     }
     end = block;
   }

@@ -1,4 +1,6 @@
 // The passes of substitution with the vectors that every processor of the build has.
+#include <algorithm>
+
 #include "cholesky/substitution.hpp"
 
 #define SM_PASS_TARGET
