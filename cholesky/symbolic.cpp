@@ -12,6 +12,7 @@
 #include <algorithm>
 #include <cmath>
 
+#include "cholesky/lookahead.hpp"
 #include "cholesky/steps.hpp"
 #include "store/checks.hpp"
 
@@ -207,7 +208,11 @@ SmStatus SymbolicRows::run() {
   std::fill_n(columns_, n_, ColumnState{-1, -1});
   std::fill_n(jl_, n_, -1);
   iu_[0] = 0;
-  for (i64 k = 0; k < n_; ++k) SM_TRY(row(k));
+  const LookAhead ahead(m_, false);
+  for (i64 k = 0; k < n_; ++k) {
+    ahead.past(k);
+    SM_TRY(row(k));
+  }
   return SM_OK;
 }
 
