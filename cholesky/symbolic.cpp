@@ -20,12 +20,18 @@ namespace sm {
 
 namespace {
 
-constexpr i64 kSearchGain = 8;  // one search of a tail costs as much as flagging about so many of its columns
+constexpr i64 kSearchGain = 3;  // one search of a tail costs as much as flagging about so many of its columns
 
 struct ColumnState {
   i64 block;  // the row with which the column was last stored in ju
   i64 flag;   // row in work: 2k for an entry of A, 2k + 1 for a column of the tail or an extra
 };
+
+// Whether the ascending list has c. Without branches on what is read: searches of one tail go everywhere in it.
+bool has(const i64* list, i64 length, i64 c) {
+  for (; length > 1; length -= length / 2) list += list[length / 2 - 1] < c ? length / 2 : 0;
+  return *list == c;
+}
 
 class SymbolicRows {
  public:
@@ -60,6 +66,7 @@ class SymbolicRows {
   SmStatus row(i64 k);
   SmStatus own_entries(i64 k, bool& is_tail);
   i64 longest_tail(i64 k);
+  i64 block_of_tail() const;
   void collect_extras(i64 k, i64 others);
   template <class IsIn>
   void collect(i64 k, IsIn is_in);
@@ -133,12 +140,21 @@ void SymbolicRows::collect(i64 k, IsIn is_in) {
   }
 }
 
+// The row with which the subscripts were stored that the tail is part of, if its first column still tells; else -2. A
+// column behind the first that tells the same row is in the tail or behind it.
+i64 SymbolicRows::block_of_tail() const {
+  const i64 block = columns_[*tail_].block;
+  const i64* first = ju_ + iju_[block];
+  return first <= tail_ && tail_ + tail_length_ <= first + length(block) ? block : -2;
+}
+
 void SymbolicRows::collect_extras(i64 k, i64 others) {
-  const i64* end = tail_ + tail_length_;
   if ((count_ + others) * kSearchGain < tail_length_) {
-    collect(k, [&](i64 c) { return std::binary_search(tail_, end, c); });
+    const i64 block = block_of_tail();
+    const i64 last = tail_[tail_length_ - 1];
+    collect(k, [&](i64 c) { return (columns_[c].block == block && c <= last) || has(tail_, tail_length_, c); });
   } else {
-    for (const i64* c = tail_; c != end; ++c) columns_[*c].flag = 2 * k + 1;
+    for (const i64* c = tail_; c != tail_ + tail_length_; ++c) columns_[*c].flag = 2 * k + 1;
     collect(k, [](i64) { return false; });
   }
 }
