@@ -19,6 +19,7 @@
 #include <bit>
 
 #include "cholesky/block_work.hpp"
+#include "cholesky/lookahead.hpp"
 
 namespace sm {
 
@@ -54,7 +55,12 @@ void add_rows(double* target, const Place* to, i64 count, const double* source, 
 class BlockedRows {
  public:
   BlockedRows(const NumericArrays& a, Pivots& pivots, Panels& panels)
-      : a_(a), blocks_(a), pivots_(pivots), panels_(panels), place_(reinterpret_cast<i64*>(a.diag)) {}
+      : a_(a),
+        blocks_(a),
+        pivots_(pivots),
+        panels_(panels),
+        ahead_(a.m, true),
+        place_(reinterpret_cast<i64*>(a.diag)) {}
   SmStatus run();
 
  private:
@@ -71,6 +77,7 @@ class BlockedRows {
   const Blocks blocks_;
   Pivots& pivots_;
   Panels& panels_;
+  const LookAhead ahead_;
   i64* place_;  // the words of the dense row, as places
 };
 
@@ -79,6 +86,7 @@ double BlockedRows::load_row(i64 k) {
   const SmMatrix& m = a_.m;
   const i64 row = m.perm[k];
   double d = 0.0;
+  ahead_.past(k);
   for (i64 p = m.row_start[row]; p < m.row_start[row + 1]; ++p) {
     const i64 j = m.inv_perm[m.col_index[p]];
     if (j > k) {
@@ -142,6 +150,7 @@ void BlockedRows::load_block(const Target& target) {
   for (i64 r = 0; r < b.width; ++r) {
     const i64 k = b.first + r;
     const i64 row = m.perm[k];
+    ahead_.past(k);
     a_.diag[k] = 0.0;
     for (i64 p = m.row_start[row]; p < m.row_start[row + 1]; ++p) {
       const i64 j = m.inv_perm[m.col_index[p]];

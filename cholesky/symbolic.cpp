@@ -5,11 +5,14 @@
 // of linear and nonlinear equations", thesis, Yale University (1975).
 //
 // Row k of U is its own entries joined with the tails of the earlier rows whose first column is k; those rows are
-// chained from jl[k]. Workspace, in words: iju [0, n), iu [n, 2n], jl [2n+1, 3n+1), ju from 3n+1; and at the top, while
-// this runs, mark [C-2n, C-n) and the merge list q [C-n, C).
+// chained from jl[k]. The longest of the tails is sorted and stored already, so only what is not in it is collected, the
+// extras: mostly none. They are searched for in that tail, or flagged against it when they are many. Workspace, in words:
+// iju [0, n), iu [n, 2n], jl [2n+1, 3n+1), ju from 3n+1; and at the top, while this runs, two words for each column. The
+// words of iu whose rows are still to come hold the columns collected: behind row k there are as many as columns.
 #include <algorithm>
 #include <cmath>
 
+#include "cholesky/lookahead.hpp"
 #include "cholesky/steps.hpp"
 #include "store/checks.hpp"
 
@@ -17,7 +20,18 @@ namespace sm {
 
 namespace {
 
-constexpr i64 kAbsent = -1;  // not on the merge list
+constexpr i64 kSearchGain = 3;  // one search of a tail costs as much as flagging about so many of its columns
+
+struct ColumnState {
+  i64 block;  // the row with which the column was last stored in ju
+  i64 flag;   // row in work: 2k for an entry of A, 2k + 1 for a column of the tail or an extra
+};
+
+// Whether the ascending list has c. Without branches on what is read: searches of one tail go everywhere in it.
+bool has(const i64* list, i64 length, i64 c) {
+  for (; length > 1; length -= length / 2) list += list[length / 2 - 1] < c ? length / 2 : 0;
+  return *list == c;
+}
 
 class SymbolicRows {
  public:
@@ -29,112 +43,133 @@ class SymbolicRows {
         iu_(m.work + n_),
         jl_(m.work + 2 * n_ + 1),
         ju_(m.work + 3 * n_ + 1),
-        mark_(m.work + m.work_capacity - 2 * n_),
-        q_(m.work + m.work_capacity - n_) {}
+        columns_(reinterpret_cast<ColumnState*>(m.work + m.work_capacity - 2 * n_)) {}
 
   // 0, 106, or 105 when the subscripts do not fit: shortfall() words are missing then.
   SmStatus run();
   i64 shortfall() const { return juptr_ + 1 - room_; }
 
  private:
+  // The sorted tail and the sorted extras, read as one ascending list; n ends it.
+  struct Joined {
+    const i64 *tail, *tail_end, *extra, *extra_end;
+    i64 n;
+
+    i64 column() const {
+      const i64 a = tail != tail_end ? *tail : n;
+      const i64 b = extra != extra_end ? *extra : n;
+      return std::min(a, b);
+    }
+    void next() { extra == extra_end || (tail != tail_end && *tail < *extra) ? ++tail : ++extra; }
+  };
+
   SmStatus row(i64 k);
   SmStatus own_entries(i64 k, bool& is_tail);
-  void sort_list();
-  i64 merge_lists(i64 first, i64 second);
-  void merge_row(i64 i);
-  bool store_list(i64 k);
+  i64 longest_tail(i64 k);
+  i64 block_of_tail() const;
+  void collect_extras(i64 k, i64 others);
+  template <class IsIn>
+  void collect(i64 k, IsIn is_in);
+  bool store_joined(i64 k);
   bool found_in_last_block(i64 k);
-  void clear_list();
+  Joined joined() const { return {tail_, tail_ + tail_length_, collected_, collected_ + count_, n_}; }
   i64 length(i64 i) const { return iu_[i + 1] - iu_[i]; }
 
   const SmMatrix& m_;
   i64 n_;
   i64 room_;  // slots of ju
-  i64 *iju_, *iu_, *jl_, *ju_, *mark_, *q_;
-  i64 juptr_ = -1;  // last slot used
-  i64 jumin_ = 0;   // first slot of the last block
-  i64 head_ = 0;    // first column of the merge list; q_[c] follows column c; n_ ends it
-  i64 luk_ = 0;     // its length
+  i64 *iju_, *iu_, *jl_, *ju_;
+  ColumnState* columns_;
+  i64 juptr_ = -1;             // last slot used
+  i64 jumin_ = 0;              // first slot of the last block
+  const i64* tail_ = nullptr;  // the longest tail that the row takes over
+  i64 tail_length_ = 0;
+  i64* collected_ = nullptr;  // the row's own entries, then its extras
+  i64 count_ = 0;             // how many
 };
 
-// Entries of row k in the new order, unsorted. is_tail: every one of them is in the block that k's mark names.
+// Entries of row k in the new order, unsorted. is_tail: every one of them is in the block that k was stored with.
 SmStatus SymbolicRows::own_entries(i64 k, bool& is_tail) {
   const i64 row = m_.perm[k];
-  const i64 tag = mark_[k];
+  const i64 block = columns_[k].block;
+  collected_ = iu_ + k + 2;
+  count_ = 0;
   for (i64 p = m_.row_start[row]; p < m_.row_start[row + 1]; ++p) {
     const i64 c = m_.inv_perm[m_.col_index[p]];
     if (c <= k) continue;
-    if (q_[c] != kAbsent) return SM_SYMBOLIC_FAILED;
-    q_[c] = head_;
-    head_ = c;
-    ++luk_;
-    if (mark_[c] != tag) is_tail = false;
+    if (columns_[c].flag == 2 * k) return SM_SYMBOLIC_FAILED;
+    columns_[c].flag = 2 * k;
+    collected_[count_++] = c;
+    is_tail = is_tail && columns_[c].block == block;
   }
   return SM_OK;
 }
 
-i64 SymbolicRows::merge_lists(i64 first, i64 second) {
-  i64 head = n_;
-  i64* link = &head;
-  while (first < n_ && second < n_) {
-    i64& smaller = first < second ? first : second;
-    *link = smaller;
-    link = &q_[smaller];
-    smaller = *link;
-  }
-  *link = first < n_ ? first : second;
-  return head;
-}
-
-// Merge sort of the list: bins[b] holds a sorted run of 2^b columns. A row with very many entries stays cheap.
-void SymbolicRows::sort_list() {
-  constexpr int kBins = 54;
-  i64 bins[kBins];
-  int used = 0;
-  i64 rest = head_;
-  while (rest < n_) {
-    i64 run = rest;
-    rest = q_[rest];
-    q_[run] = n_;
-    int b = 0;
-    for (; b < used && bins[b] < n_; ++b) {
-      run = merge_lists(bins[b], run);
-      bins[b] = n_;
+// Of the tails that row k takes over, the longest; answers how many columns the others have together.
+i64 SymbolicRows::longest_tail(i64 k) {
+  iju_[k] = juptr_;
+  tail_length_ = 0;
+  i64 all = 0;
+  for (i64 i = jl_[k]; i >= 0; i = jl_[i]) {
+    const i64 columns = length(i) - 1;
+    all += columns;
+    if (columns > tail_length_) {
+      tail_length_ = columns;
+      iju_[k] = iju_[i] + 1;
     }
-    bins[b] = run;
-    used = std::max(used, b + 1);
   }
-  head_ = n_;
-  for (int b = 0; b < used; ++b) head_ = merge_lists(head_, bins[b]);
+  tail_ = ju_ + iju_[k];
+  return all - tail_length_;
 }
 
-// Joins the columns of row i after its first one into the list.
-void SymbolicRows::merge_row(i64 i) {
-  i64* link = &head_;
-  const i64* column = ju_ + iju_[i];
-  for (i64 t = 1; t < length(i); ++t) {
-    const i64 c = column[t];
-    while (*link < c) link = &q_[*link];
-    if (*link != c) {
-      q_[c] = *link;
-      *link = c;
-      ++luk_;
-    }
-    link = &q_[c];
+// Leaves in collected_ what is not in the tail.
+template <class IsIn>
+void SymbolicRows::collect(i64 k, IsIn is_in) {
+  const i64 own = count_;
+  count_ = 0;
+  const auto take = [&](i64 c) {
+    if (columns_[c].flag == 2 * k + 1 || is_in(c)) return;
+    columns_[c].flag = 2 * k + 1;
+    collected_[count_++] = c;
+  };
+  for (i64 t = 0; t < own; ++t) take(collected_[t]);
+  for (i64 i = jl_[k]; i >= 0; i = jl_[i]) {
+    const i64* column = ju_ + iju_[i];
+    if (column + 1 == tail_) continue;
+    for (i64 t = 1; t < length(i); ++t) take(column[t]);
   }
 }
 
-// Looks for the list in the last block of subscripts. True when all of it is there; when the block ends first, the new
+// The row with which the subscripts were stored that the tail is part of, if its first column still tells; else -2. A
+// column behind the first that tells the same row is in the tail or behind it.
+i64 SymbolicRows::block_of_tail() const {
+  const i64 block = columns_[*tail_].block;
+  const i64* first = ju_ + iju_[block];
+  return first <= tail_ && tail_ + tail_length_ <= first + length(block) ? block : -2;
+}
+
+void SymbolicRows::collect_extras(i64 k, i64 others) {
+  if ((count_ + others) * kSearchGain < tail_length_) {
+    const i64 block = block_of_tail();
+    const i64 last = tail_[tail_length_ - 1];
+    collect(k, [&](i64 c) { return (columns_[c].block == block && c <= last) || has(tail_, tail_length_, c); });
+  } else {
+    for (const i64* c = tail_; c != tail_ + tail_length_; ++c) columns_[*c].flag = 2 * k + 1;
+    collect(k, [](i64) { return false; });
+  }
+}
+
+// Looks for the row in the last block of subscripts. True when all of it is there; when the block ends first, the new
 // block may start inside it.
 bool SymbolicRows::found_in_last_block(i64 k) {
   const i64* first = ju_ + jumin_;
   const i64* last = ju_ + juptr_ + 1;
-  const i64* hit = std::lower_bound(first, last, head_);
-  if (hit == last || *hit != head_) return false;
-  i64 c = head_;
+  Joined list = joined();
+  const i64* hit = std::lower_bound(first, last, list.column());
+  if (hit == last || *hit != list.column()) return false;
   const i64* slot = hit;
-  for (; slot != last && c == *slot; ++slot) c = q_[c];
-  if (c >= n_) {
+  for (; slot != last && list.column() == *slot; ++slot) list.next();
+  if (list.column() >= n_) {
     iju_[k] = hit - ju_;
     return true;
   }
@@ -142,28 +177,21 @@ bool SymbolicRows::found_in_last_block(i64 k) {
   return false;
 }
 
-// Puts the list into ju. False when there is no room.
-bool SymbolicRows::store_list(i64 k) {
+// Puts the row into ju. False when there is no room. A new block that starts inside the last one repeats what stands
+// there, so the tail, which may stand there too, is not disturbed.
+bool SymbolicRows::store_joined(i64 k) {
   if (found_in_last_block(k)) return true;
   jumin_ = juptr_ + 1;
-  juptr_ += luk_;
+  juptr_ += tail_length_ + count_;
   if (juptr_ >= room_) return false;
-  i64 slot = jumin_;
-  for (i64 c = head_; c < n_; c = q_[c]) {
-    ju_[slot++] = c;
-    mark_[c] = k;
+  i64* slot = ju_ + jumin_;
+  for (Joined list = joined(); list.column() < n_; list.next()) {
+    const i64 c = list.column();
+    *slot++ = c;
+    columns_[c].block = k;
   }
   iju_[k] = jumin_;
   return true;
-}
-
-void SymbolicRows::clear_list() {
-  while (head_ < n_) {
-    const i64 c = head_;
-    head_ = q_[c];
-    q_[c] = kAbsent;
-  }
-  luk_ = 0;
 }
 
 SmStatus SymbolicRows::row(i64 k) {
@@ -175,20 +203,13 @@ SmStatus SymbolicRows::row(i64 k) {
     iju_[k] = iju_[updating] + 1;
     count = length(updating) - 1;
   } else {
-    sort_list();
-    iju_[k] = juptr_;
-    i64 longest = 0;
-    for (i64 i = updating; i >= 0; i = jl_[i]) {
-      merge_row(i);
-      if (length(i) - 1 > longest) {
-        longest = length(i) - 1;
-        iju_[k] = iju_[i] + 1;
-      }
+    collect_extras(k, longest_tail(k));
+    if (count_ > 0) {
+      std::sort(collected_, collected_ + count_);
+      if (!store_joined(k)) return SM_TOO_LARGE;
     }
-    if (luk_ != longest && !store_list(k)) return SM_TOO_LARGE;
-    count = luk_;
+    count = tail_length_ + count_;
   }
-  clear_list();
   if (count > 1) {
     const i64 first = ju_[iju_[k]];
     jl_[k] = jl_[first];
@@ -199,13 +220,15 @@ SmStatus SymbolicRows::row(i64 k) {
 }
 
 SmStatus SymbolicRows::run() {
-  if (room_ < 0) return SM_TOO_LARGE;  // not even mark and q fit
-  std::fill_n(mark_, n_, -1);
+  if (room_ < 0) return SM_TOO_LARGE;  // not even the columns' words fit
+  std::fill_n(columns_, n_, ColumnState{-1, -1});
   std::fill_n(jl_, n_, -1);
-  std::fill_n(q_, n_, kAbsent);
   iu_[0] = 0;
-  head_ = n_;
-  for (i64 k = 0; k < n_; ++k) SM_TRY(row(k));
+  const LookAhead ahead(m_, false);
+  for (i64 k = 0; k < n_; ++k) {
+    ahead.past(k);
+    SM_TRY(row(k));
+  }
   return SM_OK;
 }
 

@@ -1,0 +1,35 @@
+// Fetching ahead of a walk over the stored rows in the new order, which jumps through four arrays.
+#pragma once
+
+#include <algorithm>
+
+#include "frame/core.hpp"
+
+namespace sm {
+
+class LookAhead {
+ public:
+  LookAhead(const SmMatrix& m, bool values) : m_(m), values_(values) {}
+
+  // While row k is in work: each stage needs what the one before has fetched some rows earlier. Inlined by order: GCC
+  // takes a function that only fetches for one without effect, and drops its calls.
+  [[gnu::always_inline]] void past(i64 k) const {
+    if (k + 3 * kRows >= m_.rows) return;  // the last rows come without
+    __builtin_prefetch(m_.row_start + m_.perm[k + 3 * kRows]);
+    const i64 start = m_.row_start[m_.perm[k + 2 * kRows]];
+    __builtin_prefetch(m_.col_index + start);
+    if (values_) __builtin_prefetch(m_.nz_values + start);
+    const i64 row = m_.perm[k + kRows];
+    const i64 end = std::min(m_.row_start[row + 1], m_.row_start[row] + kEntries);
+    for (i64 p = m_.row_start[row]; p < end; ++p) __builtin_prefetch(m_.inv_perm + m_.col_index[p]);
+  }
+
+ private:
+  static constexpr i64 kRows = 8;
+  static constexpr i64 kEntries = 8;
+
+  const SmMatrix& m_;
+  bool values_;
+};
+
+}  // namespace sm
