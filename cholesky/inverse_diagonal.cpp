@@ -72,9 +72,7 @@ SmStatus symmetric_diagonal(SmMatrix& m, double* x) {
 }
 
 Gate may_read_diagonal(const SmMatrix& m) {
-  SM_STOP_IF(m.nnz < 1, SM_OK);
-  SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(m), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(m));
   SM_STOP_IF(m.rows != m.cols, SM_NOT_SQUARE);
   return {};
 }

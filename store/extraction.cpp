@@ -19,13 +19,6 @@ namespace sm {
 
 namespace {
 
-Gate may_read(const SmMatrix& m) {
-  SM_STOP_IF(m.nnz < 1, SM_OK);
-  SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(m), SM_NOT_CLOSED);
-  return {};
-}
-
 // From state 3 on the stored rows are the factor's, and a row of the caller's is not to be had from them.
 bool is_reordered(const SmMatrix& m) { return is_symmetric_sparse(m) && m.state > SM_STATE_ORDERED; }
 
