@@ -92,8 +92,7 @@ void fill_upper_block(const UpperRows& view, double* out, i64 r0, i64 r1, i64 c0
   const i64 width = extent(c0, c1);
   const i64 size = block_size(r0, r1, c0, c1);
   for (i64 i = r0; i <= r1; ++i) {
-    view.row(i, [&](i64 j, double v) {
-      if (j < c0 || j > c1) return;
+    view.row_between(i, c0, c1, [&](i64 j, double v) {
       out[(i - r0) * width + (j - c0)] = v;
       const i64 mirrored = (j - c0) * width + (i - r0);
       if (i >= c0 && j > i && mirrored < size) out[mirrored] = v;
