@@ -47,7 +47,7 @@ SmStatus packed_diagonal(SmMatrix& m, double* x) {
     const double* r = factor_array(m);
     for (i64 j = 0; j < m.rows; ++j) {
       if (!(r[layout.diagonal(j)] > 0.0)) continue;
-      std::fill_n(w, m.rows, 0.0);
+      std::fill_n(w, j, 0.0);
       w[j] = 1.0;
       solve_upper(layout, r, w, j);
       for (i64 i = 0; i <= j; ++i) x[i] += w[i] * w[i];
