@@ -89,6 +89,7 @@ SmStatus multiply(SmMatrix& a, const Block& block, Range rows, Range cols) {
 SmStatus multiply_transposed(SmMatrix& a, const Block& block) {
   SM_PASS(may_multiply(a, block));
   clear(block, a.cols);
+  if (block.count < 1) return SM_OK;
   const auto add = [&](const auto& view) {
     add_each(view, {0, a.cols - 1}, {0, a.rows - 1}, block, true);
     return SM_OK;
