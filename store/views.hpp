@@ -123,9 +123,9 @@ struct UpperRows : StoredLines<UpperRows> {
   template <class F>
   void row_between(i64 i, i64 first, i64 last, F&& f) const {
     if (is_ascending) {
-      const i64* end = col_index + row_start[i + 1];
-      const i64* j = std::lower_bound(col_index + row_start[i], end, first);
-      for (; j != end && *j <= last; ++j) f(*j, values[j - col_index]);
+      const i64 end = row_start[i + 1];
+      i64 p = std::lower_bound(col_index + row_start[i], col_index + end, first) - col_index;
+      for (; p < end && col_index[p] <= last; ++p) f(col_index[p], values[p]);
     } else {
       row(i, [&](i64 j, double& v) {
         if (first <= j && j <= last) f(j, v);
