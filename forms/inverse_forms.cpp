@@ -28,9 +28,9 @@ Gate may_form_vectors(const SmMatrix& a, const double* x, const double* r) {
 }
 
 Gate may_form_matrix(const SmMatrix& a, const SmMatrix& x, const SmMatrix& r) {
-  SM_STOP_IF(a.nnz < 1 || x.nnz < 1, SM_OK);
-  SM_STOP_IF(a.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(a) || !is_closed(x), SM_NOT_CLOSED);
+  SM_STOP_IF(x.nnz < 1, SM_OK);
+  SM_STOP_WITH(may_read(a));
+  SM_STOP_IF(!is_closed(x), SM_NOT_CLOSED);
   SM_STOP_IF(lacks_factor(a), SM_NO_FACTOR);
   SM_STOP_IF(&r == &a || &r == &x, SM_BAD_ARGUMENT);
   SM_STOP_IF(a.rows != a.cols, SM_NOT_SQUARE);
@@ -40,9 +40,7 @@ Gate may_form_matrix(const SmMatrix& a, const SmMatrix& x, const SmMatrix& r) {
 }
 
 Gate may_form_bilinear(const SmMatrix& a, const double* x, const double* y, const double* r) {
-  SM_STOP_IF(a.nnz < 1, SM_OK);
-  SM_STOP_IF(a.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(a), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(a));
   SM_STOP_IF(lacks_factor(a), SM_NO_FACTOR);
   SM_STOP_IF(x == r || y == r, SM_BAD_ARGUMENT);
   SM_STOP_IF(a.rows != a.cols, SM_NOT_SQUARE);

@@ -71,9 +71,7 @@ SmStatus diagonal_hermite(SmMatrix& a, SmMatrix& h) {
 }
 
 Gate may_form(const SmMatrix& a, const SmMatrix& h) {
-  SM_STOP_IF(a.nnz < 1, SM_OK);
-  SM_STOP_IF(a.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(a), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(a));
   SM_STOP_IF(&a == &h, SM_BAD_ARGUMENT);
   SM_STOP_IF(a.rows != a.cols, SM_NOT_SQUARE);
   return {};

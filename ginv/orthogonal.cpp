@@ -47,9 +47,7 @@ SmStatus sweep_row(SmMatrix& a, i64 i, std::int16_t* active, double tolerance, d
 }
 
 Gate may_orthogonalise(const SmMatrix& a) {
-  SM_STOP_IF(a.nnz < 1, SM_OK);
-  SM_STOP_IF(a.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(a), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(a));
   SM_STOP_IF(a.rows != a.cols, SM_NOT_SQUARE);
   SM_STOP_IF(!is_general_sparse(a), SM_UNAVAILABLE);
   return {};

@@ -173,9 +173,7 @@ void solve_diagonal(const SmMatrix& m, const IterativeTask& task) {
 }
 
 Gate may_iterate(const SmMatrix& m, const IterativeTask& task) {
-  SM_STOP_IF(m.nnz < 1, SM_OK);
-  SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(m), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(m));
   SM_STOP_IF(task.b == task.x, SM_BAD_ARGUMENT);
   return {};
 }

@@ -125,9 +125,10 @@ QXESM_API SmStatus qxsmmults(SmMatrix* a, double s);
  *   symmetric 22          no        yes         yes
  *   diagonal              yes       yes         yes
  * Elements are added by qxsmassign, in sparse rows of B product by product, else row by row. Elements for which C has
- * no place are passed over: a symmetric C takes the upper triangle, a diagonal C the diagonal. Of two diagonal matrices
+ * no place are passed over: a symmetric C takes the upper triangle, a diagonal C the diagonal. Of a general C in format
+ * 22 or 23 the position counts, as in qxsmassign: a kept one should have the product's size. Of two diagonal matrices
  * the product's diagonal is written into a diagonal C, which loses its factor, rank and log-determinant; any other C
- * gets it by qxsmassign and is, with keep 0, closed, dropping zeros.
+ * gets it by qxsmassign, zeros included, and is closed with keep 0.
  * Answers: 0 with nothing done (A and B empty); 1 (A); 113 (A or B); 104 (C is A or B); 121 (A's columns are not B's
  * rows; C diagonal and neither A nor B); then, C having been sized, 124 (pair not served); 0 (A or B empty); 101; 121
  * (diagonal times diagonal into a diagonal C of another order); the answer of qxsmassign that ended it, 104 and 117

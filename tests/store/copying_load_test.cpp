@@ -168,6 +168,62 @@ TEST_P(Load, the_matrix_s_own_array_is_refused_when_it_would_be_given_back) {
   expect_loaded(tied, counted(6), 3, 2, kGeneralRows);
 }
 
+TEST_P(Load, values_inside_an_array_that_would_be_given_back_are_refused_wherever_they_begin) {
+  Random random(7);
+  for (const Shape shape : kSquareFactored) {
+    SCOPED_TRACE(name_of(shape));
+    const Filled a = filled_definite(session(), shape, 4, random);
+    ASSERT_EQ(fn().qxsmfact(a.matrix, 0), SM_OK);
+    const std::int64_t count = a.matrix->nnz;
+    const double* factor = a.matrix->dense_factor;
+    for (const double* array : {static_cast<const double*>(a.matrix->values), factor})
+      for (const std::int64_t from : {std::int64_t{0}, std::int64_t{1}, count - 1}) {
+        EXPECT_EQ(load(array + from, a.matrix, 1, 1, kGeneralRows), SM_BAD_ARGUMENT) << from;
+        EXPECT_EQ(load(array + from, a.matrix, 3, -3, {9, 99}), SM_BAD_ARGUMENT) << "before the type is looked at";
+      }
+    EXPECT_EQ(contents(a.matrix), a.stored);
+    EXPECT_EQ(a.matrix->state, SM_STATE_FACTORED);
+    EXPECT_EQ(a.matrix->rank, 4);
+    EXPECT_EQ(a.matrix->dense_factor, factor);
+  }
+  const Filled sparse = filled_definite(session(), kSymmetricSparse, 4, random);
+  ASSERT_EQ(fn().qxsmfact(sparse.matrix, 0), SM_OK);
+  for (const double* p : {static_cast<const double*>(sparse.matrix->nz_values),
+                          static_cast<const double*>(sparse.matrix->nz_values + sparse.matrix->nnz - 1),
+                          static_cast<const double*>(sparse.matrix->factor_diag),
+                          static_cast<const double*>(sparse.matrix->factor_values)}) {
+    EXPECT_EQ(load(p, sparse.matrix, 1, 1, kGeneralRows), SM_BAD_ARGUMENT);
+  }
+  EXPECT_EQ(sparse.matrix->state, SM_STATE_FACTORED);
+}
+
+TEST_P(Load, a_factor_beside_a_tied_array_is_refused_and_the_tied_array_is_not) {
+  std::vector<double> mine{4.0, 2.0, 5.0};
+  SmMatrix* m = new_open_tied(session(), mine, 2, 2, SM_KIND_SYMMETRIC, SM_FORMAT_ROWS);
+  ASSERT_EQ(fn().qxsmclose(m, kNan), SM_OK);
+  ASSERT_EQ(fn().qxsmfact(m, 0), SM_OK);
+  EXPECT_EQ(load(m->dense_factor, m, 3, 1, kGeneralRows), SM_BAD_ARGUMENT);
+  EXPECT_EQ(load(mine.data() + 1, m, 2, 1, kGeneralRows), SM_OK);
+  expect_loaded(m, {2.0, 5.0}, 2, 1, kGeneralRows);
+}
+
+TEST_P(Load, into_its_shape_a_matrix_takes_values_from_its_own_factor_and_from_an_overlapping_array) {
+  SmMatrix* m = filled_with(session(), kDiagonalRows, 3, 3, {{{0, 0}, 4.0}, {{1, 1}, 9.0}, {{2, 2}, 16.0}}).matrix;
+  ASSERT_EQ(fn().qxsmfact(m, 0), SM_OK);
+  ASSERT_EQ(load(m->dense_factor, m, 3, 3, kDiagonalRows), SM_OK);
+  expect_loaded(m, {2.0, 3.0, 4.0}, 3, 3, kDiagonalRows);
+  for (const std::ptrdiff_t from : {0, 1, 2}) {
+    std::vector<double> mine = counted(8);
+    SmMatrix* tied = sized(session(), kGeneralRows, 1, 1);
+    ASSERT_EQ(qxsmtie(tied, mine.data() + 1, 2, 3, SM_KIND_GENERAL, SM_FORMAT_ROWS), SM_OK);
+    const std::vector<double> want(mine.begin() + from, mine.begin() + from + 6);
+    ASSERT_EQ(load(mine.data() + from, tied, 2, 3, kGeneralRows), SM_OK);
+    expect_loaded(tied, want, 2, 3, kGeneralRows);
+    EXPECT_EQ(mine.front(), 1.0);
+    EXPECT_EQ(mine.back(), 8.0);
+  }
+}
+
 TEST_P(Load, null_values_come_before_everything_and_do_nothing) {
   Random random(3);
   for (const Shape shape : kShapes) {
