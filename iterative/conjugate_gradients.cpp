@@ -116,8 +116,8 @@ class ConjugateGradients {
   Scratch<double> r_, p_, q_;
 };
 
-// q serves three times: for the direction's product, for A x when the residual is recomputed, and for the preconditioned
-// residual; each is used up before the next.
+// q serves three times: for the direction's product, for A x when the residual is recomputed, and for the
+// preconditioned residual; each is used up before the next.
 SmStatus ConjugateGradients::step(const double* b, double* x, i64 k, double& rho) {
   double* r = r_.data();
   double* p = p_.data();

@@ -60,7 +60,7 @@ QXESM_API SmStatus qxsmUpdateGinv(SmMatrix* g, SmMatrix* a, SmMatrix* b, int64_t
  * Answers: 0 with nothing done (G empty); 104 (two of the handles are the same); 124 (kind of G); then
  *   general    124 (G or B not general sparse); 104 (off negative)
  *   diagonal   124 (kind of B); 104 (off negative, or the block outside G)
- *   symmetric  104 (off negative); 121 (B's order is not that of the block); 124 (kind of B); 119 (G sparse and closed);
+ *   symmetric  104 (off negative); 121 (B's order is not that of the block); 124 (kind of B); 119 (G sparse, closed);
  *              113 (B), all before p is touched
  * the first answer of qxsmresize or qxsmassign that is not 0; 0. */
 QXESM_API SmStatus qxsmAddGinv(SmMatrix* g, SmMatrix* b, SmMatrix* p, int64_t off, double s, double tolerance);

@@ -10,8 +10,8 @@ namespace {
 
 class Allocation : public ::testing::TestWithParam<HostKind> {
  protected:
-  // prepare(Session&) -> problem; run(Session&, problem&) -> status; check(Session&, problem&, status, request) looks at
-  // what a refused request left. Whatever that is, it must go with the instance. Answers the number of requests.
+  // prepare(Session&) -> problem; run(Session&, problem&) -> status; check(Session&, problem&, status, request) looks
+  // at what a refused request left. Whatever that is, it must go with the instance. Answers the number of requests.
   template <class Prepare, class Run, class Check>
   std::int64_t each_request_refused(Prepare prepare, Run run, Check check) {
     std::int64_t requests = 0;

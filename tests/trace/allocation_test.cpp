@@ -7,8 +7,6 @@
 namespace sm::test {
 namespace {
 
-constexpr Shape kWithInverse[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalColumns, kDiagonalRows};
-
 struct Operands {
   Filled a;
   Filled b;
@@ -109,7 +107,7 @@ TEST_P(TraceAllocation, every_other_pair_and_the_trace_of_one_matrix_need_no_mem
 }
 
 TEST_P(TraceAllocation, the_trace_with_an_inverse_leaves_nothing_but_the_factor) {
-  for (const Shape sa : kWithInverse)
+  for (const Shape sa : kInvertible)
     for (const Shape sb : kShapes)
       for (const bool factored : {false, true}) {
         SCOPED_TRACE(name_of(sa) + ", " + name_of(sb));
