@@ -26,11 +26,18 @@ void for_each_in_block(SmMatrix& g, i64 off, F&& f) {
   }
 }
 
+// A change like any other, and the only one when B has nothing to add.
 void drop_small(SmMatrix& g, i64 off, double tolerance) {
   if (!(tolerance > 0.0)) return;
+  bool changed = false;
   for_each_in_block(g, off, [&](i64, i64, double& v) {
-    if (std::fabs(v) <= tolerance) v = 0.0;
+    if (!(std::fabs(v) <= tolerance)) return;
+    changed = changed || v != 0.0;
+    v = 0.0;
   });
+  if (!changed) return;
+  drop_separate_factor(g);
+  void_results(g);
 }
 
 // The block as it was, into P at the block's own numbering.

@@ -72,30 +72,6 @@ std::int64_t loose_blocks(Session& session, const std::vector<SmMatrix*>& matric
   return blocks;
 }
 
-// False when no request was met.
-bool refuse(HostKind kind, const FaultCase& c, std::int64_t k, bool for_ever, const std::vector<double>& want) {
-  Session session(kind);
-  const std::vector<SmMatrix*> matrices = c.prepare(session);
-  const std::int64_t loose = loose_blocks(session, matrices);
-  const std::int64_t records = session.instance()->matrix_count;
-  session.host().fail_request(k, for_ever);
-  const SmStatus status = c.run(session, matrices);
-  if (session.host().stop_failing() == 0) {
-    EXPECT_EQ(status, SM_OK);
-    return false;
-  }
-  EXPECT_EQ(status, SM_NO_MEMORY) << "request " << k << (for_ever ? " and on" : "");
-  EXPECT_EQ(loose_blocks(session, matrices), loose) << "request " << k;
-  EXPECT_EQ(c.run(session, matrices), SM_OK) << "after request " << k;
-  EXPECT_TRUE(same(c.answer(matrices), want)) << "after request " << k;
-  EXPECT_EQ(loose_blocks(session, matrices), loose) << "after request " << k;
-  EXPECT_EQ(session.instance()->matrix_count, records);
-  session.close();
-  EXPECT_EQ(session.host().live_pools(), 0);
-  EXPECT_EQ(session.host().violations(), 0);
-  return true;
-}
-
 }  // namespace
 
 std::int64_t survive(HostKind kind, const FaultCase& c) {
@@ -106,11 +82,25 @@ std::int64_t survive(HostKind kind, const FaultCase& c) {
     EXPECT_EQ(c.run(calm, matrices), SM_OK);
     want = c.answer(matrices);
   }
-  std::int64_t requests = 0;
-  for (const bool for_ever : {false, true})
-    for (requests = 0; refuse(kind, c, requests, for_ever, want) && requests < 1000; ++requests) {
-    }
-  return requests;
+  std::int64_t loose = 0;
+  std::int64_t records = 0;
+  return refuse_each_request(
+      kind,
+      [&](Session& session) {
+        const std::vector<SmMatrix*> matrices = c.prepare(session);
+        loose = loose_blocks(session, matrices);
+        records = session.instance()->matrix_count;
+        return matrices;
+      },
+      c.run,
+      [&](Session& session, const std::vector<SmMatrix*>& matrices, SmStatus status, std::int64_t) {
+        EXPECT_EQ(status, SM_NO_MEMORY);
+        EXPECT_EQ(loose_blocks(session, matrices), loose);
+        EXPECT_EQ(c.run(session, matrices), SM_OK) << "again";
+        EXPECT_TRUE(same(c.answer(matrices), want)) << "again";
+        EXPECT_EQ(loose_blocks(session, matrices), loose) << "again";
+        EXPECT_EQ(session.instance()->matrix_count, records);
+      });
 }
 
 }  // namespace sm::test

@@ -228,6 +228,26 @@ TEST_P(AdditionTest, a_tolerance_zeroes_general_and_diagonal_blocks_too) {
     }
 }
 
+TEST_P(AdditionTest, what_the_tolerance_changes_costs_the_factor_even_when_nothing_is_added) {
+  const Dense g = from_rows({{4, 1e-9}, {1e-9, 9}});
+  for (const Shape shape : kPacked)
+    for (const double tolerance : {1e-8, 1e-10}) {
+      SmMatrix* target = with(shape, g);
+      ASSERT_EQ(fn().qxsmfact(target, 0), SM_OK);
+      SmMatrix* nothing = new_without_values(session(), shape, 2);
+      ASSERT_EQ(add(target, nothing, 0, 1.0, tolerance), SM_OK);
+      if (tolerance < 1e-9) {
+        EXPECT_EQ(target->state, SM_STATE_FACTORED) << "nothing is so small";
+        EXPECT_EQ(target->rank, 2);
+        continue;
+      }
+      EXPECT_TRUE(near(contents(target), from_diagonal({4, 9}), 0.0)) << name_of(shape);
+      EXPECT_EQ(target->state, SM_STATE_CLOSED);
+      EXPECT_EQ(target->dense_factor, nullptr);
+      expect_voided(target);
+    }
+}
+
 TEST_P(AdditionTest, the_tolerance_is_applied_to_the_sum) {
   for (const Shape shape : {kSymmetricSparse, kSymmetricColumns, kSymmetricRows}) {
     const Dense g = from_rows({{1, 2}, {2, 3}});

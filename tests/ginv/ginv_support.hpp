@@ -52,33 +52,16 @@ std::int64_t survives(HostKind kind, Prepare prepare, Run run, Answer answer, Re
   EXPECT_EQ(run(calm, untroubled), SM_OK);
   const auto want = answer(untroubled);
   const std::int64_t blocks = calm.host().live_blocks();
-  std::int64_t requests = 0;
-  for (const bool for_ever : {false, true})
-    for (std::int64_t k = 0; k < 1000; ++k) {
-      SCOPED_TRACE("request " + std::to_string(k) + (for_ever ? " and on" : ""));
-      Session session(kind);
-      auto problem = prepare(session);
-      session.host().fail_request(k, for_ever);
-      const SmStatus status = run(session, problem);
-      const bool met = session.host().stop_failing() > 0;
-      requests = k;
-      if (!met) {
-        EXPECT_EQ(status, SM_OK);
-        break;
-      }
-      EXPECT_TRUE(refused(status)) << "status " << status;
-      if (status == SM_OK) {
-        EXPECT_EQ(answer(problem), want);
-      }
-      EXPECT_EQ(run(session, problem), SM_OK);
+  return refuse_each_request(kind, prepare, run, [&](Session& session, auto& problem, SmStatus status, std::int64_t) {
+    EXPECT_TRUE(refused(status)) << "status " << status;
+    if (status == SM_OK) {
       EXPECT_EQ(answer(problem), want);
-      EXPECT_GE(session.host().live_blocks(), blocks);
-      EXPECT_LE(session.host().live_blocks(), blocks + spare);
-      session.close();
-      EXPECT_EQ(session.host().live_pools(), 0);
-      EXPECT_EQ(session.host().violations(), 0);
     }
-  return requests;
+    EXPECT_EQ(run(session, problem), SM_OK);
+    EXPECT_EQ(answer(problem), want);
+    EXPECT_GE(session.host().live_blocks(), blocks);
+    EXPECT_LE(session.host().live_blocks(), blocks + spare);
+  });
 }
 
 inline bool is_no_memory(SmStatus status) { return status == SM_NO_MEMORY; }
