@@ -128,9 +128,9 @@ void report_answers(Report& report, const std::string& name, const std::vector<A
     worst = std::max(worst, answer.residual);
     finite = finite && !is_broken(answer);
   }
-  report.add("largest_residual", finite ? Json(worst) : Json(), "largest residual",
-             finite ? fmt::format("{:.3e} (||b - A x|| / (||A|| ||x|| + ||b||), infinity norms)", worst)
-                    : "not finite");
+  report.add(
+      "largest_residual", finite ? Json(worst) : Json(), "largest residual",
+      finite ? fmt::format("{:.3e} (||b - A x|| / (||A|| ||x|| + ||b||), infinity norms)", worst) : "not finite");
   blame(report, name, answers);
 }
 

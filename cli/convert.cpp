@@ -25,8 +25,7 @@ Report run_convert(const ConvertOptions& options, const CommonOptions& common, P
   ModuleSession& session = run.session();
   SmMatrix* const source = module_matrix(session, matrix, form_in_file(matrix), run.clock());
   SmMatrix* const target = new_matrix(session, target_form(options.to, matrix));
-  const SmStatus status =
-      run.clock().timed("converting", [&] { return session.fn().qxsmconvert(source, target, 0); });
+  const SmStatus status = run.clock().timed("converting", [&] { return session.fn().qxsmconvert(source, target, 0); });
   session.expect_ok(status, "converting the matrix");
   const std::int64_t count = write_matrix(output.get(), *target, comment_text(matrix.name + ", converted"));
   run.report().add("to", options.to, "to", fmt::format("{} ({})", options.to, kind_text(*target)));

@@ -86,7 +86,9 @@ std::vector<Verdict> judge(Run& run, Factorization& factor, std::span<const doub
 }
 
 std::string verdict_text(const Verdict& verdict) {
-  const char* const pivots = verdict.pivots == ByPivots::estimable ? "yes" : verdict.pivots == ByPivots::open ? "open" : "no";
+  const char* const pivots = verdict.pivots == ByPivots::estimable ? "yes"
+                             : verdict.pivots == ByPivots::open    ? "open"
+                                                                   : "no";
   return fmt::format("{} (pivots {}, Hermite form {}, check {})", verdict.estimable() ? "estimable" : "not estimable",
                      pivots, verdict.hermite ? "yes" : "no", verdict.check ? "yes" : "no");
 }
@@ -109,8 +111,9 @@ void report_verdicts(Report& report, const std::string& name, const std::vector<
   }
   if (verdicts.size() > kShown) report.add_text("...", fmt::format("{} more", verdicts.size() - kShown));
   report.add_json("rows_of_l", std::move(list));
-  report.add("not_estimable", failing, "not estimable",
-             failing.empty() ? "none" : fmt::format("{} of {}: {}", failing.size(), verdicts.size(), list_text(failing)));
+  report.add(
+      "not_estimable", failing, "not estimable",
+      failing.empty() ? "none" : fmt::format("{} of {}: {}", failing.size(), verdicts.size(), list_text(failing)));
   if (failing.empty()) return;
   report.fail({.code = ExitCode::no,
                .file = name,

@@ -75,7 +75,8 @@ void Factorization::solve(const double* b, double* x, std::int64_t count) {
 std::vector<double> Factorization::inverse_diagonal() {
   std::vector<double> diagonal(static_cast<std::size_t>(order_));
   if (order_ == 0) return diagonal;
-  const SmStatus status = clock_.timed("inverting", [&] { return session_.fn().qxsminvdiag(matrix_, diagonal.data()); });
+  const SmStatus status =
+      clock_.timed("inverting", [&] { return session_.fn().qxsminvdiag(matrix_, diagonal.data()); });
   session_.expect_ok(status, "computing the diagonal of the inverse");
   return diagonal;
 }

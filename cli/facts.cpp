@@ -82,7 +82,8 @@ void report_first_values(Report& report, const char* label, std::span<const doub
   const std::size_t shown = std::min(kShown, values.size());
   for (std::size_t i = 0; i < shown; ++i) report.add_text(fmt::format("{} {}", label, i + 1), number_text(values[i]));
   if (values.size() > shown) report.add_text("...", fmt::format("{} more", values.size() - shown));
-  report.add_json("first_values", std::vector<double>(values.begin(), values.begin() + static_cast<std::ptrdiff_t>(shown)));
+  report.add_json("first_values",
+                  std::vector<double>(values.begin(), values.begin() + static_cast<std::ptrdiff_t>(shown)));
 }
 
 void report_written(Report& report, const OutputFile* output, const char* label, const std::string& shape) {

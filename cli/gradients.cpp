@@ -13,7 +13,7 @@ namespace {
 // What the module's callback tells.
 struct Watch {
   Progress& progress;
-  double first = 0.0;                     // r' M r for x = 0
+  double first = 0.0;                      // r' M r for x = 0
   std::vector<double>* history = nullptr;  // null: not kept
 
   double part(double rho) const { return rho == 0.0 ? 0.0 : std::sqrt(rho / first); }

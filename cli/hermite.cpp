@@ -1,3 +1,5 @@
+#include "cli/hermite.hpp"
+
 #include <fmt/format.h>
 
 #include <cmath>
@@ -5,7 +7,6 @@
 #include "cli/commands.hpp"
 #include "cli/facts.hpp"
 #include "cli/format.hpp"
-#include "cli/hermite.hpp"
 #include "cli/matrix_output.hpp"
 
 namespace sm::cli {

@@ -95,21 +95,21 @@ LoadedMatrix load_matrix(const std::string& path, std::uint64_t limit, Progress&
 void require_symmetric(LoadedMatrix& matrix, const char* why) {
   const Header& header = matrix.header;
   if (header.rows != header.cols) {
-    throw CommandError(
-        {.file = matrix.name,
-         .line = header.size_line,
-         .what = fmt::format("found {} rows and {} columns", header.rows, header.cols),
-         .expected = "a square matrix",
-         .advice = std::string(why) + "; for least squares give the normal equations X'X"});
+    throw CommandError({.file = matrix.name,
+                        .line = header.size_line,
+                        .what = fmt::format("found {} rows and {} columns", header.rows, header.cols),
+                        .expected = "a square matrix",
+                        .advice = std::string(why) + "; for least squares give the normal equations X'X"});
   }
   if (matrix.upper_only) return;
   const SymmetryCheck check = check_symmetry(matrix.rows);
   if (!check.values) {
-    throw CommandError({.file = matrix.name,
-                        .what = fmt::format("found {} at ({}, {}) and {} at ({}, {})", check.below, check.row + 1,
-                                            check.col + 1, check.above, check.col + 1, check.row + 1),
-                        .expected = "a symmetric matrix",
-                        .advice = std::string(why) + "; make the two equal, or write one triangle and symmetric in line 1"});
+    throw CommandError(
+        {.file = matrix.name,
+         .what = fmt::format("found {} at ({}, {}) and {} at ({}, {})", check.below, check.row + 1, check.col + 1,
+                             check.above, check.col + 1, check.row + 1),
+         .expected = "a symmetric matrix",
+         .advice = std::string(why) + "; make the two equal, or write one triangle and symmetric in line 1"});
   }
   keep_upper_triangle(matrix.rows);
   matrix.upper_only = true;

@@ -35,7 +35,8 @@ ExitCode run(int argc, const char* const* argv) {
     return ExitCode::fine;
   }
   if (options.common.json && options.output_is_taken()) {
-    throw CommandError({.what = "--json and the result both want standard output", .advice = "send the result to a file"});
+    throw CommandError(
+        {.what = "--json and the result both want standard output", .advice = "send the result to a file"});
   }
   return print(options, run_command(options));
 }

@@ -51,8 +51,8 @@ std::string kind_text(const SmMatrix& matrix) {
 }
 
 std::int64_t write_matrix(OutputFile* out, const SmMatrix& matrix, const std::string& comment) {
-  const std::int64_t count = matrix.format == SM_FORMAT_SPARSE ? write_coordinates(out, matrix, comment)
-                                                               : write_values(out, matrix, comment);
+  const std::int64_t count =
+      matrix.format == SM_FORMAT_SPARSE ? write_coordinates(out, matrix, comment) : write_values(out, matrix, comment);
   if (out) out->finish();
   return count;
 }

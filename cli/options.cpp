@@ -91,9 +91,10 @@ void add_file(CLI::App& command, std::string& path, const char* name = "A.mtx", 
 void add_output(CLI::App& command, Options& options, const char* name, const std::string& what) {
   command
       .add_option("-o,--output", options.common.output,
-                  what + "\nwith 17 digits; gzip when the name ends in .gz.\n"
-                         "- is standard output; the report then goes to\n"
-                         "standard error")
+                  what +
+                      "\nwith 17 digits; gzip when the name ends in .gz.\n"
+                      "- is standard output; the report then goes to\n"
+                      "standard error")
       ->type_name(name);
 }
 
@@ -192,7 +193,8 @@ void add_quad(CLI::App& app, Options& options) {
   add_file(*command, options.quad.rows, "X.mtx", "The rows of the form; as many columns as A");
   command->add_flag("--inverse", options.quad.inverse, "X A^- X' instead of X A X'; A is factored");
   add_output(*command, options, "F.mtx",
-             "Write the form as a symmetric Matrix Market\nfile: coordinates for a sparse X without\n--inverse, else an array,");
+             "Write the form as a symmetric Matrix Market\nfile: coordinates for a sparse X without\n--inverse, else "
+             "an array,");
   add_common(*command, options);
 }
 
@@ -301,9 +303,8 @@ std::string help_command(const CLI::App& app) {
   if (app.get_subcommands().empty() && word != argv + argc) {
     std::vector<std::string> names;
     for (const CLI::App* command : app.get_subcommands({})) names.push_back(command->get_name());
-    throw CommandError({.what = "found the subcommand " + quote(*word),
-                        .expected = alternatives(names),
-                        .advice = "see qxsm --help"});
+    throw CommandError(
+        {.what = "found the subcommand " + quote(*word), .expected = alternatives(names), .advice = "see qxsm --help"});
   }
   throw CommandError({.what = error.what(), .advice = "see " + help_command(app)});
 }

@@ -49,7 +49,7 @@ class Progress {
   std::atomic<double> fraction_{-1.0};
   std::atomic<double> residual_{0.0};
   std::atomic<std::int64_t> step_{0};  // 0: no iteration runs
-  std::mutex mutex_;  // guards the rest
+  std::mutex mutex_;                   // guards the rest
   std::condition_variable wake_;
   std::string phase_;
   std::chrono::steady_clock::time_point phase_start_;

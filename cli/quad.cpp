@@ -50,8 +50,7 @@ SmMatrix* plain_form(Run& run, const LoadedMatrix& x) {
   SmMatrix* const a = sparse_matrix(session, run.matrix(), run.clock());
   SmMatrix* const rows = module_matrix(session, x, form, run.clock());
   SmMatrix* const result = new_matrix(session, dense ? Form{SM_KIND_SYMMETRIC, SM_FORMAT_COLUMNS} : kSymmetricSparse);
-  const SmStatus status =
-      run.clock().timed("multiplying", [&] { return session.fn().qxsmquad(a, rows, result, 0); });
+  const SmStatus status = run.clock().timed("multiplying", [&] { return session.fn().qxsmquad(a, rows, result, 0); });
   session.expect_ok(status, "computing the form");
   return result;
 }
@@ -93,8 +92,7 @@ void report_form(Run& run, SmMatrix& form, OutputFile* output, const std::string
                    fmt::format("{} x {}, {} values in its lower triangle", form.rows, form.rows, count));
   run.report().add_json("form_values", count);
   report_first_values(run.report(), "diagonal", diagonal);
-  report_written(run.report(), output, "written",
-                 fmt::format("{} x {} ({})", form.rows, form.rows, kind_text(form)));
+  report_written(run.report(), output, "written", fmt::format("{} x {} ({})", form.rows, form.rows, kind_text(form)));
 }
 
 }  // namespace
@@ -111,7 +109,8 @@ Report run_quad(const QuadOptions& options, const CommonOptions& common, Progres
   SmMatrix* const form = options.inverse ? inverse_form(run, x) : plain_form(run, x);
   if (!form) return run.finish();
   if (is_finite(*form)) {
-    report_form(run, *form, output.get(), comment_text(fmt::format("{}, A in {}, X in {}", of, run.matrix().name, x.name)));
+    report_form(run, *form, output.get(),
+                comment_text(fmt::format("{}, A in {}, X in {}", of, run.matrix().name, x.name)));
   } else {
     report_overflow(run, "the form overflows");
   }

@@ -77,8 +77,8 @@ Report run_solve(const SolveOptions& options, const CommonOptions& common, Progr
   const std::string& blamed = options.right_hand_sides.empty() ? name : options.right_hand_sides;
   report_right_hand_sides(run.report(), options, b.count);
   std::vector<double> x(b.values.size());
-  const bool solved = options.method == "cg" ? solve_iterative(run, options, blamed, b, x)
-                                             : solve_direct(run, blamed, b, x);
+  const bool solved =
+      options.method == "cg" ? solve_iterative(run, options, blamed, b, x) : solve_direct(run, blamed, b, x);
   if (!solved) return run.finish();
   if (output) write_array(*output, b.rows, b.count, x.data(), comment_text("solution of A x = b, A in " + name));
   report_written(run.report(), output.get(), "solution", fmt::format("{} x {}", b.rows, b.count));

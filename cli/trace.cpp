@@ -71,10 +71,8 @@ void report_trace(Run& run, double trace, const std::string& of) {
   run.report().add("trace", finite ? Json(trace) : Json(), fmt::format("tr({})", of),
                    finite ? number_text(trace) : "not finite");
   if (finite) return;
-  run.report().fail({.code = ExitCode::no,
-                     .file = run.matrix().name,
-                     .what = "the trace overflows",
-                     .advice = "scale the matrices"});
+  run.report().fail(
+      {.code = ExitCode::no, .file = run.matrix().name, .what = "the trace overflows", .advice = "scale the matrices"});
 }
 
 }  // namespace

@@ -108,7 +108,7 @@ TEST_F(EstimableCommand, agrees_with_dense_elimination_on_a_two_way_layout) {
     EXPECT_EQ(verdict.at("estimable"), want) << k;
     EXPECT_EQ(verdict.at("hermite"), want) << k;
     EXPECT_EQ(verdict.at("check"), want) << k;
-    if (!verdict.at("pivots").is_null()) EXPECT_EQ(verdict.at("pivots"), want) << k;
+    EXPECT_TRUE(verdict.at("pivots").is_null() || verdict.at("pivots") == want) << k;
   }
   // The differences within either factor, 3 + 6, and the 8 rows of A.
   EXPECT_EQ(passed, 17u);

@@ -102,6 +102,39 @@ TEST_F(StandardStreams, a_long_run_shows_its_phase_on_a_terminal_and_takes_it_aw
   for (const int file : {terminal, program_side, input[0]}) close(file);
 }
 
+// Iterates for about two seconds, as long as a first run tells that takes; the line appears after half a second.
+TEST_F(StandardStreams, conjugate_gradients_show_their_residual_on_a_terminal) {
+  const auto arguments = [&](long steps) {
+    return std::vector<std::string>{"solve",  shipped("bcsstk13.mtx"), "--method",           "cg", "--tolerance", "0",
+                                    "--json", "--max-iterations",      std::to_string(steps)};
+  };
+  const auto json = qxsm(arguments(500)).json();
+  double seconds = 0.0;
+  for (const auto& phase : json.at("phases"))
+    seconds += phase.at("name") == "iterating" ? phase.at("seconds").get<double>() : 0.0;
+  ASSERT_GT(seconds, 0.0);
+  int terminal = -1;
+  int program_side = -1;
+  ASSERT_EQ(openpty(&terminal, &program_side, nullptr, nullptr, nullptr), 0);
+  fcntl(terminal, F_SETFD, FD_CLOEXEC);
+  const Outcome run =
+      qxsm(arguments(static_cast<long>(500 * 2.0 / seconds)), {.err_file = program_side, .terminal = "xterm"});
+  EXPECT_EQ(run.code, 1) << "a tolerance of 0 is not reached";
+  fcntl(terminal, F_SETFL, O_NONBLOCK);
+  std::array<char, 4096> rest{};
+  std::string screen;
+  for (ssize_t got = ::read(terminal, rest.data(), rest.size()); got > 0;
+       got = ::read(terminal, rest.data(), rest.size())) {
+    screen.append(rest.data(), static_cast<std::size_t>(got));
+  }
+  const std::size_t line = screen.find("conjugate gradients ... ");
+  ASSERT_NE(line, std::string::npos) << screen;
+  EXPECT_LT(screen.find(", step ", line), screen.find(", residual ", line));
+  EXPECT_NE(screen.find(", residual ", line), std::string::npos) << screen;
+  EXPECT_EQ(run.out.find('\x1b'), std::string::npos);
+  for (const int file : {terminal, program_side}) close(file);
+}
+
 TEST_F(StandardStreams, nothing_but_messages_goes_to_a_standard_error_that_is_no_terminal) {
   const std::string grid = path("grid.mtx");
   ASSERT_EQ(qxsm({"grid", "400", "400", "-o", grid}).code, 0);
