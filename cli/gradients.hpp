@@ -1,5 +1,5 @@
-// Solutions by conjugate gradients, through the module, one right-hand side at a time: each has its own history, and one
-// that does not converge does not keep the others from being solved.
+// Solutions by conjugate gradients, through the module, one right-hand side at a time: each has its own history, and
+// one that does not converge does not keep the others from being solved.
 #pragma once
 
 #include <cstdint>

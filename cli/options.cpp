@@ -193,8 +193,9 @@ void add_quad(CLI::App& app, Options& options) {
   add_file(*command, options.quad.rows, "X.mtx", "The rows of the form; as many columns as A");
   command->add_flag("--inverse", options.quad.inverse, "X A^- X' instead of X A X'; A is factored");
   add_output(*command, options, "F.mtx",
-             "Write the form as a symmetric Matrix Market\nfile: coordinates for a sparse X without\n--inverse, else "
-             "an array,");
+             "Write the form as a symmetric Matrix Market\n"
+             "file: an array with --inverse or for a general\n"
+             "array X, else coordinates;");
   add_common(*command, options);
 }
 
