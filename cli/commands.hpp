@@ -83,7 +83,7 @@ Report run_trace(const TraceOptions& options, const CommonOptions& common, Progr
 Report run_hermite(const HermiteOptions& options, const CommonOptions& common, Progress& progress);
 Report run_estimable(const EstimableOptions& options, const CommonOptions& common, Progress& progress);
 Report run_convert(const ConvertOptions& options, const CommonOptions& common, Progress& progress);
-Report run_grid(const GridOptions& options, const CommonOptions& common);
+Report run_grid(const GridOptions& options, const CommonOptions& common, Progress& progress);
 
 // A b is called inconsistent with a singular A when its relative residual is above this.
 constexpr double kInconsistent = 1e-10;

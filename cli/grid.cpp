@@ -26,7 +26,7 @@ void write_points(OutputFile& out, const GridOptions& grid) {
 
 }  // namespace
 
-Report run_grid(const GridOptions& options, const CommonOptions& common) {
+Report run_grid(const GridOptions& options, const CommonOptions& common, Progress&) {
   std::int64_t order = 0;
   std::int64_t entries = 0;
   if (__builtin_mul_overflow(options.nx, options.ny, &order) || __builtin_mul_overflow(order, 3, &entries)) {

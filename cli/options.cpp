@@ -74,13 +74,17 @@ class HelpFormatter : public CLI::Formatter {
   }
 };
 
-// A subcommand without options as yet. `run` has no captures: it outlives the parser.
-CLI::App* add_command(CLI::App& app, Options& options, const char* name, const char* description,
-                      Report (*run)(const Options& options, Progress& progress)) {
+// A subcommand, which calls run(its options, ...), without options as yet.
+template <auto run, auto its_options>
+CLI::App* add_command(CLI::App& app, Options& options, const char* name, const char* description) {
   CLI::App* command = app.add_subcommand(name, description);
   command->footer(help::kExitCodes);
   command->set_help_flag("-h,--help", "Print this help and exit");
-  command->callback([&options, run] { options.run = run; });
+  command->callback([&options] {
+    options.run = [](const Options& given, Progress& progress) {
+      return run(given.*its_options, given.common, progress);
+    };
+  });
   return command;
 }
 
@@ -121,9 +125,7 @@ void add_common(CLI::App& command, Options& options) {
 }
 
 void add_info(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, options, "info", help::kInfo, [](const Options& o, Progress& progress) {
-    return run_info(o.info, o.common, progress);
-  });
+  CLI::App* command = add_command<run_info, &Options::info>(app, options, "info", help::kInfo);
   add_file(*command, options.info.matrix);
   command->add_flag("--fill", options.info.fill,
                     "Also order the matrix and count the entries of\n"
@@ -133,17 +135,13 @@ void add_info(CLI::App& app, Options& options) {
 }
 
 void add_factor(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, options, "factor", help::kFactor, [](const Options& o, Progress& progress) {
-    return run_factor(o.factor, o.common, progress);
-  });
+  CLI::App* command = add_command<run_factor, &Options::factor>(app, options, "factor", help::kFactor);
   add_file(*command, options.factor.matrix);
   add_common(*command, options);
 }
 
 void add_solve(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, options, "solve", help::kSolve, [](const Options& o, Progress& progress) {
-    return run_solve(o.solve, o.common, progress);
-  });
+  CLI::App* command = add_command<run_solve, &Options::solve>(app, options, "solve", help::kSolve);
   add_file(*command, options.solve.matrix);
   command
       ->add_option("-b,--rhs", options.solve.right_hand_sides,
@@ -177,18 +175,14 @@ void add_solve(CLI::App& app, Options& options) {
 }
 
 void add_invdiag(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, options, "invdiag", help::kInvdiag, [](const Options& o, Progress& progress) {
-    return run_invdiag(o.invdiag, o.common, progress);
-  });
+  CLI::App* command = add_command<run_invdiag, &Options::invdiag>(app, options, "invdiag", help::kInvdiag);
   add_file(*command, options.invdiag.matrix);
   add_output(*command, options, "D.mtx", "Write the diagonal as a Matrix Market array of\none column");
   add_common(*command, options);
 }
 
 void add_quad(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, options, "quad", help::kQuad, [](const Options& o, Progress& progress) {
-    return run_quad(o.quad, o.common, progress);
-  });
+  CLI::App* command = add_command<run_quad, &Options::quad>(app, options, "quad", help::kQuad);
   add_file(*command, options.quad.matrix);
   add_file(*command, options.quad.rows, "X.mtx", "The rows of the form; as many columns as A");
   command->add_flag("--inverse", options.quad.inverse, "X A^- X' instead of X A X'; A is factored");
@@ -200,9 +194,7 @@ void add_quad(CLI::App& app, Options& options) {
 }
 
 void add_trace(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, options, "trace", help::kTrace, [](const Options& o, Progress& progress) {
-    return run_trace(o.trace, o.common, progress);
-  });
+  CLI::App* command = add_command<run_trace, &Options::trace>(app, options, "trace", help::kTrace);
   add_file(*command, options.trace.matrix);
   command->add_option("B.mtx", options.trace.other, "The second matrix of a product, if any")->type_name("");
   command->add_flag("--inverse", options.trace.inverse,
@@ -212,18 +204,14 @@ void add_trace(CLI::App& app, Options& options) {
 }
 
 void add_hermite(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, options, "hermite", help::kHermite, [](const Options& o, Progress& progress) {
-    return run_hermite(o.hermite, o.common, progress);
-  });
+  CLI::App* command = add_command<run_hermite, &Options::hermite>(app, options, "hermite", help::kHermite);
   add_file(*command, options.hermite.matrix);
   add_output(*command, options, "H.mtx", "Write H as Matrix Market coordinates");
   add_common(*command, options);
 }
 
 void add_estimable(CLI::App& app, Options& options) {
-  CLI::App* command =
-      add_command(app, options, "estimable", help::kEstimable,
-                  [](const Options& o, Progress& progress) { return run_estimable(o.estimable, o.common, progress); });
+  CLI::App* command = add_command<run_estimable, &Options::estimable>(app, options, "estimable", help::kEstimable);
   add_file(*command, options.estimable.matrix);
   add_file(*command, options.estimable.rows, "L.mtx", "The rows to be tested; as many columns as A");
   command
@@ -237,9 +225,7 @@ void add_estimable(CLI::App& app, Options& options) {
 }
 
 void add_convert(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, options, "convert", help::kConvert, [](const Options& o, Progress& progress) {
-    return run_convert(o.convert, o.common, progress);
-  });
+  CLI::App* command = add_command<run_convert, &Options::convert>(app, options, "convert", help::kConvert);
   add_file(*command, options.convert.matrix, "IN.mtx");
   add_file(*command, options.common.output, "OUT.mtx",
            "Where to write it, with 17 digits; gzip when the\n"
@@ -258,8 +244,7 @@ void add_convert(CLI::App& app, Options& options) {
 }
 
 void add_grid(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, options, "grid", help::kGrid,
-                                  [](const Options& o, Progress&) { return run_grid(o.grid, o.common); });
+  CLI::App* command = add_command<run_grid, &Options::grid>(app, options, "grid", help::kGrid);
   command->add_option("NX", options.grid.nx, "Points in the first direction")
       ->required()
       ->check(count())
