@@ -80,8 +80,8 @@ QXESM_API SmStatus qxsminv(SmMatrix* a, int16_t in_place, double tolerance);
  *   A symmetric sparse  H general; A is factored; elements of magnitude 1.11e-12 or less are not stored
  *   A diagonal          H general or diagonal; A is inverted beside its values
  * Answers: 0 with nothing done (empty); 1; 113; 104 (H is A); 111; 110 (kind of H); 124 (kind of A); 123 (a diagonal A
- * could not be inverted); 101; those of qxsminv, qxsmmultm, qxsmfact, qxsmsubst; 0. The answer of sizing H is passed
- * over, and for a sparse or diagonal A that of entering its elements too: H then lacks those that found no place.
+ * could not be inverted); 101 and 105 (H lacks elements for want of memory); those of qxsminv, qxsmmultm, qxsmfact,
+ * qxsmsubst; 0. Other answers of sizing H and of entering its elements are passed over.
  * Cost, sparse: a solve and a pass over A for each column. */
 QXESM_API SmStatus qxsmhermite(SmMatrix* a, SmMatrix* h);
 
