@@ -13,8 +13,8 @@
 
 namespace sm {
 
-// What is known of a degree. A bound is from below. An unchecked vertex may have no claim to be in the lists at all.
-enum class Known : i64 { exact = 0, bound = 1, unchecked = 2 };
+// What is known of a degree: itself, or a bound from below.
+enum class Known : i64 { exact = 0, bound = 1 };
 
 // Node has the members child, sibling, before and degree, reached as graph[v].vertex.
 template <class Index, class Node>
@@ -29,12 +29,12 @@ class DegreeLists {
   }
 
   bool holds(Index v) const { return at(v).before != kOutside; }
-  Known known(Index v) const { return static_cast<Known>(time_[v] & 3); }
+  Known known(Index v) const { return static_cast<Known>(time_[v] & 1); }
   Index least() const { return least_; }
 
   void insert_newest(Index v, Index degree, Known known) {
     time_[v] = clock_ | static_cast<i64>(known);
-    clock_ += 4;
+    clock_ += 2;
     Index& head = head_[degree];
     auto& entry = at(v);
     entry.degree = degree;
@@ -48,7 +48,7 @@ class DegreeLists {
 
   // A vertex that has left the lists comes back with its degree, at the time that it had.
   void insert_late(Index v, Index degree, Known known) {
-    time_[v] = (time_[v] & ~i64{3}) | static_cast<i64>(known);
+    time_[v] = (time_[v] & ~i64{1}) | static_cast<i64>(known);
     auto& entry = at(v);
     entry.degree = degree;
     entry.child = entry.sibling = entry.before = kNone;

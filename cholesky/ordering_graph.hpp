@@ -1,8 +1,38 @@
-// DRAFT HEAD
+// The quotient graph of the minimum-degree ordering, for any number of vertices with very many neighbours.
+//
+// It gives the permutation of the plain road (ordering_plain.cpp), and rests on what that one's lists amount to:
+// - The list of a vertex is: the elements that it lies in, the newest first, then those of its neighbours that no
+//   element covers, in their first order. Nothing is ever put between them.
+// - The boundary of an element is: its ordinary vertices in the order in which the list of the pivot led to them, then
+//   the prototypes.
+// - The degree of a vertex is the exact size of a set, so it does not matter when it is counted, as long as no
+//   elimination has touched the vertex in between: and one that changes the set touches it.
+// - Ties of the least degree go to the vertex whose degree was due last.
+//
+// What is walked less, and why nothing changes:
+// - Neighbours are never unlinked. An uneliminated one is covered exactly if an element of the pivot leads to it, and
+//   elements come first, so its mark tells. How many are left is counted: an edge is looked for from its end of lower
+//   degree when both ends lie in a new boundary (an orientation that leaves any vertex few edges of its own: Chiba and
+//   Nishizeki, "Arboricity and subgraph listing algorithms", SIAM J. Comput. 14 (1985) 210-223).
+// - Absorbed elements stay on the lists, marked, until a list is walked for another reason or full. How many elements
+//   of a vertex are left is counted while their boundaries are read, for the last time, into the new one.
+// - The two counts tell what the plain road reads off a list: a vertex without any is interior, one with a single
+//   element and nothing else is a prototype or a duplicate. So the list of a vertex in very many elements (a hub) need
+//   not be walked at all. Other lists are, to count for each of their elements how much of its boundary is outside the
+//   new one (Amestoy, Davis, Duff, "An approximate minimum degree ordering algorithm", SIAM J. Matrix Anal. Appl. 17
+//   (1996) 886-905). With k hubs passed over, that number may be too large by k.
+// - Degrees are bounded: from above by the sum of these numbers, from below by their maximum and by the former bound
+//   less what has been eliminated since. Where the bounds meet the degree is known. Else the lower one enters the degree
+//   lists, with the time when the degree was due, and the count waits until it is the least of all.
+// - A vertex that a prototype outmatches has at least its degree and an earlier time, so that it is never taken before
+//   the prototype, which touches it: whether it is in the lists makes no difference.
+//
+// Everything is in one block: a node for each vertex (and the element that it becomes), both directions of the edges,
+// 3/2 cells for each neighbour of a vertex for its elements, so that making room by dropping the absorbed ones is paid
+// by what came before, and an arena for the boundaries. Elements and vertices never take more than the slots of the
+// edges that they replace, so boundaries fill at most one number an edge, with their headers two; three, and two a
+// vertex for the boundary that is being made, keep the packing of the arena rare.
 #pragma once
-#ifndef ORDERING_WALKED
-#define ORDERING_WALKED 32
-#endif
 
 #include <algorithm>
 #include <type_traits>
@@ -14,12 +44,12 @@ namespace sm {
 
 template <class Index>
 struct GraphVertex {
-  Index mark;      // the stamp of the last visit; kGone once eliminated
-  Index vertices;  // neighbours that no element covers
-  Index elements;  // elements that it lies in, but for absorbed ones
-  Index cells;     // elements on its list, absorbed ones included
+  Index mark;                    // the stamp of the last visit; kGone once eliminated
+  Index vertices;                // neighbours that no element covers
+  Index elements;                // elements that it lies in, but for absorbed ones
+  Index cells;                   // elements on its list, absorbed ones included
   Index child, sibling, before;  // degree lists
-  Index degree;    // 1 + neighbours, or less while only a bound is known
+  Index degree;                  // 1 + neighbours, or less while only a bound is known
 };
 
 template <class Index>
@@ -58,7 +88,7 @@ class OrderingGraph {
   using Element = GraphElement<Index>;
   static constexpr Index kGone = static_cast<Index>(-1);
   // Lists of more elements are not walked at each elimination beside them.
-  static constexpr Index kWalked = ORDERING_WALKED;
+  static constexpr Index kWalked = 16;
 
   Vertex& vertex(Index v) const { return graph_[v].vertex; }
   Element& element(Index e) const { return graph_[e].element; }
@@ -70,8 +100,7 @@ class OrderingGraph {
   void own_edges();
   void next_stamp();
   Index take_minimum();
-  Index count_degree(Index v);
-  bool is_outmatched(Index v);
+  Index count_degree(Index v, Index enough);
   void number(Index v) {
     vertex(v).mark = kGone;
     perm_[ordered_++] = static_cast<i64>(v);
@@ -203,61 +232,36 @@ template <class Index>
 Index OrderingGraph<Index>::take_minimum() {
   for (;;) {
     const Index v = lists_.first();
+    const Index least = vertex(v).degree;
     lists_.remove(v);
-    const Known known = lists_.known(v);
-    if (known == Known::exact) return v;
-    if (known == Known::unchecked && is_outmatched(v)) continue;
-    const Index degree = count_degree(v);
-    if (degree == lists_.least()) {
+    if (lists_.known(v) == Known::exact) return v;
+    const Index enough = 2 * least + 8;
+    const Index degree = count_degree(v, enough);
+    if (degree == least) {
       vertex(v).degree = degree;
       return v;
     }
-    lists_.insert_late(v, degree, Known::exact);
+    lists_.insert_late(v, degree, degree <= enough ? Known::exact : Known::bound);
   }
 }
 
-// Whether an element of the vertex was claimed when the newest of them was formed. The prototypes of then are untouched,
-// or were touched through an element that this vertex does not lie in.
+// 1 + the number of neighbours, or a number above `enough` once there are more than that.
 template <class Index>
-bool OrderingGraph<Index>::is_outmatched(Index v) {
-  const Index* list = elements_of(v);
-  const Index cells = vertex(v).cells;
-  const Element& newest = element(list[cells - 1]);
-  if (newest.prototypes == 0) return false;
-  next_stamp();
-  const Index* end = arena_ + newest.begin + newest.size;
-  for (const Index* p = end - newest.prototypes; p != end; ++p) {
-    const Index* its = elements_of(*p);
-    for (Index k = 0; k < vertex(*p).cells; ++k) element(its[k]).claimed = stamp_;
-  }
-  for (Index k = 0; k + 1 < cells; ++k) {
-    const Element& e = element(list[k]);
-    if (e.size != 0 && e.claimed == stamp_) return true;
-  }
-  return false;
-}
-
-template <class Index>
-Index OrderingGraph<Index>::count_degree(Index v) {
+Index OrderingGraph<Index>::count_degree(Index v, Index enough) {
   next_stamp();
   Vertex& mine = vertex(v);
   mine.mark = stamp_;
   Index degree = mine.vertices + 1;
-  Index* list = elements_of(v);
-  Index kept = 0;
-  for (Index k = 0; k < mine.cells; ++k) {
+  const Index* list = elements_of(v);
+  for (Index k = mine.cells; k-- > 0 && degree <= enough;) {
     const Element& e = element(list[k]);
-    if (e.size == 0) continue;
-    list[kept++] = list[k];
     const Index* boundary = arena_ + e.begin;
     for (Index b = 0; b < e.size; ++b) {
       Index& mark = vertex(boundary[b]).mark;
-      if (mark == stamp_) continue;
+      degree += mark != stamp_;
       mark = stamp_;
-      ++degree;
     }
   }
-  mine.cells = kept;
   return degree;
 }
 
@@ -417,7 +421,7 @@ template <class Index>
 void OrderingGraph<Index>::update_degree(Index v, const Element& made) {
   Vertex& mine = vertex(v);
   if (mine.elements > kWalked + 1) {
-    lists_.insert_newest(v, mine.degree, Known::unchecked);
+    lists_.insert_newest(v, mine.degree, Known::bound);
     return;
   }
   const bool prototype = mine.elements == 2 && mine.vertices == 0;

@@ -21,6 +21,7 @@ add_library(qxesm_objects OBJECT
   cholesky/inverse_diagonal.cpp
   cholesky/numeric.cpp
   cholesky/ordering.cpp
+  cholesky/ordering_plain.cpp
   cholesky/reorder.cpp
   cholesky/solve.cpp
   cholesky/symbolic.cpp
