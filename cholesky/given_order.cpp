@@ -1,4 +1,4 @@
-// An ordering that the caller brings, and what it shares with the computed one: who may be ordered, and the workspace.
+// An ordering that the caller brings, and what any ordering asks first.
 #include <algorithm>
 
 #include "cholesky/ordering_steps.hpp"
@@ -8,23 +8,6 @@
 namespace sm {
 
 namespace {
-
-SmStatus next_workspace(SmMatrix& m) {
-  const double limit = static_cast<double>(SM_MAX_ELEMENTS);
-  if (m.work_capacity == 0) {
-    const i64 words_an_entry = 4 / m.factor_block;
-    const double first =
-        4.0 * static_cast<double>(m.rows) + static_cast<double>(m.nnz) * static_cast<double>(words_an_entry);
-    if (first > limit) return SM_TOO_LARGE;
-    m.work_capacity = static_cast<i64>(first);
-  }
-  give_back(m.pool, m.work);
-  const double capacity = static_cast<double>(m.work_capacity) + static_cast<double>(m.nnz);
-  if (capacity * static_cast<double>(m.factor_block) >= limit) return SM_TOO_LARGE;
-  m.work_capacity += m.nnz;
-  if (m.work_capacity < 1) return SM_TOO_LARGE;  // no size that this operation set
-  return allocate(m.pool, m.work_capacity, Fill::none, m.work);
-}
 
 // inverse <- the inverse of perm. False when perm names a row twice; the range of its elements has been checked.
 bool invert(const i64* perm, i64 n, i64* inverse) {
@@ -47,15 +30,6 @@ Gate may_order(const SmMatrix& m) {
   return {};
 }
 
-SmStatus grow_workspace(SmMatrix& m) {
-  const SmStatus status = next_workspace(m);
-  if (status != SM_OK) {
-    give_back(m.pool, m.work);
-    m.work_capacity = 0;
-  }
-  return status;
-}
-
 SmStatus order_as_given(SmMatrix& m, const i64* perm) {
   SM_PASS(may_order(m));
   const i64 n = m.rows;
@@ -67,7 +41,7 @@ SmStatus order_as_given(SmMatrix& m, const i64* perm) {
   if (!invert(perm, n, inverse.data())) return SM_BAD_ARGUMENT;
   SM_TRY(order.take(m.pool, n));
   std::copy_n(perm, n, order.data());
-  SM_TRY(grow_workspace(m));
+  SM_TRY(take_workspace(m, std::max<i64>(m.nnz - n, 0)));  // each row has its diagonal
   give_back(m.pool, m.perm);
   give_back(m.pool, m.inv_perm);
   m.perm = order.release();

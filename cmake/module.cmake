@@ -27,6 +27,7 @@ add_library(qxesm_objects OBJECT
   cholesky/numeric_blocked.cpp
   cholesky/numeric_rows.cpp
   cholesky/ordering.cpp
+  cholesky/ordering_plain.cpp
   cholesky/refill.cpp
   cholesky/reorder.cpp
   cholesky/solve.cpp

@@ -1,0 +1,26 @@
+// The roads of the minimum-degree ordering. Both give the same permutation for every pattern.
+#pragma once
+
+#include <cstdint>
+
+#include "frame/core.hpp"
+
+namespace sm {
+
+// The edges of a matrix's graph: entries above the diagonal, a repeated one counted once.
+struct EdgeCount {
+  i64 edges = 0;
+  bool repeated = false;
+};
+
+// Leaves in degree[i] the number of neighbours of row i. Both arrays have a word for each row.
+EdgeCount count_edges(const SmMatrix& m, i64* degree, i64* met);
+
+// Which road an ordering takes, and with how wide an index. Only tests ask for a certain one.
+enum class Road { best, narrow, wide, plain };
+[[nodiscard]] SmStatus order_by(SmMatrix& m, Road road);
+
+// With `half` words for each of two vectors in `work` and then a word for each row. False when the items do not fit.
+[[nodiscard]] bool order_plainly(const SmMatrix& m, i64* work, i64 half, i64* perm, i64* inv_perm);
+
+}  // namespace sm
