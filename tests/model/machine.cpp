@@ -20,6 +20,10 @@ const std::vector<Call>& all_calls() {
     add_solve_calls(calls);
     add_form_calls(calls);
     add_product_calls(calls);
+    add_inverse_form_calls(calls);
+    add_matrix_form_calls(calls);
+    add_update_calls(calls);
+    add_instance_calls(calls);
     add_trace_calls(calls);
     add_estimability_calls(calls);
     return calls;
@@ -127,6 +131,14 @@ std::string Machine::run(Index steps) {
   for (Model& m : records_)
     if (m.handle) text += "\n  record " + std::to_string(number(m)) + ": " + describe(m);
   return text;
+}
+
+std::string Machine::close() {
+  session_.close();
+  TestHost& host = session_.host();
+  if (host.live_pools() == 0 && host.live_blocks() == 0 && host.violations() == 0) return "";
+  return std::to_string(host.live_pools()) + " pools, " + std::to_string(host.live_blocks()) + " blocks left, " +
+         std::to_string(host.violations()) + " violations";
 }
 
 std::optional<SmStatus> not_readable(const Model& m) {
