@@ -65,8 +65,8 @@ void call_add_block(Machine& m) {
   // is not told how far the tolerance goes; and a block that is saved where it does not fit.
   if (!b || b->empty() || (!g->sparse() && !b->closed())) return;
   if (g->diagonal() && (off + b->rows != g->rows || (p && p->rows < b->rows))) return;
-  // Nor is it told whether a general B of another order than the block is refused for its kind or for its order.
-  if (g->symmetric() && b->general() && b->rows != g->rows - off) return;
+  // Nor is it told whether a general B is refused for its kind or for its place.
+  if (g->symmetric() && b->general() && (off < 0 || b->rows != g->rows - off)) return;
   const double factors[] = {1.0, -1.0, 0.5, 2.0};
   const double tolerances[] = {0.0, 0.0, kNan, -1.0, 2.0};
   const double s = factors[m.random.below(4)];
