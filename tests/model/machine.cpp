@@ -9,6 +9,12 @@ namespace {
 constexpr std::size_t kRecords = 7;
 }
 
+std::string situation(const Model& m) {
+  std::string text = std::to_string(m.kind) + "/" + std::to_string(m.format) + " state " + std::to_string(m.state);
+  if (m.dense() && m.state >= SM_STATE_FACTORED) text += m.separate ? " separate" : " in place";
+  return text + (m.lent ? " tied" : "");
+}
+
 const std::vector<Call>& all_calls() {
   static const std::vector<Call> list = [] {
     std::vector<Call> calls;
@@ -92,6 +98,7 @@ void Machine::compare_all() {
   for (Model& m : records_) {
     const std::string text = difference(m);
     if (!text.empty()) wrong("record " + std::to_string(number(m)) + ": " + text + "\n  model: " + describe(m));
+    if (m.handle) met_[situation(m)] += 1;
   }
   if (session_.host().violations() != 0) wrong("the host counts violations");
 }

@@ -39,6 +39,9 @@ class Wanted {
   std::vector<double> slack_;
 };
 
+// Kind, format, state, where the factor is, whether tied: "3/22 state 5 in place tied".
+std::string situation(const Model& m);
+
 struct Count {
   Index calls = 0;
   Index served = 0;  // answered 0
@@ -52,6 +55,8 @@ class Machine {
   // Destroys instance and extension; what they have left behind, or nothing.
   std::string close();
   const std::map<std::string, Count>& counts() const { return counts_; }
+  // How many calls met a record of that kind, format, state and place of the factor, anywhere in the pool.
+  const std::map<std::string, Index>& met() const { return met_; }
 
   // For the calls.
   Random random;
@@ -98,6 +103,7 @@ class Machine {
   std::deque<std::string> trail_;
   std::string name_;
   std::map<std::string, Count> counts_;
+  std::map<std::string, Index> met_;
   std::string wrong_;
 };
 

@@ -41,8 +41,13 @@ class ModelTest : public ::testing::TestWithParam<HostKind> {
       counts_[name].calls += count.calls;
       counts_[name].served += count.served;
     }
+    for (const auto& [situation, count] : machine.met()) met_[situation] += count;
+  }
+  void expect_met(const std::string& situation) {
+    EXPECT_GE(met_[situation], 10) << situation << " is met too rarely to be tested";
   }
   std::map<std::string, Count> counts_;
+  std::map<std::string, Index> met_;
 };
 INSTANTIATE_BOTH_HOSTS(ModelTest);
 
@@ -57,6 +62,14 @@ TEST_P(ModelTest, random_calls_agree_with_the_model) {
     EXPECT_GE(count.served, 50) << name << " is served too rarely to be tested";
   }
   EXPECT_GE(calls, 50000);
+  for (const char* type : {"2/21", "2/22", "2/23", "3/22", "3/23", "6/22", "6/23"})
+    expect_met(std::string(type) + " state 1");
+  for (const char* type : {"2/22", "2/23", "3/22", "3/23", "6/22", "6/23"})
+    for (const char* state : {" state 0 tied", " state 1 tied"}) expect_met(std::string(type) + state);
+  for (const char* state : {"0", "1", "2", "3", "4", "5"}) expect_met(std::string("3/21 state ") + state);
+  for (const char* type : {"3/22", "3/23", "6/22", "6/23"})
+    for (const char* state : {" state 5", " state 6"})
+      for (const char* place : {" separate", " in place"}) expect_met(std::string(type) + state + place);
 }
 
 TEST_P(ModelTest, seeds_that_once_failed_agree_with_the_model) {
