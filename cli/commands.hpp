@@ -26,6 +26,11 @@ struct FactorOptions {
   std::string matrix;
 };
 
+struct InvdiagOptions {
+  std::string matrix;
+  std::string output;  // empty: the diagonal is not written
+};
+
 struct SolveOptions {
   std::string matrix;
   std::string right_hand_sides;  // empty: b = A * 1
@@ -43,6 +48,7 @@ struct GridOptions {
 // Each throws CommandError when it cannot go on; a numerical "no" is a report with another exit code.
 Report run_info(const InfoOptions& options, const CommonOptions& common, Progress& progress);
 Report run_factor(const FactorOptions& options, const CommonOptions& common, Progress& progress);
+Report run_invdiag(const InvdiagOptions& options, const CommonOptions& common, Progress& progress);
 Report run_solve(const SolveOptions& options, const CommonOptions& common, Progress& progress);
 Report run_grid(const GridOptions& options);
 

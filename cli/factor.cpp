@@ -9,7 +9,7 @@ Report run_factor(const FactorOptions& options, const CommonOptions& common, Pro
   report_matrix(report, matrix);
   require_symmetric(matrix);
 
-  ModuleSession session(common.ceiling);
+  ModuleSession session(pool_ceiling(common));
   Factorization factorization(session, matrix.rows, progress);
   factorization.analyse();
   const bool factored = factorization.factor();

@@ -99,6 +99,14 @@ void Factorization::solve(const double* b, double* x, std::int64_t count) {
   timed("solving", all, flops);
 }
 
+std::vector<double> Factorization::inverse_diagonal() {
+  std::vector<double> diagonal(static_cast<std::size_t>(order_));
+  if (order_ == 0) return diagonal;
+  const SmStatus status = timed("inverting", [&] { return session_.fn().qxsminvdiag(matrix_, diagonal.data()); });
+  session_.expect_ok(status, "computing the diagonal of the inverse");
+  return diagonal;
+}
+
 std::vector<std::int64_t> Factorization::dropped_rows() const {
   std::vector<std::int64_t> rows;
   for (std::int64_t k = 0; k < order_; ++k) {

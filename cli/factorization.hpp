@@ -43,6 +43,9 @@ class Factorization {
   // b and x hold n doubles for each of `count` right-hand sides. After factor().
   void solve(const double* b, double* x, std::int64_t count);
 
+  // The diagonal of the inverse, or of the generalized inverse that dropped pivots leave. After factor().
+  std::vector<double> inverse_diagonal();
+
   std::int64_t order() const { return order_; }
   const FactorCounts& counts() const { return counts_; }
   std::int64_t rank() const { return rank_; }

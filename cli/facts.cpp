@@ -2,10 +2,19 @@
 
 #include <fmt/format.h>
 
+#include <algorithm>
+
 #include "cli/format.hpp"
 #include "cli/structure.hpp"
 
 namespace sm::cli {
+
+std::uint64_t pool_ceiling(const CommonOptions& common) {
+  if (!common.memory.empty()) return common.ceiling;
+  // A sixteenth is left to the vectors of the solution and to everything else that runs here.
+  const std::uint64_t usable = common.ceiling - common.ceiling / 16;
+  return usable - std::min(peak_resident(), usable - 1);
+}
 
 void report_matrix(Report& report, const LoadedMatrix& matrix) {
   const Header& header = matrix.header;

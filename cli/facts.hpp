@@ -1,11 +1,15 @@
 // Facts that more than one subcommand reports.
 #pragma once
 
+#include "cli/commands.hpp"
 #include "cli/factorization.hpp"
 #include "cli/loading.hpp"
 #include "cli/report.hpp"
 
 namespace sm::cli {
+
+// What the pools may hand out: what the user says, or what the machine has beside the resident memory of the command.
+std::uint64_t pool_ceiling(const CommonOptions& common);
 
 void report_matrix(Report& report, const LoadedMatrix& matrix);
 void report_outcome(Report& report,

@@ -89,6 +89,25 @@ Example: two right-hand sides, one in each column of an array file.
   ...
 )";
 
+const char* const kInvdiag =
+    R"(Compute the diagonal of the inverse of a symmetric matrix
+
+Factors A as 'qxsm factor' does and computes the diagonal of its inverse from the factor, a partial back substitution
+for each row, without the rest of the inverse. These are the variances of the estimates when A is a matrix of normal
+equations. When A is singular, the inverse is the generalized inverse that dropped pivots leave, with 0 in the rows
+that were dropped. A matrix that is not positive semidefinite is refused, with exit code 1.
+
+Example: which joints of a structure give way most, and how far.
+
+  $ qxsm invdiag data/bcsstk01.mtx -o d.mtx
+  rank             48 of 48
+  rows dropped     none
+  smallest         4.68456e-10 in row 46
+  largest          0.000106459 in row 1
+  written          48 x 1, in d.mtx
+  ...
+)";
+
 const char* const kGrid =
     R"(Write the matrix of a five-point grid, for trials of any size
 

@@ -7,6 +7,7 @@ extern const char* const kMain;
 extern const char* const kInfo;
 extern const char* const kFactor;
 extern const char* const kSolve;
+extern const char* const kInvdiag;
 extern const char* const kGrid;
 extern const char* const kExitCodes;
 

@@ -54,8 +54,8 @@ void report_diagonal(Report& report, const Diagonal& diagonal) {
   report.add("rows_without_diagonal", diagonal.missing, "without diagonal", text);
 }
 
-void report_blocks(Report& report, const LoadedMatrix& matrix) {
-  const Blocks blocks = find_blocks(matrix.rows);
+void report_blocks(Report& report, const LoadedMatrix& matrix, std::uint64_t limit) {
+  const Blocks blocks = find_blocks(matrix.rows, limit);
   const char* unit = matrix.header.rows == matrix.header.cols ? "rows" : "rows and columns";
   report.add("blocks", blocks.count, "blocks",
              fmt::format("{}, the largest of {} {}", blocks.count, blocks.largest, unit));
@@ -72,8 +72,8 @@ void report_need(Report& report, std::int64_t order, std::int64_t upper) {
 
 // Orders the matrix and finds the structure of its factor. The numeric factorization takes no further memory, so the
 // peak so far is the peak of factoring.
-void report_fill(Report& report, const LoadedMatrix& matrix, std::uint64_t ceiling, Progress& progress) {
-  ModuleSession session(ceiling);
+void report_fill(Report& report, const LoadedMatrix& matrix, const CommonOptions& common, Progress& progress) {
+  ModuleSession session(pool_ceiling(common));
   Factorization factorization(session, matrix.rows, progress);
   factorization.analyse();
   report_counts(report, factorization.counts(), factorization.order());
@@ -91,7 +91,7 @@ Report run_info(const InfoOptions& options, const CommonOptions& common, Progres
   report_density(report, matrix, diagonal);
   const bool symmetric = report_symmetry(report, matrix);
   report_diagonal(report, diagonal);
-  report_blocks(report, matrix);
+  report_blocks(report, matrix, common.ceiling);
   if (options.fill || symmetric) {
     require_symmetric(matrix);
     report_need(report, matrix.header.rows, matrix.rows.size() + static_cast<std::int64_t>(diagonal.missing.size()));
@@ -99,7 +99,7 @@ Report run_info(const InfoOptions& options, const CommonOptions& common, Progres
     report.add("assembling_bytes", Json(), "memory needed", "none, as only symmetric matrices are factored");
     report.add_json("ordering_bytes", Json());
   }
-  if (options.fill) report_fill(report, matrix, common.ceiling, progress);
+  if (options.fill) report_fill(report, matrix, common, progress);
   return report;
 }
 

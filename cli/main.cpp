@@ -14,6 +14,7 @@ namespace {
 // Whether the result itself goes to standard output, so that the report has to go elsewhere.
 bool output_is_taken(const Options& options) {
   return (options.command == Command::solve && options.solve.output == "-") ||
+         (options.command == Command::invdiag && options.invdiag.output == "-") ||
          (options.command == Command::grid && options.grid.output == "-");
 }
 
@@ -28,6 +29,8 @@ Report run_command(const Options& options) {
       return run_factor(options.factor, options.common, progress);
     case Command::solve:
       return run_solve(options.solve, options.common, progress);
+    case Command::invdiag:
+      return run_invdiag(options.invdiag, options.common, progress);
     case Command::grid:
       return run_grid(options.grid);
     case Command::none:

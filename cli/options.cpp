@@ -51,10 +51,10 @@ void add_common(CLI::App& command, CommonOptions& common) {
 void add_memory(CLI::App& command, CommonOptions& common) {
   command
       .add_option("--memory", common.memory,
-                  "Ceiling for the memory of the computation:\n"
-                  "512M, 4G (K, M, G, T are powers of 1024).\n"
-                  "Past it the run ends with exit code 3.\n"
-                  "Default: what this machine has")
+                  "Ceiling for the memory pools of the computation,\n"
+                  "and for what is kept of a file: 512M, 4G (K, M,\n"
+                  "G, T are powers of 1024). Past it the run ends\n"
+                  "with exit code 3. Default: what this machine has")
       ->check(CLI::Validator(check_memory, ""))
       ->type_name("SIZE");
 }
@@ -121,6 +121,20 @@ void add_solve(CLI::App& app, Options& options) {
   command->callback([&] { options.command = Command::solve; });
 }
 
+void add_invdiag(CLI::App& app, Options& options) {
+  CLI::App* command = add_command(app, "invdiag", help::kInvdiag);
+  command->add_option("A.mtx", options.invdiag.matrix, kMatrixHelp)->required()->type_name("");
+  command
+      ->add_option("-o,--output", options.invdiag.output,
+                   "Write the diagonal as a Matrix Market array of\n"
+                   "one column with 17 digits. - is standard\n"
+                   "output; the report then goes to standard error")
+      ->type_name("D.mtx");
+  add_common(*command, options.common);
+  add_memory(*command, options.common);
+  command->callback([&] { options.command = Command::invdiag; });
+}
+
 void add_grid(CLI::App& app, Options& options) {
   CLI::App* command = add_command(app, "grid", help::kGrid);
   command->add_option("NX", options.grid.nx, "Points in the first direction")
@@ -151,7 +165,7 @@ std::string help_command(const CLI::App& app) {
   const auto word = std::find_if(argv + 1, argv + argc, [](const char* argument) { return argument[0] != '-'; });
   if (app.get_subcommands().empty() && word != argv + argc) {
     throw CommandError({.what = "found the subcommand " + quote(*word),
-                        .expected = "info, factor, solve or grid",
+                        .expected = "info, factor, solve, invdiag or grid",
                         .advice = "see qxsm --help"});
   }
   throw CommandError({.what = error.what(), .advice = "see " + help_command(app)});
@@ -175,6 +189,7 @@ Options parse_options(int argc, const char* const* argv) {
   add_info(app, options);
   add_factor(app, options);
   add_solve(app, options);
+  add_invdiag(app, options);
   add_grid(app, options);
   try {
     app.parse(argc, argv);

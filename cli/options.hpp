@@ -13,7 +13,7 @@ class App;
 
 namespace sm::cli {
 
-enum class Command { none, info, factor, solve, grid };
+enum class Command { none, info, factor, solve, invdiag, grid };
 
 struct Options {
   Command command = Command::none;
@@ -21,6 +21,7 @@ struct Options {
   InfoOptions info;
   FactorOptions factor;
   SolveOptions solve;
+  InvdiagOptions invdiag;
   GridOptions grid;
   std::string answer;  // help or version that was asked for: to be printed instead of a run
 };

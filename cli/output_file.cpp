@@ -4,6 +4,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <iterator>
 
@@ -73,6 +74,11 @@ void OutputFile::finish() {
     if (::close(file) != 0) refuse(path_, errno);
   }
   finished_ = true;
+}
+
+std::string comment_text(std::string text) {
+  std::replace(text.begin(), text.end(), '\n', ' ');
+  return text;
 }
 
 void write_array(OutputFile& out, std::int64_t rows, std::int64_t cols, const double* values,

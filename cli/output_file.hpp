@@ -37,6 +37,9 @@ class OutputFile {
   fmt::memory_buffer buffer_;
 };
 
+// Text with a file name in it as one comment: a line break in the name must not end it.
+std::string comment_text(std::string text);
+
 // Writes columns as a Matrix Market array with 17 significant digits, enough for every double.
 void write_array(OutputFile& out, std::int64_t rows, std::int64_t cols, const double* values,
                  const std::string& comment);

@@ -115,12 +115,7 @@ void judge_all(Report& report, const std::string& name, const std::vector<Answer
 
 void write_solution(Report& report, std::optional<OutputFile>& output, const Columns& b, const std::vector<double>& x,
                     const std::string& name) {
-  if (output) {
-    // A line break in a file name must not end the comment.
-    std::string comment = "solution of A x = b, A in " + name;
-    std::replace(comment.begin(), comment.end(), '\n', ' ');
-    write_array(*output, b.rows, b.count, x.data(), comment);
-  }
+  if (output) write_array(*output, b.rows, b.count, x.data(), comment_text("solution of A x = b, A in " + name));
   report.add("output", output ? Json(output->path()) : Json(), "solution",
              output ? fmt::format("{} x {}, in {}", b.rows, b.count, output->path()) : "not written (see -o)");
 }
@@ -140,7 +135,7 @@ Report run_solve(const SolveOptions& options, const CommonOptions& common, Progr
   std::optional<OutputFile> output;
   if (!options.output.empty()) output.emplace(options.output, std::vector{options.matrix, options.right_hand_sides});
 
-  ModuleSession session(common.ceiling);
+  ModuleSession session(pool_ceiling(common));
   Factorization factorization(session, matrix.rows, progress);
   factorization.analyse();
   if (!factorization.factor()) {

@@ -1,5 +1,7 @@
 #include "cli/structure.hpp"
 
+#include <fmt/format.h>
+
 #include <algorithm>
 #include <cmath>
 #include <numeric>
@@ -41,10 +43,11 @@ class Sets {
 
 }  // namespace
 
-Blocks find_blocks(const CompressedRows& rows) {
+Blocks find_blocks(const CompressedRows& rows, std::uint64_t limit) {
   const bool square = rows.rows == rows.cols;
   const std::int64_t vertices = square ? rows.rows : rows.rows + rows.cols;
   const std::int64_t first_column = square ? 0 : rows.rows;
+  require_memory(16.0 * static_cast<double>(vertices), limit, fmt::format("the blocks of {} vertices", vertices));
   Sets sets(vertices);
   for (std::int64_t i = 0; i < rows.rows; ++i) {
     for (std::int64_t p = rows.start[at(i)]; p < rows.start[at(i + 1)]; ++p)

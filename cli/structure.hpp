@@ -15,7 +15,8 @@ struct Blocks {
   std::int64_t count = 0;
   std::int64_t largest = 0;  // vertices
 };
-Blocks find_blocks(const CompressedRows& rows);
+// `limit` as in require_memory.
+Blocks find_blocks(const CompressedRows& rows, std::uint64_t limit);
 
 struct Diagonal {
   std::int64_t present = 0;

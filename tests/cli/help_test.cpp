@@ -73,7 +73,7 @@ class Help : public CommandTest {
 };
 
 TEST_F(Help, explains_purpose_example_options_and_exit_codes) {
-  for (const char* command : {"info", "factor", "solve", "grid"}) {
+  for (const char* command : {"info", "factor", "solve", "invdiag", "grid"}) {
     const Outcome run = qxsm({command, "--help"});
     EXPECT_EQ(run.code, 0);
     EXPECT_EQ(run.err, "");
@@ -91,15 +91,16 @@ TEST_F(Help, explains_purpose_example_options_and_exit_codes) {
 TEST_F(Help, lists_the_subcommands_with_their_purpose) {
   const Outcome run = qxsm({"--help"});
   EXPECT_EQ(run.code, 0);
-  for (const char* part : {"  info      Show what a file holds", "  factor    Order and factor",
-                           "  solve     Solve A x = b", "  grid      Write the matrix", "Exit codes:"}) {
+  for (const char* part :
+       {"  info      Show what a file holds", "  factor    Order and factor", "  solve     Solve A x = b",
+        "  invdiag   Compute the diagonal", "  grid      Write the matrix", "Exit codes:"}) {
     EXPECT_NE(run.out.find(part), std::string::npos) << part << " in\n" << run.out;
   }
 }
 
 TEST_F(Help, shows_examples_that_print_what_it_says) {
   for (const std::vector<std::string>& command : std::vector<std::vector<std::string>>{
-           {"--help"}, {"info", "--help"}, {"factor", "--help"}, {"solve", "--help"}}) {
+           {"--help"}, {"info", "--help"}, {"factor", "--help"}, {"solve", "--help"}, {"invdiag", "--help"}}) {
     EXPECT_GE(repeat_examples(qxsm(command).out), 4) << command[0];
   }
 }

@@ -172,6 +172,16 @@ TEST_F(SolveCommand, a_solution_that_overflows_is_no_answer) {
   EXPECT_TRUE(run.json().at("largest_residual").is_null());
 }
 
+// Infinities of both signs meet in the first two rows; the last row alone would look exact.
+TEST_F(SolveCommand, a_residual_that_is_no_number_is_not_lost_among_others) {
+  const std::string a =
+      matrix("a.mtx", "coordinate real symmetric", "3 3 4\n1 1 2e-300\n2 1 1e-300\n2 2 2e-300\n3 3 1\n");
+  const std::string b = matrix("b.mtx", "array real general", "3 1\n1e300\n-1e300\n1\n");
+  const Outcome run = qxsm({"solve", a, "-b", b, "--json"});
+  EXPECT_EQ(run.code, 1);
+  EXPECT_NE(run.err.find("the solution overflows for the right-hand sides 1; scale"), std::string::npos) << run.err;
+}
+
 TEST_F(SolveCommand, the_output_must_be_writable_and_not_an_input) {
   const std::string a = file("a.mtx", read(shipped("bcsstk01.mtx")));
   expect_message(qxsm({"solve", a, "-o", path("no/x.mtx")}), 2,
