@@ -2,7 +2,7 @@
 #include <algorithm>
 #include <memory>
 
-#include "forms/forms_support.hpp"
+#include "forms/product_support.hpp"
 
 namespace sm::test {
 namespace {
@@ -25,7 +25,6 @@ std::vector<double> last_of(const Matrices& m) { return read(m.back()).by_rows()
 
 // Factored where it can be, so that a refused request leaves it as it is.
 Operand ready(Shape shape) { return {shape, shape.kind == SM_KIND_GENERAL ? SM_STATE_CLOSED : SM_STATE_FACTORED}; }
-constexpr Shape kInvertible[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalColumns, kDiagonalRows};
 
 std::string name_of_three(Shape a, Shape x, Shape r) {
   return name_of(a) + " between " + name_of(x) + " into " + name_of(r);
@@ -144,11 +143,6 @@ TEST_P(FormsAllocationTest, forms_of_matrices_around_an_inverse) {
                          [](Session& s, const Matrices& m) { return s.fn().qxsminvquad(m[0], m[1], m[2]); }, last_of});
             EXPECT_GE(requests, (factored ? 1 : 2) + (fresh ? 1 : 0));
           }
-}
-
-bool multiplies(Shape a, Shape b) {
-  if (a.kind == SM_KIND_GENERAL) return b.kind != SM_KIND_SYMMETRIC;
-  return a != kSymmetricColumns || b.kind != SM_KIND_GENERAL;
 }
 
 TEST_P(FormsAllocationTest, products_of_matrices) {

@@ -11,13 +11,6 @@ class DenseQuadTest : public FormsTest {
   SmStatus form_of(SmMatrix* g, const std::vector<double>& s, SmMatrix* r, std::int32_t keep) {
     return fn().qxsmDenseQuad(g, s.data(), r, keep);
   }
-  SmMatrix* of(Operand operand, std::int64_t rows, std::int64_t cols) {
-    Random random(1);
-    return build(operand, random_known(random, operand.shape, rows, cols));
-  }
-  SmMatrix* result() { return build(kSymmetricSparse, kBefore); }
-  static bool as_before(SmMatrix* r) { return r->rows == 2 && same(read(r), kBefore); }
-  static inline const Known kBefore = Known::full({{5.0, 6.0}, {6.0, 8.0}});
 };
 INSTANTIATE_BOTH_HOSTS(DenseQuadTest);
 
@@ -124,7 +117,7 @@ TEST_P(DenseQuadTest, a_g_with_dense_values_answers_0_silently_before_everything
   for (const Shape shape : kDense)
     for (const std::int32_t keep : {0, 1}) {
       SCOPED_TRACE(name_of(shape));
-      SmMatrix* r = result();
+      SmMatrix* r = result(kSymmetricSparse);
       SmMatrix* closed = of({shape}, 4, 4);
       SmMatrix* open = new_open_tied(session(), data, 4, 4, shape.kind, shape.format);
       for (SmMatrix* g : {closed, open}) {
@@ -139,7 +132,7 @@ TEST_P(DenseQuadTest, a_g_with_dense_values_answers_0_silently_before_everything
 }
 
 TEST_P(DenseQuadTest, a_count_of_dense_values_that_is_a_nan_answers_0_silently) {
-  SmMatrix* r = result();
+  SmMatrix* r = result(kSymmetricSparse);
   SmMatrix* g = typed(kGeneralRows);  // neither values nor closed
   g->value_count = kNan;
   EXPECT_EQ(form_of(g, {1.0}, g, 0), SM_OK);
@@ -151,7 +144,7 @@ TEST_P(DenseQuadTest, a_count_of_dense_values_that_is_a_nan_answers_0_silently) 
 }
 
 TEST_P(DenseQuadTest, an_open_g_comes_before_a_result_that_is_g) {
-  SmMatrix* r = result();
+  SmMatrix* r = result(kSymmetricSparse);
   for (const Shape shape : kShapes) {
     SmMatrix* g = typed(shape);
     EXPECT_EQ(form_of(g, {1.0}, g, 0), SM_NOT_CLOSED) << name_of(shape);
@@ -193,7 +186,7 @@ TEST_P(DenseQuadTest, sizing_that_fails_is_the_answer) {
 TEST_P(DenseQuadTest, a_g_without_entries_gives_a_closed_result_of_zeros) {
   SmMatrix* g = sized(kGeneralSparse, 3, 4);
   const std::vector<double> s(10, 1.0);
-  SmMatrix* r = result();
+  SmMatrix* r = result(kSymmetricSparse);
   ASSERT_EQ(form_of(g, s, r, 0), SM_OK);
   EXPECT_EQ(r->state, SM_STATE_CLOSED);
   EXPECT_EQ(r->rows, 3);
@@ -232,11 +225,11 @@ TEST_P(DenseQuadTest, other_kinds_and_formats_answer_124_with_the_result_sized) 
     EXPECT_TRUE(same_entries(read(kept), before));
   }
   for (std::int32_t state = SM_STATE_CLOSED; state <= SM_STATE_FACTORED; ++state) {
-    SmMatrix* r = result();
+    SmMatrix* r = result(kSymmetricSparse);
     EXPECT_EQ(form_of(of({kSymmetricSparse, state}, 4, 4), s, r, 0), SM_UNAVAILABLE);
     EXPECT_EQ(r->rows, 4);
     EXPECT_EQ(r->state, SM_STATE_OPEN);
-    SmMatrix* kept = result();
+    SmMatrix* kept = result(kSymmetricSparse);
     EXPECT_EQ(form_of(of({kSymmetricSparse, state}, 4, 4), s, kept, 1), SM_UNAVAILABLE);
     EXPECT_TRUE(as_before(kept));
   }
@@ -245,7 +238,7 @@ TEST_P(DenseQuadTest, other_kinds_and_formats_answer_124_with_the_result_sized) 
 TEST_P(DenseQuadTest, a_row_that_no_array_can_hold_answers_105_and_one_that_memory_cannot_101) {
   SmMatrix* g = sized(kGeneralSparse, 2, SM_MAX_ELEMENTS + 1);
   ASSERT_EQ(fn().qxsmassign(g, 1, 0, 0, 1.0), SM_OK);
-  SmMatrix* r = result();
+  SmMatrix* r = result(kSymmetricSparse);
   EXPECT_EQ(form_of(g, {1.0}, r, 1), SM_TOO_LARGE);
   EXPECT_TRUE(as_before(r));
   SmMatrix* large = sized(kGeneralSparse, 2, SM_MAX_ELEMENTS / 4);
@@ -256,7 +249,7 @@ TEST_P(DenseQuadTest, a_row_that_no_array_can_hold_answers_105_and_one_that_memo
 
 TEST_P(DenseQuadTest, an_assignment_that_fails_is_the_answer_and_work_goes_back) {
   SmMatrix* g = of({kGeneralSparse}, 3, 4);
-  SmMatrix* r = result();
+  SmMatrix* r = result(kSymmetricSparse);
   const std::int64_t blocks = host().live_blocks();
   EXPECT_EQ(form_of(g, std::vector<double>(10, 1.0), r, 1), SM_ALREADY_CLOSED);
   EXPECT_TRUE(as_before(r));

@@ -36,8 +36,15 @@ inline constexpr Operand kDiagonalOperands[] = {
 inline constexpr Operand kGeneralOperands[] = {{kGeneralSparse}, {kGeneralColumns}, {kGeneralRows}};
 std::vector<Operand> all_operands();
 std::vector<Operand> symmetric_and_diagonal();
+// A packed inverse in format 22 cannot be solved with.
+inline bool solvable(Operand operand) {
+  return !(operand.shape.kind == SM_KIND_SYMMETRIC && operand.shape.format == SM_FORMAT_COLUMNS &&
+           operand.state == SM_STATE_INVERTED);
+}
 inline constexpr Shape kGeneralShapes[] = {kGeneralSparse, kGeneralColumns, kGeneralRows};
 inline constexpr Shape kSymmetricShapes[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows};
+inline constexpr Shape kInvertible[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalColumns,
+                                        kDiagonalRows};
 
 // A matrix element by element: what is stored, both triangles of a symmetric one, and with which value.
 class Known {
@@ -124,6 +131,15 @@ class FormsTest : public ModuleTest {
   SmMatrix* typed(Shape shape) { return new_typed(session(), shape); }
   SmMatrix* sized(Shape shape, std::int64_t rows, std::int64_t cols) { return new_sized(session(), shape, rows, cols); }
   SmMatrix* sized(Shape shape, std::int64_t n) { return new_sized(session(), shape, n, n); }
+  // The same random elements in every call.
+  SmMatrix* of(Operand operand, std::int64_t rows = 4, std::int64_t cols = 4) {
+    Random random(1);
+    return build(operand, random_known(random, operand.shape, rows, cols));
+  }
+  // A matrix for results, and whether it is as it was made.
+  SmMatrix* result(Shape shape = kSymmetricRows) { return build(shape, result_before()); }
+  static bool as_before(SmMatrix* r) { return r->rows == 2 && same(read(r), result_before()); }
+  static Known result_before() { return Known::full({{5.0, 6.0}, {6.0, 8.0}}); }
   void destroy(SmMatrix* m) { EXPECT_EQ(fn().qxsmDestroyMatrix(instance(), &m), SM_OK); }
   // The status of the call while every request is refused; expects that it makes none.
   template <class Call>

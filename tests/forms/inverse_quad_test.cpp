@@ -17,9 +17,6 @@ class InverseQuadTest : public FormsTest {
 };
 INSTANTIATE_BOTH_HOSTS(InverseQuadTest);
 
-bool solvable(Operand operand) { return !(operand.shape == kSymmetricColumns && operand.state == SM_STATE_INVERTED); }
-inline constexpr Shape kInvertible[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalColumns,
-                                        kDiagonalRows};
 
 TEST_P(InverseQuadTest, is_the_form_of_the_inverse_for_every_pair_and_result) {
   Random random(1);

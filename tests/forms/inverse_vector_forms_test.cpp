@@ -18,8 +18,6 @@ class InverseVectorFormsTest : public FormsTest {
 };
 INSTANTIATE_BOTH_HOSTS(InverseVectorFormsTest);
 
-// What cannot be solved with: an inverse in format 22.
-bool solvable(Operand operand) { return !(operand.shape == kSymmetricColumns && operand.state == SM_STATE_INVERTED); }
 
 // X' G Y.
 Dense form_in(const Dense& g, const std::vector<double>& x, const std::vector<double>& y) {
@@ -202,7 +200,7 @@ TEST_P(InverseVectorFormsTest, without_vectors_the_matrix_is_factored_and_nothin
 // 1/4 on the diagonal: every order of a sum gives the same bits.
 TEST_P(InverseVectorFormsTest, longer_vectors_are_summed_whole) {
   Random random(4);
-  for (const std::int64_t n : {249, 250, 499, 500, 501})
+  for (const std::int64_t n : {250, 499, 500})
     for (const Shape shape : {kSymmetricSparse, kSymmetricRows, kDiagonalColumns}) {
       Known known(n, n);
       for (std::int64_t i = 0; i < n; ++i) known.set(i, i, 4.0);

@@ -4,16 +4,7 @@
 namespace sm::test {
 namespace {
 
-class ProductRefusalsTest : public FormsTest {
- protected:
-  SmMatrix* of(Operand operand, std::int64_t rows, std::int64_t cols) {
-    Random random(1);
-    return build(operand, random_known(random, operand.shape, rows, cols));
-  }
-  SmMatrix* result(Shape shape = kGeneralRows) { return build(shape, kBefore); }
-  static bool as_before(SmMatrix* r) { return r->rows == 2 && same(read(r), kBefore); }
-  static inline const Known kBefore = Known::full({{5.0, 6.0}, {6.0, 8.0}});
-};
+class ProductRefusalsTest : public FormsTest {};
 INSTANTIATE_BOTH_HOSTS(ProductRefusalsTest);
 
 TEST_P(ProductRefusalsTest, two_empty_operands_answer_0_before_everything) {
@@ -25,7 +16,7 @@ TEST_P(ProductRefusalsTest, two_empty_operands_answer_0_before_everything) {
   for (SmMatrix* a : empty)
     for (SmMatrix* b : empty)
       for (const std::int32_t keep : {0, 1}) {
-        SmMatrix* c = result();
+        SmMatrix* c = result(kGeneralRows);
         EXPECT_EQ(qxsmmultm(a, b, c, keep), SM_OK);
         EXPECT_TRUE(as_before(c));
         EXPECT_EQ(qxsmmultm(a, b, a, keep), SM_OK);
@@ -37,7 +28,7 @@ TEST_P(ProductRefusalsTest, two_empty_operands_answer_0_before_everything) {
 TEST_P(ProductRefusalsTest, kind_none_of_the_first_then_open_operands) {
   SmMatrix* none = new_untyped(session());
   SmMatrix* open = sized(kSymmetricSparse, 7);
-  SmMatrix* c = result();
+  SmMatrix* c = result(kGeneralRows);
   EXPECT_EQ(qxsmmultm(none, open, none, 0), SM_UNTYPED);
   EXPECT_EQ(qxsmmultm(none, of({kGeneralRows}, 3, 5), c, 0), SM_UNTYPED);
   // Open operands come before a result that is one, and before the shapes.
@@ -73,7 +64,7 @@ TEST_P(ProductRefusalsTest, inner_dimensions_that_differ_answer_121_before_the_r
     for (const Operand& right :
          {Operand{kGeneralSparse}, Operand{kGeneralRows}, Operand{kSymmetricRows}, Operand{kDiagonalRows}})
       for (const std::int64_t rows : {3, 5}) {
-        SmMatrix* c = result();
+        SmMatrix* c = result(kGeneralRows);
         SmMatrix* b = of(right, rows, rows);
         EXPECT_EQ(qxsmmultm(of(left, 4, 4), b, c, 0), SM_DIMENSION_MISMATCH) << name_of(left);
         EXPECT_TRUE(as_before(c));
@@ -125,7 +116,7 @@ TEST_P(ProductRefusalsTest, pairs_that_are_not_served_answer_124_with_the_result
       destroy(a);
       destroy(b);
     }
-  SmMatrix* c = result();  // the pair before an empty operand
+  SmMatrix* c = result(kGeneralRows);  // the pair before an empty operand
   EXPECT_EQ(qxsmmultm(sized(kGeneralSparse, 3, 4), of({kSymmetricRows}, 4, 4), c, 0), SM_UNAVAILABLE);
   EXPECT_EQ(c->rows, 3);
   EXPECT_EQ(qxsmmultm(of({kSymmetricColumns}, 4, 4), sized(kGeneralSparse, 4, 5), c, 0), SM_UNAVAILABLE);

@@ -4,16 +4,7 @@
 namespace sm::test {
 namespace {
 
-class QuadRefusalsTest : public FormsTest {
- protected:
-  SmMatrix* of(Operand operand, std::int64_t rows, std::int64_t cols) {
-    Random random(1);
-    return build(operand, random_known(random, operand.shape, rows, cols));
-  }
-  SmMatrix* result(Shape shape = kSymmetricRows) { return build(shape, kBefore); }
-  static bool as_before(SmMatrix* r) { return r->rows == 2 && same(read(r), kBefore); }
-  static inline const Known kBefore = Known::full({{5.0, 6.0}, {6.0, 8.0}});
-};
+class QuadRefusalsTest : public FormsTest {};
 INSTANTIATE_BOTH_HOSTS(QuadRefusalsTest);
 
 TEST_P(QuadRefusalsTest, an_empty_middle_matrix_answers_0_before_everything) {

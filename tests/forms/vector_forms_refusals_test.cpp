@@ -6,10 +6,6 @@ namespace {
 
 class VectorFormsRefusalsTest : public FormsTest {
  protected:
-  SmMatrix* of(Operand operand, std::int64_t rows = 4, std::int64_t cols = 4) {
-    Random random(1);
-    return build(operand, random_known(random, operand.shape, rows, cols));
-  }
   std::vector<double> x_ = std::vector<double>(64, 1.0);
 };
 INSTANTIATE_BOTH_HOSTS(VectorFormsRefusalsTest);

@@ -24,16 +24,18 @@ class Sum {
     exact_ = exact_ && fits(a) && fits(b) && fits(c) && fits(a * b) && fits(b * c) && fits(a * b * c);
     ++terms_;
   }
+  void widen(double slack) { extra_ += slack; }  // for a term that is not known better
   double value() const { return static_cast<double>(value_); }
   double slack() const {
-    if (exact_ && magnitude_ < 1048576.0L) return 0;
-    return 4 * static_cast<double>(terms_ + 2) * kEps * static_cast<double>(magnitude_);
+    if (!std::isfinite(magnitude_) || (exact_ && extra_ == 0 && magnitude_ < 1048576.0L)) return 0;
+    return extra_ + 4 * static_cast<double>(terms_ + 2) * kEps * static_cast<double>(magnitude_);
   }
 
  private:
   static bool fits(Real x) { return std::fabs(x) < 1048576.0L && std::ldexp(x, 30) == std::floor(std::ldexp(x, 30)); }
   Real value_ = 0;
   Real magnitude_ = 0;
+  double extra_ = 0;
   bool exact_ = true;
   int terms_ = 0;
 };

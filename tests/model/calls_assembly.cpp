@@ -60,7 +60,7 @@ void call_assign(Machine& m) {
     return x.rows > 0 && (!x.symmetric_sparse() || x.state == SM_STATE_OPEN || m.random.chance(10));
   });
   if (!record) return;
-  for (Index count = 1 + m.random.below(6); count > 0; --count) {
+  for (Index count = 1 + m.random.below(5); count > 0; --count) {
     Index row = m.random.below(std::max<Index>(record->rows, 1));
     Index col = m.random.below(std::max<Index>(record->cols, 1));
     if (!record->general() && row > col && m.random.chance(90)) std::swap(row, col);
@@ -148,7 +148,7 @@ void call_remove(Machine& m) {
 }  // namespace
 
 void add_assembly_calls(std::vector<Call>& list) {
-  list.insert(list.end(), {{call_assign, 60}, {call_setee, 3}, {call_zscp, 12}, {call_remove, 6}});
+  list.insert(list.end(), {{call_assign, 40}, {call_setee, 3}, {call_zscp, 12}, {call_remove, 6}});
 }
 
 }  // namespace sm::test

@@ -50,6 +50,8 @@ bool convertible(const Model& source, const Model& target) {
   return source.diagonal() || !target.diagonal();
 }
 
+}  // namespace
+
 SmStatus model_convert(const Model& source, Model& target, bool flag) {
   if (source.none()) return SM_UNTYPED;
   if (!source.closed()) return SM_NOT_CLOSED;
@@ -63,6 +65,8 @@ SmStatus model_convert(const Model& source, Model& target, bool flag) {
   if (target.symmetric_sparse()) model_close(target, 0.0);
   return SM_OK;
 }
+
+namespace {
 
 void call_convert(Machine& m) {
   Model* source = m.any();

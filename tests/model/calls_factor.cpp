@@ -103,13 +103,6 @@ SmStatus model_factor(Model& m, bool in_place) {
 
 namespace {
 
-// Mostly records that can be factored: symmetric and diagonal ones.
-Model* factorable(Machine& m) {
-  Model* x =
-      m.random.chance(85) ? m.any([](const Model& y) { return y.closed() && !y.general() && !y.empty(); }) : m.any();
-  return x && factor_is_clear(*x) && !x->spoiled ? x : nullptr;
-}
-
 void call_order(Machine& m) {
   Model* x = m.random.chance(90) ? m.any([](const Model& y) { return y.symmetric_sparse(); }) : m.any();
   if (!x) return;
@@ -161,7 +154,7 @@ void call_numeric(Machine& m) {
 }
 
 void call_fact(Machine& m) {
-  Model* x = factorable(m);
+  Model* x = solvable(m);
   if (!x) return;
   const std::int32_t flags[] = {0, 0, 1, 0x10000, 0x10002};
   const std::int32_t in_place = flags[m.random.below(5)];
@@ -171,7 +164,7 @@ void call_fact(Machine& m) {
 }
 
 void call_logdet(Machine& m) {
-  Model* x = factorable(m);
+  Model* x = solvable(m);
   if (!x) return;
   double out = 0;
   m.begin("qxsmlogdet", m.number(*x));
@@ -194,7 +187,7 @@ void call_logdet(Machine& m) {
 }
 
 void call_rank(Machine& m) {
-  Model* x = factorable(m);
+  Model* x = solvable(m);
   if (!x) return;
   Index out = 77;
   m.begin("qxsmrank", m.number(*x));
@@ -232,7 +225,7 @@ SmStatus want_pivots(Model& x, std::string& out) {
 }
 
 void call_pivot(Machine& m) {
-  Model* x = factorable(m);
+  Model* x = solvable(m);
   if (!x) return;
   std::string out(static_cast<std::size_t>(x->rows) + 2, '?');
   std::string expected = out;

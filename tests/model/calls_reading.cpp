@@ -8,6 +8,29 @@ namespace sm::test {
 
 namespace {
 
+SmStatus want_element(const Model& x, Index row, Index col, double& value) {
+  value = missing_value();
+  if (x.empty()) {
+    value = 0;
+    return SM_NO_ELEMENT;
+  }
+  if (!x.closed()) return SM_NOT_CLOSED;
+  if (row < 0 || col < 0 || row >= x.rows || col >= x.cols) return SM_OUTSIDE;
+  if (x.symmetric_sparse() && (col < row || (x.state > SM_STATE_CLOSED && row != col))) return SM_NO_ELEMENT;
+  value = x.diagonal() ? x.v(row, row) : x.at(row, col);
+  return SM_OK;
+}
+
+}  // namespace
+
+double element_read(const Model& x, Index row, Index col) {
+  double value = 0;
+  want_element(x, row, col, value);
+  return value;
+}
+
+namespace {
+
 void call_get(Machine& m) {
   Model* record = m.any();
   if (!record) return;
@@ -15,26 +38,15 @@ void call_get(Machine& m) {
   Index col = m.random.below(record->cols + 1);
   if (record->packed() && col < row) col = row;  // what is read there is told for a sparse one only
   double value = Wanted::kUntouched;
+  double want = 0;
   m.begin("qxsmget", m.number(*record), row, col);
   const SmStatus got = m.fn().qxsmget(record->handle, row, col, &value);
-  SmStatus want = SM_OK;
-  double element = missing_value();
-  if (record->empty()) {
-    want = SM_NO_ELEMENT;
-    element = 0;
-  } else if (!record->closed()) {
-    want = SM_NOT_CLOSED;
-  } else if (row < 0 || row >= record->rows || col >= record->cols) {
-    want = SM_OUTSIDE;
-  } else if (record->symmetric_sparse() && (col < row || (record->state > SM_STATE_CLOSED && row != col))) {
-    want = SM_NO_ELEMENT;
-  } else {
-    element = record->diagonal() ? record->v(row, row) : record->at(row, col);
-  }
-  m.answer(got, want);
-  m.same(value, element, 0, "element");
-  if (std::isnan(element) && std::bit_cast<std::uint64_t>(value) != SM_MISSING_BITS) m.wrong("not the missing value");
+  m.answer(got, want_element(*record, row, col, want));
+  m.same(value, want, 0, "element");
+  if (std::isnan(want) && !is_missing(value)) m.wrong("not the missing value");
 }
+
+}  // namespace
 
 SmStatus want_row(const Model& x, Index row, Index start, Wanted& out) {
   if (const auto status = not_readable(x)) return *status;
@@ -52,6 +64,8 @@ SmStatus want_row(const Model& x, Index row, Index start, Wanted& out) {
   }
   return SM_OK;
 }
+
+namespace {
 
 void call_row(Machine& m) {
   Model* record = m.any();

@@ -47,10 +47,18 @@ SmStatus want_subst(const Model& x, const double* b, bool same, Index count, Wan
   return SM_OK;
 }
 
-SmStatus want_product(Model& x, const double* b, bool same, Index count, Wanted& want) {
+}  // namespace
+
+void settle(Machine& m, Model& x) {
+  const std::string text = difference(x);
+  if (!text.empty()) m.wrong("record " + std::to_string(m.number(x)) + ": " + text + "\n  model: " + describe(x));
+}
+
+SmStatus model_solve(const Model& x, const double* b, Wanted& want) { return want_subst(x, b, false, 1, want); }
+
+SmStatus model_inverse_product(Machine& m, Model& x, const double* b, bool same, Index count, Wanted& want) {
   if (const auto status = not_readable(x)) return *status;
-  const bool rows_there = x.sparse() || x.separate;
-  if (x.state >= SM_STATE_FACTORED && !rows_there) return SM_NO_FACTOR;
+  if (x.state >= SM_STATE_FACTORED && x.in_place()) return SM_NO_FACTOR;
   if (same) return SM_BAD_ARGUMENT;
   if (x.rows != x.cols) return SM_NOT_SQUARE;
   want.clear(x.rows * std::max<Index>(count, 0));
@@ -60,7 +68,9 @@ SmStatus want_product(Model& x, const double* b, bool same, Index count, Wanted&
     for (Index k = 0; k < count; ++k) store(want, k, multiply(x, x.w, b + k * x.rows));
     return SM_OK;
   }
+  const bool fresh = x.state < SM_STATE_FACTORED;
   const SmStatus status = model_factor(x, false);
+  if (fresh) settle(m, x);
   if (status != SM_OK) return status;
   return want_subst(x, b, false, count, want);
 }
@@ -70,6 +80,8 @@ Model* solvable(Machine& m) {
       m.random.chance(85) ? m.any([](const Model& y) { return y.closed() && !y.general() && !y.empty(); }) : m.any();
   return x && factor_is_clear(*x) && !x->spoiled ? x : nullptr;
 }
+
+namespace {
 
 struct Sides {
   Index count;
@@ -83,12 +95,6 @@ Sides draw_sides(Machine& m, const Model& model) {
   s.b = m.dyadics(model.rows * 4 + 4);
   s.x = m.blank(model.rows * 4 + 4);
   return s;
-}
-
-// A new factor is compared, and taken over, before its solves are predicted with it.
-void settle(Machine& m, Model& x) {
-  const std::string text = difference(x);
-  if (!text.empty()) m.wrong("record " + std::to_string(m.number(x)) + ": " + text + "\n  model: " + describe(x));
 }
 
 void finish(Machine& m, const Sides& s, const Wanted& want) {
@@ -114,18 +120,7 @@ void call_invmultv(Machine& m) {
   m.begin("qxsminvmultv", m.number(*x), s.count, s.same);
   const SmStatus got = qxsminvmultv(x->handle, s.b.data(), s.same ? s.b.data() : s.x.data(), s.count);
   Wanted want(x->rows * 4 + 4);
-  const bool factors = x->closed() && x->rows == x->cols && !s.same && x->state < SM_STATE_FACTORED && !x->general();
-  if (factors && !x->empty()) {
-    Wanted cleared(want.size());
-    cleared.clear(x->rows * std::max<Index>(s.count, 0));
-    const SmStatus status = model_factor(*x, false);
-    settle(m, *x);
-    if (status != SM_OK) {
-      m.answer(got, status);
-      return finish(m, s, cleared);
-    }
-  }
-  m.answer(got, want_product(*x, s.b.data(), s.same, s.count, want));
+  m.answer(got, model_inverse_product(m, *x, s.b.data(), s.same, s.count, want));
   finish(m, s, want);
 }
 
@@ -165,12 +160,16 @@ SmStatus invert_packed(Model& x) {
   return SM_OK;
 }
 
+}  // namespace
+
 bool inverse_is_clear(const Model& x) {
   if (!x.packed() || !x.closed() || x.empty() || x.state == SM_STATE_INVERTED) return true;
   if (x.state == SM_STATE_FACTORED) return inverse_of_factor(x.second()).clear;
   const Elimination e = eliminate(x.v, natural_order(x.rows), kTolerance);
   return e.clear && (!e.definite || inverse_of_factor(packed_factor(e)).clear);
 }
+
+namespace {
 
 void call_direct(Machine& m) {
   Model* x = solvable(m);
@@ -270,6 +269,8 @@ SmStatus invert_diagonal(Model& x, Values& d, double tolerance) {
   return SM_OK;
 }
 
+}  // namespace
+
 SmStatus model_invert(Model& x, bool in_place, double tolerance) {
   if (const auto status = not_readable(x)) return *status;
   const bool factored = x.state >= SM_STATE_FACTORED;
@@ -300,6 +301,8 @@ SmStatus model_invert(Model& x, bool in_place, double tolerance) {
   x.state = SM_STATE_INVERTED;
   return SM_OK;
 }
+
+namespace {
 
 void call_invert(Machine& m) {
   Model* x = solvable(m);

@@ -183,7 +183,7 @@ SmStatus model_tie(Model& m, double* data, Index rows, Index cols, std::int32_t 
 }
 
 void call_tie(Machine& m) {
-  Model* record = m.any();
+  Model* record = m.random.chance(35) ? m.any([](const Model& x) { return x.none(); }) : m.any();
   if (!record) return;
   const auto [kind, format] = draw_type(m);
   Index rows = 1 + m.random.below(6);  // a shape with one dimension zero is left out
@@ -210,9 +210,9 @@ void add_store_calls(std::vector<Call>& list) {
   list.insert(list.end(), {{call_new, 8},
                            {call_new_sized, 10},
                            {call_resize, 10},
-                           {call_delete, 3},
+                           {call_delete, 5},
                            {call_destroy, 3},
-                           {call_tie, 5},
+                           {call_tie, 8},
                            {call_close, 25}});
 }
 

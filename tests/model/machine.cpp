@@ -9,6 +9,12 @@ namespace {
 constexpr std::size_t kRecords = 7;
 }
 
+std::string situation(const Model& m) {
+  std::string text = std::to_string(m.kind) + "/" + std::to_string(m.format) + " state " + std::to_string(m.state);
+  if (m.dense() && m.state >= SM_STATE_FACTORED) text += m.separate ? " separate" : " in place";
+  return text + (m.lent ? " tied" : "");
+}
+
 const std::vector<Call>& all_calls() {
   static const std::vector<Call> list = [] {
     std::vector<Call> calls;
@@ -20,6 +26,10 @@ const std::vector<Call>& all_calls() {
     add_solve_calls(calls);
     add_form_calls(calls);
     add_product_calls(calls);
+    add_inverse_form_calls(calls);
+    add_matrix_form_calls(calls);
+    add_update_calls(calls);
+    add_instance_calls(calls);
     add_trace_calls(calls);
     add_estimability_calls(calls);
     return calls;
@@ -88,6 +98,7 @@ void Machine::compare_all() {
   for (Model& m : records_) {
     const std::string text = difference(m);
     if (!text.empty()) wrong("record " + std::to_string(number(m)) + ": " + text + "\n  model: " + describe(m));
+    if (m.handle) met_[situation(m)] += 1;
   }
   if (session_.host().violations() != 0) wrong("the host counts violations");
 }
@@ -127,6 +138,14 @@ std::string Machine::run(Index steps) {
   for (Model& m : records_)
     if (m.handle) text += "\n  record " + std::to_string(number(m)) + ": " + describe(m);
   return text;
+}
+
+std::string Machine::close() {
+  session_.close();
+  TestHost& host = session_.host();
+  if (host.live_pools() == 0 && host.live_blocks() == 0 && host.violations() == 0) return "";
+  return std::to_string(host.live_pools()) + " pools, " + std::to_string(host.live_blocks()) + " blocks left, " +
+         std::to_string(host.violations()) + " violations";
 }
 
 std::optional<SmStatus> not_readable(const Model& m) {

@@ -39,6 +39,9 @@ class Wanted {
   std::vector<double> slack_;
 };
 
+// Kind, format, state, where the factor is, whether tied: "3/22 state 5 in place tied".
+std::string situation(const Model& m);
+
 struct Count {
   Index calls = 0;
   Index served = 0;  // answered 0
@@ -49,11 +52,16 @@ class Machine {
   Machine(HostKind host, std::uint64_t seed);
   // Makes the calls; the account of the first difference, or nothing.
   std::string run(Index steps);
+  // Destroys instance and extension; what they have left behind, or nothing.
+  std::string close();
   const std::map<std::string, Count>& counts() const { return counts_; }
+  // How many calls met a record of that kind, format, state and place of the factor, anywhere in the pool.
+  const std::map<std::string, Index>& met() const { return met_; }
 
   // For the calls.
   Random random;
   SmInstance* instance() { return session_.instance(); }
+  SmExtension* extension() { return session_.extension(); }
   const SmFunctionTable& fn() { return session_.fn(); }
   // A record of the pool with a handle; one whose model passes the test, as far as a few draws find it; or null.
   Model* any();
@@ -95,6 +103,7 @@ class Machine {
   std::deque<std::string> trail_;
   std::string name_;
   std::map<std::string, Count> counts_;
+  std::map<std::string, Index> met_;
   std::string wrong_;
 };
 
@@ -113,6 +122,10 @@ void add_factor_calls(std::vector<Call>& list);
 void add_solve_calls(std::vector<Call>& list);
 void add_form_calls(std::vector<Call>& list);
 void add_product_calls(std::vector<Call>& list);
+void add_inverse_form_calls(std::vector<Call>& list);
+void add_matrix_form_calls(std::vector<Call>& list);
+void add_update_calls(std::vector<Call>& list);
+void add_instance_calls(std::vector<Call>& list);
 void add_trace_calls(std::vector<Call>& list);
 void add_estimability_calls(std::vector<Call>& list);
 
@@ -126,6 +139,18 @@ SmStatus model_close(Model& m, double tolerance);
 std::optional<SmStatus> not_readable(const Model& m);
 // Factors the model as qxsmfact would; call it after the module's call, when a sparse record tells its order.
 SmStatus model_factor(Model& m, bool in_place);
+// A^- b as qxsminvmultv tells it; a factor that this makes is compared and taken over first.
+SmStatus model_inverse_product(Machine& m, Model& x, const double* b, bool same, Index count, Wanted& want);
+SmStatus model_solve(const Model& x, const double* b, Wanted& want);  // qxsmsubst for one right-hand side
+SmStatus model_invert(Model& x, bool in_place, double tolerance);
+bool inverse_is_clear(const Model& x);
+SmStatus model_convert(const Model& source, Model& target, bool flag);
+SmStatus want_row(const Model& x, Index row, Index start, Wanted& out);
+double element_read(const Model& x, Index row, Index col);  // what qxsmget stores
+// Compares one record at once, so that what it holds now can be predicted with.
+void settle(Machine& m, Model& x);
+// A record whose factor can be predicted; mostly one that has one.
+Model* solvable(Machine& m);
 // Whether that can be predicted: no pivot near a limit.
 bool factor_is_clear(const Model& m);
 

@@ -1,0 +1,251 @@
+// Forms and products that are matrices.
+#include "model/machine.hpp"
+
+namespace sm::test {
+
+namespace {
+
+using Sums = Table<Sum>;
+
+// X A X' for the elements as they are, both triangles of a symmetric matrix.
+Sums form(const Model& a, const Model& x) {
+  Sums out(x.rows, x.rows);
+  for (Index i = 0; i < x.rows; ++i)
+    for (Index j = 0; j < x.rows; ++j)
+      for (Index k = 0; k < a.rows; ++k)
+        for (Index l = 0; l < a.rows; ++l)
+          if (x.at(i, k) != 0 && x.at(j, l) != 0) out(i, j).add(x.at(i, k), a.at(k, l), x.at(j, l));
+  return out;
+}
+
+// In a sparse result an element that may be zero or not would leave its place open.
+bool decided(const Sums& sums) {
+  for (Index i = 0; i < sums.rows(); ++i)
+    for (Index j = 0; j < sums.cols(); ++j)
+      if (sums(i, j).slack() > 0 && std::fabs(sums(i, j).value()) <= 4 * sums(i, j).slack()) return false;
+  return true;
+}
+
+// A packed result of order r written as a whole.
+SmStatus write_whole(Model& r, const Sums& sums) {
+  if (r.rows != sums.rows()) return SM_DIMENSION_MISMATCH;
+  for (Index i = 0; i < r.rows; ++i)
+    for (Index j = i; j < r.rows; ++j) {
+      r.v(i, j) = sums(i, j).value();
+      r.slack = std::max(r.slack, sums(i, j).slack());
+    }
+  r.separate = r.spoiled = false;
+  if (r.state >= SM_STATE_FACTORED) r.state = SM_STATE_CLOSED;
+  r.void_results();
+  return SM_OK;
+}
+
+// Elements (i, j), i <= j, added one by one, by rows or by columns; the first answer that is not 0 ends it.
+SmStatus enter(Model& r, const Sums& sums, bool by_columns, bool zeros) {
+  const Index n = sums.rows();
+  for (Index a = 0; a < n; ++a)
+    for (Index b = by_columns ? 0 : a; b < (by_columns ? a + 1 : n); ++b) {
+      const Sum& sum = by_columns ? sums(b, a) : sums(a, b);
+      if (sum.value() == 0 && !zeros) continue;
+      const SmStatus status = model_assign(r, by_columns ? b : a, by_columns ? a : b, true, sum.value());
+      if (status != SM_OK) return status;
+      if (sum.slack() > 0) r.slack = std::max(r.slack, sum.slack() + 1e-12);
+    }
+  return SM_OK;
+}
+
+SmStatus model_quad(const Model& a, const Model& x, Model& r, bool keep, const Sums& sums) {
+  if (const auto status = not_readable(a)) return *status;
+  if (!x.closed()) return SM_NOT_CLOSED;
+  if (&r == &a || &r == &x) return SM_BAD_ARGUMENT;
+  if (x.cols != a.rows) return SM_DIMENSION_MISMATCH;
+  if (!r.symmetric()) return SM_KIND_MISMATCH;
+  if (!keep) model_resize(r, x.rows, x.rows);
+  const bool by_vectors = x.general() && x.dense();
+  if (!by_vectors && !a.symmetric()) return SM_UNAVAILABLE;
+  if (x.symmetric_sparse() && x.state > SM_STATE_ORDERED) return SM_REORDERED;
+  const bool whole = by_vectors && r.format == SM_FORMAT_COLUMNS;
+  const SmStatus status = whole ? write_whole(r, sums) : enter(r, sums, by_vectors, false);
+  if (status != SM_OK) return status;
+  return keep ? SM_OK : model_close(r, kNan);
+}
+
+void call_quad(Machine& m) {
+  Model* a = m.any([](const Model& y) { return y.rows == y.cols; });
+  Model* x = a ? m.any([&](const Model& y) { return y.cols == a->rows || m.random.chance(3); }) : nullptr;
+  Model* r = m.any([&](const Model& y) { return y.symmetric() || m.random.chance(5); });
+  if (!a || !x || !r || x->none()) return;
+  const bool keep = m.random.chance(30);
+  const bool fits = a->rows == x->cols;
+  const Sums sums = fits ? form(*a, *x) : Sums();
+  if (r->sparse() && !decided(sums)) return;
+  m.begin("qxsmquad", m.number(*a), m.number(*x), m.number(*r), keep);
+  const SmStatus got = m.fn().qxsmquad(a->handle, x->handle, r->handle, keep);
+  m.answer(got, model_quad(*a, *x, *r, keep, sums));
+}
+
+SmStatus model_dense_quad(const Model& g, const Values& s, Model& r, bool keep) {
+  if (!g.sparse() && !g.empty()) return SM_OK;
+  if (g.state < SM_STATE_CLOSED || !g.closed()) return SM_NOT_CLOSED;
+  if (&g == &r) return SM_BAD_ARGUMENT;
+  if (!keep) {
+    const SmStatus status = model_resize(r, g.rows, g.rows);
+    if (status != SM_OK) return status;
+  }
+  if (g.empty()) return keep ? SM_OK : model_close(r, kNan);
+  if (!g.general_sparse() || !r.symmetric_sparse()) return SM_UNAVAILABLE;
+  const auto has_entries = [&](Index i) {
+    for (Index k = 0; k < g.cols; ++k)
+      if (g.stored(i, k)) return true;
+    return false;
+  };
+  for (Index i = 0; i < g.rows; ++i)
+    for (Index l = i; l < g.rows; ++l) {
+      if (!has_entries(i) || !has_entries(l)) continue;
+      Sum sum;
+      for (Index k = 0; k < g.cols; ++k)
+        for (Index j = 0; j < g.cols; ++j)
+          if (g.stored(i, k) && g.stored(l, j)) sum.add(g.v(i, k), s(std::min(k, j), std::max(k, j)), g.v(l, j));
+      const SmStatus status = model_assign(r, i, l, true, sum.value());
+      if (status != SM_OK) return status;
+      if (sum.slack() > 0) r.slack = std::max(r.slack, sum.slack() + 1e-12);
+    }
+  return keep ? SM_OK : model_close(r, kNan);
+}
+
+void call_dense_quad(Machine& m) {
+  Model* g = m.any([&](const Model& y) { return y.general_sparse() || m.random.chance(5); });
+  Model* r = m.any([&](const Model& y) { return y.symmetric_sparse() || m.random.chance(5); });
+  if (!g || !r || g->none()) return;
+  const bool keep = m.random.chance(30);
+  Values s(g->cols, g->cols);
+  for (Index i = 0; i < g->cols; ++i)
+    for (Index j = i; j < g->cols; ++j) s(i, j) = m.dyadic();
+  const std::vector<double> packed = array_of(SM_KIND_SYMMETRIC, SM_FORMAT_COLUMNS, s);
+  m.begin("qxsmDenseQuad", m.number(*g), m.number(*r), keep);
+  const SmStatus got = m.fn().qxsmDenseQuad(g->handle, packed.data(), r->handle, keep);
+  m.answer(got, model_dense_quad(*g, s, *r, keep));
+}
+
+SmStatus invquad_refusal(const Model& a, const Model& x, const Model& r) {
+  if (!a.closed() || !x.closed()) return SM_NOT_CLOSED;
+  if (a.in_place()) return SM_NO_FACTOR;
+  if (&r == &a || &r == &x) return SM_BAD_ARGUMENT;
+  if (a.rows != a.cols) return SM_NOT_SQUARE;
+  if (x.cols != a.rows) return SM_DIMENSION_MISMATCH;
+  return r.symmetric() ? SM_OK : SM_KIND_MISMATCH;
+}
+
+SmStatus model_invquad(Machine& m, Model& a, const Model& x, Model& r) {
+  if (a.empty() || x.empty()) return SM_OK;
+  const SmStatus refused = invquad_refusal(a, x, r);
+  if (refused != SM_OK) return refused;
+  model_resize(r, x.rows, x.rows);
+  if (a.general() || !x.general()) return SM_UNAVAILABLE;
+  Sums sums(x.rows, x.rows);
+  for (Index j = 0; j < x.rows; ++j) {
+    std::vector<double> row;
+    for (Index k = 0; k < x.cols; ++k) row.push_back(x.at(j, k));
+    Wanted w(a.rows);
+    const SmStatus status = model_inverse_product(m, a, row.data(), false, 1, w);
+    if (status != SM_OK) return status;
+    for (Index i = 0; i <= j; ++i)
+      for (Index k = 0; k < a.rows; ++k) {
+        sums(i, j).add(x.at(i, k), w.value(k));
+        sums(i, j).widen(std::fabs(x.at(i, k)) * w.slack(k));
+      }
+  }
+  const bool whole = x.dense() && r.format == SM_FORMAT_COLUMNS;
+  const SmStatus status = whole ? write_whole(r, sums) : enter(r, sums, x.dense(), x.sparse());
+  if (status != SM_OK) return status;
+  return model_close(r, kNan);
+}
+
+void call_invquad(Machine& m) {
+  Model* a = solvable(m);
+  Model* x =
+      a ? m.any([&](const Model& y) { return y.cols == a->rows && (y.general() || m.random.chance(5)); }) : nullptr;
+  Model* r = m.any([&](const Model& y) { return y.symmetric() || m.random.chance(5); });
+  // In a sparse result of a dense X a zero would be stored or not as rounding has it.
+  if (!a || !x || !r || (r->sparse() && x->dense() && !x->empty())) return;
+  m.begin("qxsminvquad", m.number(*a), m.number(*x), m.number(*r));
+  const SmStatus got = m.fn().qxsminvquad(a->handle, x->handle, r->handle);
+  m.answer(got, model_invquad(m, *a, *x, *r));
+}
+
+bool product_is_served(const Model& a, const Model& b) {
+  if (a.general()) return b.general() || b.diagonal();
+  if (a.diagonal()) return true;
+  return a.format != SM_FORMAT_COLUMNS || !b.general();
+}
+
+SmStatus multiply_diagonals(const Model& a, const Model& b, Model& c, bool keep) {
+  if (c.diagonal() && c.rows != a.rows) return SM_DIMENSION_MISMATCH;
+  if (c.diagonal()) c.changed();
+  for (Index i = 0; i < a.rows; ++i) {
+    const double value = a.v(i, i) * b.v(i, i);
+    if (c.diagonal()) c.v(i, i) = value;
+    const SmStatus status = c.diagonal() ? SM_OK : model_assign(c, i, i, true, value);
+    if (status != SM_OK && status != SM_BAD_ARGUMENT && status != SM_OUTSIDE) return status;
+  }
+  return keep || c.diagonal() ? SM_OK : model_close(c, 0.0);
+}
+
+SmStatus model_multiply(const Model& a, const Model& b, Model& c, bool keep) {
+  if (a.empty() && b.empty()) return SM_OK;
+  if (!a.closed() || !b.closed()) return SM_NOT_CLOSED;
+  if (&c == &a || &c == &b) return SM_BAD_ARGUMENT;
+  if (a.cols != b.rows || (c.diagonal() && !a.diagonal() && !b.diagonal())) return SM_DIMENSION_MISMATCH;
+  if (!keep) model_resize(c, a.rows, b.cols);
+  if (!product_is_served(a, b)) return SM_UNAVAILABLE;
+  if (a.empty() || b.empty()) return SM_OK;
+  if (a.diagonal() && b.diagonal()) return multiply_diagonals(a, b, c, keep);
+  for (Index i = 0; i < a.rows; ++i)
+    for (Index j = 0; j < b.cols; ++j) {
+      Sum sum;
+      bool entered = false;
+      for (Index k = 0; k < a.cols; ++k) {
+        if (!a.has(i, k) || !b.has(k, j)) continue;
+        entered = true;
+        sum.add(a.at(i, k), b.at(k, j));
+      }
+      const SmStatus status = entered ? model_assign(c, i, j, true, sum.value()) : SM_OK;
+      if (status != SM_OK && status != SM_BAD_ARGUMENT && status != SM_OUTSIDE) return status;
+      if (sum.slack() > 0) c.slack = std::max(c.slack, sum.slack() + 1e-12);
+    }
+  return SM_OK;
+}
+
+bool has_empty_row(const Model& a) {
+  for (Index i = 0; i < a.rows; ++i) {
+    bool found = false;
+    for (Index k = 0; k < a.cols; ++k) found = found || a.has(i, k);
+    if (!found) return true;
+  }
+  return false;
+}
+
+void call_multiply(Machine& m) {
+  Model* a = m.any([](const Model& y) { return !y.none(); });
+  Model* b =
+      a ? m.any([&](const Model& y) { return !y.none() && (y.rows == a->cols || m.random.chance(3)); }) : nullptr;
+  Model* c = m.any();
+  if (!a || !b || !c) return;
+  const bool keep = m.random.chance(30);
+  // Whether a row without entries times full rows is entered shows in a sparse result only; a kept dense result of another
+  // shape takes elements at places that the position decides.
+  if (c->sparse() && b->dense() && has_empty_row(*a)) return;
+  if (keep && c->dense() && (c->rows != a->rows || c->cols != b->cols)) return;
+  if (keep && c->in_place()) return;
+  m.begin("qxsmmultm", m.number(*a), m.number(*b), m.number(*c), keep);
+  const SmStatus got = qxsmmultm(a->handle, b->handle, c->handle, keep);
+  m.answer(got, model_multiply(*a, *b, *c, keep));
+}
+
+}  // namespace
+
+void add_matrix_form_calls(std::vector<Call>& list) {
+  list.insert(list.end(), {{call_quad, 14}, {call_dense_quad, 8}, {call_invquad, 10}, {call_multiply, 16}});
+}
+
+}  // namespace sm::test
