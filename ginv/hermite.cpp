@@ -4,6 +4,7 @@
 #include <cmath>
 
 #include "cholesky/steps.hpp"
+#include "forms/results.hpp"
 #include "ginv/operations.hpp"
 #include "store/checks.hpp"
 #include "store/operations.hpp"
@@ -83,14 +84,14 @@ Gate may_form(const SmMatrix& a, const SmMatrix& h) {
 
 SmStatus hermite(SmMatrix& a, SmMatrix& h) {
   SM_PASS(may_form(a, h));
-  (void)resize(h, a.rows, a.rows);  // an H of the wrong kind is answered below
+  const SmStatus sized = resize(h, a.rows, a.rows);  // an H of the wrong kind is answered below
   if (a.kind == SM_KIND_SYMMETRIC) {
     if (h.kind != SM_KIND_GENERAL) return SM_KIND_MISMATCH;
-    return is_dense_format(a.format) ? packed_hermite(a, h) : sparse_hermite(a, h);
+    return is_dense_format(a.format) ? packed_hermite(a, h) : or_why_unsized(sparse_hermite(a, h), sized);
   }
   if (a.kind != SM_KIND_DIAGONAL) return SM_UNAVAILABLE;
   if (h.kind != SM_KIND_GENERAL && h.kind != SM_KIND_DIAGONAL) return SM_KIND_MISMATCH;
-  return diagonal_hermite(a, h);
+  return or_why_unsized(diagonal_hermite(a, h), sized);
 }
 
 }  // namespace sm

@@ -32,8 +32,8 @@ QXESM_API SmStatus qxsmcke(SmMatrix* matrix, const double* vectors, int32_t k, i
  *   symmetric 22, 23  B of the same format; values are added in storage order, never re-mapped: the leading block of a
  *                 larger A in format 22
  * A changed packed or diagonal A loses its separate factor array (state 1), rank and log-determinant.
- * Answers: 0 with nothing done (s is 0); 124 (kind of A, or a diagonal A with another B); 121 (A smaller than B, unless
- * general); 119 (A sparse and closed); 110 (kinds or formats that do not pair); 104 (an operand without its values);
+ * Answers: 0 with nothing done (s is 0); 124 (kind of A); 121 (A smaller than B, unless general); 124 (a diagonal A with
+ * another B); 119 (A sparse and closed); 110 (kinds or formats that do not pair); 104 (an operand without its values);
  * general: the first answer of qxsmassign that is not 0; symmetric sparse: the last one; 0. */
 QXESM_API SmStatus qxsmAddSS(SmMatrix* a, SmMatrix* b, double s);
 
@@ -57,9 +57,9 @@ QXESM_API SmStatus qxsmUpdateGinv(SmMatrix* g, SmMatrix* a, SmMatrix* b, int64_t
  *   p          out  a matrix, or null
  *   tolerance  above 0: stored entries of the block at or below it become 0 at the end; NaN: setting 3
  * A changed packed or diagonal G loses its separate factor array (state 1), rank and log-determinant.
- * Answers: 0 with nothing done (G empty); 104 (two of the handles are the same); 124 (kinds that do not pair); 104 (off
- * negative; a diagonal block outside G); 121 (B's order); 119 (G sparse and closed); 113 (B); the first answer of
- * qxsmresize or qxsmassign that is not 0; 0. */
+ * Answers: 0 with nothing done (G empty); 104 (two of the handles are the same); 124 (G general or diagonal and B of
+ * another kind or format); 104 (off negative; a diagonal block outside G); for a symmetric G 121 (B's order), 124 (a
+ * general B), 119 (G sparse and closed), 113 (B); the first answer of qxsmresize or qxsmassign that is not 0; 0. */
 QXESM_API SmStatus qxsmAddGinv(SmMatrix* g, SmMatrix* b, SmMatrix* p, int64_t off, double s, double tolerance);
 
 /* Replaces a packed or diagonal matrix by its generalized inverse (in_place 1), or keeps the inverse beside the values

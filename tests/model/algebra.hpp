@@ -56,6 +56,8 @@ Elimination eliminate(const Values& a, const std::vector<Index>& order, double t
 std::vector<Index> natural_order(Index n);
 // Whether elimination is clear in every order.
 bool clear_in_every_order(const Values& a);
+// The same for a few orders, of a matrix that has too many.
+bool clear_in_some_orders(const Values& a);
 
 // R with R'R = A: sqrt(D) U, zero in dropped rows.
 Values packed_factor(const Elimination& e);

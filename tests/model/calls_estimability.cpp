@@ -77,8 +77,8 @@ void call_estimable(Machine& m) {
   Model* a = m.random.chance(70) ? solvable(m) : m.any([](const Model& y) { return y.general_sparse(); });
   if (!a) return;
   const Index k = m.random.below(4);
-  const char mode = a->general() || m.random.chance(5) ? 'H' : 'G';
-  std::vector<double> x = m.dyadics(64);
+  const char mode = m.random.chance(a->general() ? 90 : 5) ? 'H' : 'G';
+  std::vector<double> x = m.dyadics(kBlock);
   // A vector with one element 1, or A's own column, is estimable more often than one of random elements.
   for (Index v = 0; v < k; ++v) {
     const Index pick = m.random.below(a->rows + 1);
@@ -88,7 +88,7 @@ void call_estimable(Machine& m) {
   std::int32_t flags[4] = {7, 7, 7, 7};
   Index failed = -1;
   const bool flagged = m.random.chance(80);
-  m.begin("qxsmcke", m.number(*a), k, mode, flagged);
+  m.begin("qxsmcke", *a, k, mode, flagged);
   const SmStatus got =
       m.fn().qxsmcke(a->handle, x.data(), static_cast<int>(k), &failed, flagged ? flags : nullptr, mode, 1e-6);
   Estimable want;
@@ -109,9 +109,12 @@ SmStatus enter_columns(const Model& a, Model& h) {
     const SmStatus status = model_solve(a, x.data(), y);
     if (status != SM_OK) return status;
     for (Index i = 0; i < a.rows; ++i) {
-      if (std::fabs(y.value(i)) <= kDropped && h.sparse()) continue;
-      h.set(i, j, y.value(i));
       h.slack = std::max(h.slack, y.slack(i) + 2 * kDropped);
+      if (h.sparse() && std::fabs(std::fabs(y.value(i)) - kDropped) <= 2 * y.slack(i)) {
+        h.leave_open(i, j);
+        continue;
+      }
+      if (std::fabs(y.value(i)) > kDropped || h.dense()) h.set(i, j, y.value(i));
     }
   }
   h.changed();
@@ -145,36 +148,25 @@ SmStatus model_hermite(Machine& m, Model& a, Model& h) {
   return SM_OK;
 }
 
-// Elements of a sparse result near the limit could be stored or not; asked of a factor that is there.
-bool columns_are_clear(const Model& a) {
-  for (Index j = 0; j < a.rows; ++j) {
-    std::vector<double> x;
-    for (Index i = 0; i < a.rows; ++i) x.push_back(a.at(i, j));
-    Wanted y(a.rows);
-    if (model_solve(a, x.data(), y) != SM_OK) return false;
-    for (Index i = 0; i < a.rows; ++i)
-      if (std::fabs(std::fabs(y.value(i)) - kDropped) <= 2 * y.slack(i)) return false;
-  }
-  return true;
-}
-
 void call_hermite(Machine& m) {
   Model* a = solvable(m);
   Model* h = m.any([&](const Model& y) { return y.general() || m.random.chance(15); });
   if (!a || !h || !inverse_is_clear(*a)) return;
-  // What is answered first for a general A and a result of a wrong kind is not told.
-  if (a->general() && !h->general()) return;
-  if (a->symmetric_sparse() && h->sparse() && a != h && (a->state != SM_STATE_FACTORED || !columns_are_clear(*a)))
-    return;
-  m.begin("qxsmhermite", m.number(*a), m.number(*h));
+  m.begin("qxsmhermite", *a, *h);
   const SmStatus got = m.fn().qxsmhermite(a->handle, h->handle);
   m.answer(got, model_hermite(m, *a, *h));
 }
 
-std::int32_t count_step(void* context, double, std::int64_t, std::int64_t iteration) {
-  auto& steps = *static_cast<Index*>(context);
-  steps = std::max(steps, iteration);
-  return 0;
+// What the callback was told, and when it stops the solve.
+struct Progress {
+  Index last = 0;
+  Index stop = -1;
+};
+
+std::int32_t follow(void* context, double, std::int64_t, std::int64_t iteration) {
+  auto& progress = *static_cast<Progress*>(context);
+  progress.last = std::max(progress.last, iteration);
+  return iteration == progress.stop;
 }
 
 bool dominant(const Model& a) {
@@ -186,56 +178,84 @@ bool dominant(const Model& a) {
   return true;
 }
 
-void check_solution(Machine& m, const Model& a, const std::vector<double>& b, const std::vector<double>& x,
-                    Index nrhs) {
-  for (Index k = 0; k < nrhs; ++k)
+bool has_negative_diagonal(const Model& a) {
+  for (Index i = 0; i < a.rows; ++i)
+    if (a.at(i, i) < -0.1) return true;
+  return false;
+}
+
+struct Iteration {
+  Index nrhs = 0;
+  Index limit = 500;
+  Progress progress;
+  std::vector<double> b, x;
+  Index steps = -7;
+  double residual = -7;
+};
+
+void check_solution(Machine& m, const Model& a, const Iteration& t) {
+  for (Index k = 0; k < t.nrhs; ++k)
     for (Index i = 0; i < a.rows; ++i) {
       Sum sum;
-      for (Index j = 0; j < a.rows; ++j) sum.add(a.at(i, j), x[static_cast<std::size_t>(k * a.rows + j)]);
-      m.same(sum.value(), b[static_cast<std::size_t>(k * a.rows + i)], 1e-4, "A x");
+      for (Index j = 0; j < a.rows; ++j) sum.add(a.at(i, j), t.x[static_cast<std::size_t>(k * a.rows + j)]);
+      m.same(sum.value(), t.b[static_cast<std::size_t>(k * a.rows + i)], 1e-4, "A x");
     }
+}
+
+void check_quotients(Machine& m, const Model& a, const Iteration& t) {
+  for (Index i = 0; i < t.nrhs * a.rows; ++i) {
+    const double d = a.v(i % a.rows, i % a.rows);
+    const double want = std::fabs(d) <= kDropped ? 0.0 : t.b[static_cast<std::size_t>(i)] / d;
+    m.same(t.x[static_cast<std::size_t>(i)], want, 4 * kEps * std::fabs(want), "x");
+  }
+}
+
+void check_iteration(Machine& m, const Model& a, const Iteration& t, SmStatus got, SmStatus want) {
+  const bool refused = want == SM_UNTYPED || want == SM_NOT_CLOSED || want == SM_BAD_ARGUMENT;
+  if (a.empty() || refused) {
+    if (t.steps != -7 || t.residual != -7) m.wrong("a refused call has written its outputs");
+  } else if (!a.symmetric() || want == SM_NOT_DEFINITE || t.nrhs < 1) {
+    if (t.steps != 0 || (want != SM_NOT_DEFINITE && t.residual != 0)) m.wrong("iterations and residual");
+    if (a.diagonal() && want == SM_OK) check_quotients(m, a, t);
+  } else {
+    const Index limit = t.limit < 1 ? a.rows + 2 : t.limit;
+    if (t.steps < 0 || t.steps > limit || t.progress.last < t.steps) m.wrong("steps that were not told");
+    if (got == SM_OK && dominant(a)) check_solution(m, a, t);
+  }
+}
+
+// Whether the steps are enough is predicted for dominant matrices, many steps and nobody who stops them.
+SmStatus want_iteration(const Model& a, const Iteration& t, bool same, SmStatus got) {
+  if (const auto refused = not_readable(a)) return *refused;
+  if (same) return SM_BAD_ARGUMENT;
+  if (a.general()) return SM_UNAVAILABLE;
+  if (a.diagonal() || t.nrhs < 1) return SM_OK;
+  if (has_negative_diagonal(a)) return SM_NOT_DEFINITE;
+  if (t.progress.stop >= 0) return t.progress.last >= t.progress.stop ? SM_NOT_CONVERGED : SM_OK;
+  const bool told = dominant(a) && t.limit == 500;
+  return !told && got == SM_NOT_CONVERGED ? got : SM_OK;
 }
 
 void call_iterative(Machine& m) {
   Model* a = m.any([&](const Model& y) { return !y.general() || m.random.chance(10); });
-  // The number of steps, and whether they are enough, is predicted for dominant matrices only.
-  if (!a || (a->symmetric() && a->closed() && !dominant(*a))) return;
-  const Index nrhs = m.random.below(4) - (m.random.chance(5) ? 1 : 0);
+  if (!a) return;
+  Iteration t;
+  t.nrhs = m.random.below(4) - (m.random.chance(5) ? 1 : 0);
+  if (m.random.chance(20)) t.limit = m.random.below(3);
+  if (t.limit == 500 && dominant(*a) && m.random.chance(10)) t.progress.stop = 1;
   const bool same = m.random.chance(3);
-  std::vector<double> b = m.dyadics(64);
-  std::vector<double> x = m.blank(64);
-  Index iterations = -7;
-  double residual = -7;
-  Index steps = 0;
-  qxsmsetprogress(m.instance(), count_step, &steps);
-  m.begin("qxsmsolioc", m.number(*a), nrhs, same);
-  const SmStatus got = m.fn().qxsmsolioc(a->handle, b.data(), same ? b.data() : x.data(), static_cast<int>(nrhs), 500,
-                                         &iterations, &residual, 1e-9);
+  t.b = m.dyadics(kBlock);
+  t.x = m.blank(kBlock);
+  m.begin("qxsmsetprogress");
+  m.answer(qxsmsetprogress(m.instance(), follow, &t.progress), SM_OK);
+  m.begin("qxsmsolioc", *a, t.nrhs, t.limit, same);
+  const SmStatus got = m.fn().qxsmsolioc(a->handle, t.b.data(), same ? t.b.data() : t.x.data(),
+                                         static_cast<int>(t.nrhs), t.limit, &t.steps, &t.residual, 1e-9);
+  const SmStatus want = want_iteration(*a, t, same, got);
+  m.answer(got, want);
+  check_iteration(m, *a, t, got, want);
   m.begin("qxsmsetprogress");
   m.answer(qxsmsetprogress(m.instance(), nullptr, nullptr), SM_OK);
-  m.begin("qxsmsolioc", m.number(*a), nrhs, same);
-  SmStatus status = SM_OK;
-  if (const auto refused = not_readable(*a))
-    status = *refused;
-  else if (same)
-    status = SM_BAD_ARGUMENT;
-  else if (a->general())
-    status = SM_UNAVAILABLE;
-  m.answer(got, status);
-  if (a->empty() || (status != SM_OK && status != SM_UNAVAILABLE)) {
-    if (iterations != -7 || residual != -7) m.wrong("a refused call has written its outputs");
-  } else if (status != SM_OK || nrhs < 1) {
-    if (iterations != 0 || residual != 0) m.wrong("iterations and residual");
-  } else if (a->symmetric()) {
-    check_solution(m, *a, b, x, nrhs);
-    if (steps < iterations) m.wrong("steps that were not told");
-  } else {
-    for (Index i = 0; i < nrhs * a->rows; ++i) {
-      const double d = a->v(i % a->rows, i % a->rows);
-      const double want = std::fabs(d) <= kDropped ? 0.0 : b[static_cast<std::size_t>(i)] / d;
-      m.same(x[static_cast<std::size_t>(i)], want, 4 * kEps * std::fabs(want), "x");
-    }
-  }
 }
 
 }  // namespace

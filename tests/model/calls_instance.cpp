@@ -11,13 +11,15 @@ void call_instance(Machine& m) {
   SmInstance* instance = nullptr;
   const SmStatus made = plain ? qxsmGetANewInstance(&instance) : SM_OK;
   if (!plain) instance = CreateInstance(m.extension());
-  m.answer(instance ? made : SM_NO_MEMORY, SM_OK);
-  if (!instance) return;
-  SmMatrix* matrix = nullptr;
-  const SmFunctionTable& table = *instance->functions;
-  if (table.qxsmnewsd(instance, &matrix, 3) != SM_OK || instance->matrix_count != 1) m.wrong("a matrix of an instance");
+  m.answer(instance || plain ? made : SM_NO_MEMORY, SM_OK);
+  // A half-built one is only good for being destroyed.
+  if (instance && made == SM_OK) {
+    SmMatrix* matrix = nullptr;
+    const SmStatus status = instance->functions->qxsmnewsd(instance, &matrix, 3);
+    if (status != SM_OK || instance->matrix_count != 1) m.wrong("a matrix of an instance");
+  }
   m.begin("qxsmDestroyInstance");
-  m.answer(table.qxsmDestroyInstance(&instance), SM_OK);
+  m.answer(qxsmDestroyInstance(&instance), SM_OK);
   if (instance) m.wrong("the handle is still there");
 }
 

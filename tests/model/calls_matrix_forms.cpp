@@ -18,13 +18,8 @@ Sums form(const Model& a, const Model& x) {
   return out;
 }
 
-// In a sparse result an element that may be zero or not would leave its place open.
-bool decided(const Sums& sums) {
-  for (Index i = 0; i < sums.rows(); ++i)
-    for (Index j = 0; j < sums.cols(); ++j)
-      if (sums(i, j).slack() > 0 && std::fabs(sums(i, j).value()) <= 4 * sums(i, j).slack()) return false;
-  return true;
-}
+// Whether rounding could make a zero of the sum, or something else of a zero.
+bool undecided(const Sum& sum) { return sum.slack() > 0 && std::fabs(sum.value()) <= 4 * sum.slack(); }
 
 // A packed result of order r written as a whole.
 SmStatus write_whole(Model& r, const Sums& sums) {
@@ -46,6 +41,13 @@ SmStatus enter(Model& r, const Sums& sums, bool by_columns, bool zeros) {
   for (Index a = 0; a < n; ++a)
     for (Index b = by_columns ? 0 : a; b < (by_columns ? a + 1 : n); ++b) {
       const Sum& sum = by_columns ? sums(b, a) : sums(a, b);
+      if (!zeros && undecided(sum) && r.sparse()) {
+        r.slack = std::max(r.slack, 2 * sum.slack() + 1e-12);
+        r.unsure = r.unsure || r.state != SM_STATE_OPEN || std::max(a, b) >= r.rows;  // refused, or grown, or not
+        if (!r.unsure) r.leave_open(std::min(a, b), std::max(a, b));
+        continue;
+      }
+      if (sum.slack() > 0) r.slack = std::max(r.slack, sum.slack() + 1e-12);
       if (sum.value() == 0 && !zeros) continue;
       const SmStatus status = model_assign(r, by_columns ? b : a, by_columns ? a : b, true, sum.value());
       if (status != SM_OK) return status;
@@ -74,12 +76,11 @@ void call_quad(Machine& m) {
   Model* a = m.any([](const Model& y) { return y.rows == y.cols; });
   Model* x = a ? m.any([&](const Model& y) { return y.cols == a->rows || m.random.chance(3); }) : nullptr;
   Model* r = m.any([&](const Model& y) { return y.symmetric() || m.random.chance(5); });
-  if (!a || !x || !r || x->none()) return;
+  if (!a || !x || !r) return;
   const bool keep = m.random.chance(30);
   const bool fits = a->rows == x->cols;
   const Sums sums = fits ? form(*a, *x) : Sums();
-  if (r->sparse() && !decided(sums)) return;
-  m.begin("qxsmquad", m.number(*a), m.number(*x), m.number(*r), keep);
+  m.begin("qxsmquad", *a, *x, *r, keep);
   const SmStatus got = m.fn().qxsmquad(a->handle, x->handle, r->handle, keep);
   m.answer(got, model_quad(*a, *x, *r, keep, sums));
 }
@@ -116,13 +117,13 @@ SmStatus model_dense_quad(const Model& g, const Values& s, Model& r, bool keep) 
 void call_dense_quad(Machine& m) {
   Model* g = m.any([&](const Model& y) { return y.general_sparse() || m.random.chance(5); });
   Model* r = m.any([&](const Model& y) { return y.symmetric_sparse() || m.random.chance(5); });
-  if (!g || !r || g->none()) return;
+  if (!g || !r) return;
   const bool keep = m.random.chance(30);
   Values s(g->cols, g->cols);
   for (Index i = 0; i < g->cols; ++i)
     for (Index j = i; j < g->cols; ++j) s(i, j) = m.dyadic();
   const std::vector<double> packed = array_of(SM_KIND_SYMMETRIC, SM_FORMAT_COLUMNS, s);
-  m.begin("qxsmDenseQuad", m.number(*g), m.number(*r), keep);
+  m.begin("qxsmDenseQuad", *g, *r, keep);
   const SmStatus got = m.fn().qxsmDenseQuad(g->handle, packed.data(), r->handle, keep);
   m.answer(got, model_dense_quad(*g, s, *r, keep));
 }
@@ -166,9 +167,8 @@ void call_invquad(Machine& m) {
   Model* x =
       a ? m.any([&](const Model& y) { return y.cols == a->rows && (y.general() || m.random.chance(5)); }) : nullptr;
   Model* r = m.any([&](const Model& y) { return y.symmetric() || m.random.chance(5); });
-  // In a sparse result of a dense X a zero would be stored or not as rounding has it.
-  if (!a || !x || !r || (r->sparse() && x->dense() && !x->empty())) return;
-  m.begin("qxsminvquad", m.number(*a), m.number(*x), m.number(*r));
+  if (!a || !x || !r) return;
+  m.begin("qxsminvquad", *a, *x, *r);
   const SmStatus got = m.fn().qxsminvquad(a->handle, x->handle, r->handle);
   m.answer(got, model_invquad(m, *a, *x, *r));
 }
@@ -193,6 +193,7 @@ SmStatus multiply_diagonals(const Model& a, const Model& b, Model& c, bool keep)
 
 SmStatus model_multiply(const Model& a, const Model& b, Model& c, bool keep) {
   if (a.empty() && b.empty()) return SM_OK;
+  if (a.none()) return SM_UNTYPED;
   if (!a.closed() || !b.closed()) return SM_NOT_CLOSED;
   if (&c == &a || &c == &b) return SM_BAD_ARGUMENT;
   if (a.cols != b.rows || (c.diagonal() && !a.diagonal() && !b.diagonal())) return SM_DIMENSION_MISMATCH;
@@ -209,9 +210,11 @@ SmStatus model_multiply(const Model& a, const Model& b, Model& c, bool keep) {
         entered = true;
         sum.add(a.at(i, k), b.at(k, j));
       }
+      if (!entered && c.sparse() && b.dense() && i < c.rows && j < c.cols && (!c.symmetric() || j >= i))
+        c.leave_open(i, j);
       const SmStatus status = entered ? model_assign(c, i, j, true, sum.value()) : SM_OK;
       if (status != SM_OK && status != SM_BAD_ARGUMENT && status != SM_OUTSIDE) return status;
-      if (sum.slack() > 0) c.slack = std::max(c.slack, sum.slack() + 1e-12);
+      if (sum.slack() > 0) c.slack += sum.slack() + 1e-12;
     }
   return SM_OK;
 }
@@ -226,18 +229,16 @@ bool has_empty_row(const Model& a) {
 }
 
 void call_multiply(Machine& m) {
-  Model* a = m.any([](const Model& y) { return !y.none(); });
-  Model* b =
-      a ? m.any([&](const Model& y) { return !y.none() && (y.rows == a->cols || m.random.chance(3)); }) : nullptr;
+  Model* a = m.any([&](const Model& y) { return !y.none() || m.random.chance(10); });
+  Model* b = a ? m.any([&](const Model& y) { return y.rows == a->cols || m.random.chance(3); }) : nullptr;
   Model* c = m.any();
   if (!a || !b || !c) return;
   const bool keep = m.random.chance(30);
-  // Whether a row without entries times full rows is entered shows in a sparse result only; a kept dense result of another
-  // shape takes elements at places that the position decides.
-  if (c->sparse() && b->dense() && has_empty_row(*a)) return;
-  if (keep && c->dense() && (c->rows != a->rows || c->cols != b->cols)) return;
-  if (keep && c->in_place()) return;
-  m.begin("qxsmmultm", m.number(*a), m.number(*b), m.number(*c), keep);
+  // Whether a row without entries times full rows is entered, and lets a kept sparse result grow, is not told.
+  const bool grows = keep && c->sparse() && (c->rows < a->rows || c->cols < b->cols);
+  const bool closed = c->symmetric_sparse() && (keep || a->rows != b->cols);
+  if ((grows || closed) && b->dense() && has_empty_row(*a)) return;
+  m.begin("qxsmmultm", *a, *b, *c, keep);
   const SmStatus got = qxsmmultm(a->handle, b->handle, c->handle, keep);
   m.answer(got, model_multiply(*a, *b, *c, keep));
 }

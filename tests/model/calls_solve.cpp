@@ -105,7 +105,7 @@ void call_subst(Machine& m) {
   Model* x = m.random.chance(70) ? m.any([](const Model& y) { return y.state == SM_STATE_FACTORED; }) : m.any();
   if (!x || x->spoiled) return;
   Sides s = draw_sides(m, *x);
-  m.begin("qxsmsubst", m.number(*x), s.count, s.same);
+  m.begin("qxsmsubst", *x, s.count, s.same);
   Wanted want(x->rows * 4 + 4);
   const SmStatus got =
       m.fn().qxsmsubst(x->handle, s.b.data(), s.same ? s.b.data() : s.x.data(), static_cast<int>(s.count));
@@ -117,7 +117,7 @@ void call_invmultv(Machine& m) {
   Model* x = solvable(m);
   if (!x) return;
   Sides s = draw_sides(m, *x);
-  m.begin("qxsminvmultv", m.number(*x), s.count, s.same);
+  m.begin("qxsminvmultv", *x, s.count, s.same);
   const SmStatus got = qxsminvmultv(x->handle, s.b.data(), s.same ? s.b.data() : s.x.data(), s.count);
   Wanted want(x->rows * 4 + 4);
   m.answer(got, model_inverse_product(m, *x, s.b.data(), s.same, s.count, want));
@@ -141,11 +141,11 @@ SmStatus solve_diagonal(Model& x, const Sides& s, Wanted& want) {
 }
 
 // The packed road of the one-call solve: the array becomes the generalized inverse.
-SmStatus invert_packed(Model& x) {
+SmStatus invert_packed(Model& x, double tolerance) {
   if (x.state == SM_STATE_INVERTED) return SM_OK;
   Values r = x.second();
   if (x.state < SM_STATE_FACTORED) {
-    const Elimination e = eliminate(x.v, natural_order(x.rows), kTolerance);
+    const Elimination e = eliminate(x.v, natural_order(x.rows), tolerance);
     x.definite = kUnknown;  // the one-call solve says nothing about it
     x.takes_cached = !e.definite;
     if (!e.definite) return SM_NOT_DEFINITE;
@@ -162,10 +162,10 @@ SmStatus invert_packed(Model& x) {
 
 }  // namespace
 
-bool inverse_is_clear(const Model& x) {
+bool inverse_is_clear(const Model& x, double tolerance) {
   if (!x.packed() || !x.closed() || x.empty() || x.state == SM_STATE_INVERTED) return true;
   if (x.state == SM_STATE_FACTORED) return inverse_of_factor(x.second()).clear;
-  const Elimination e = eliminate(x.v, natural_order(x.rows), kTolerance);
+  const Elimination e = eliminate(x.v, natural_order(x.rows), tolerance);
   return e.clear && (!e.definite || inverse_of_factor(packed_factor(e)).clear);
 }
 
@@ -179,7 +179,7 @@ void call_direct(Machine& m) {
   model_close(closed, kNan);
   if (!factor_is_clear(closed) || !inverse_is_clear(closed)) return;
   Sides s = draw_sides(m, *x);
-  m.begin("qxsmsoldirect", m.number(*x), s.count, s.same);
+  m.begin("qxsmsoldirect", *x, s.count, s.same);
   double* to = s.same ? s.b.data() : s.x.data();
   const SmStatus got = m.fn().qxsmsoldirect(x->handle, s.b.data(), to, static_cast<int>(s.count));
   Wanted want(x->rows * 4 + 4);
@@ -193,7 +193,7 @@ void call_direct(Machine& m) {
     m.answer(got, status);
     return finish(m, s, want);
   }
-  status = x->sparse() ? model_factor(*x, false) : invert_packed(*x);
+  status = x->sparse() ? model_factor(*x, false) : invert_packed(*x, kTolerance);
   settle(m, *x);
   m.answer(got, status);
   if (status != SM_OK) return;
@@ -221,7 +221,7 @@ void call_inverse_diagonal(Machine& m) {
   if (!x || !inverse_is_clear(*x)) return;
   std::vector<double> out = m.blank(x->rows + 2);
   Wanted want(x->rows + 2);
-  m.begin("qxsminvdiag", m.number(*x));
+  m.begin("qxsminvdiag", *x);
   const SmStatus got = m.fn().qxsminvdiag(x->handle, out.data());
   SmStatus status = SM_OK;
   if (const auto refused = not_readable(*x)) {
@@ -293,7 +293,7 @@ SmStatus model_invert(Model& x, bool in_place, double tolerance) {
     const Index rank = x.rank;
     const double log_det = x.log_det;
     const int definite = x.definite;
-    const SmStatus status = invert_packed(x);
+    const SmStatus status = invert_packed(x, std::isnan(tolerance) ? kTolerance : tolerance);
     if (status != SM_OK) return status;
     x.definite = factored ? definite : 1;
     if (factored) x.rank = rank, x.log_det = log_det;
@@ -306,11 +306,10 @@ namespace {
 
 void call_invert(Machine& m) {
   Model* x = solvable(m);
-  if (!x || !inverse_is_clear(*x)) return;
   const bool in_place = m.random.chance(50);
-  // Of a packed matrix another tolerance would need pivots that are clear for it.
-  const double tolerance = x->diagonal() && m.random.chance(50) ? 0.25 : kNan;
-  m.begin("qxsminv", m.number(*x), in_place, tolerance);
+  const double tolerance = m.random.chance(50) ? 0.25 : kNan;
+  if (!x || !inverse_is_clear(*x, std::isnan(tolerance) ? kTolerance : tolerance)) return;
+  m.begin("qxsminv", *x, in_place, tolerance);
   const SmStatus got = m.fn().qxsminv(x->handle, in_place ? 1 : 0, tolerance);
   m.answer(got, model_invert(*x, in_place, tolerance));
 }

@@ -21,9 +21,10 @@ bool addable(const Model& g, const Model& b) {
   return g.diagonal() ? b.diagonal() : g.symmetric() && (b.symmetric() || b.diagonal());
 }
 
-// The old block goes to p, which is a packed matrix or, for a diagonal target, a dense one of its kind.
+// The old block goes to p, which a symmetric target sizes.
 SmStatus save_block(const Model& g, Index order, Index off, Model& p) {
-  if (g.symmetric()) model_resize(p, order, order);
+  const SmStatus sized = g.symmetric() ? model_resize(p, order, order) : SM_OK;
+  if (sized != SM_OK) return sized;
   for (Index i = 0; i < order; ++i)
     for (Index j = i; j < (g.diagonal() ? i + 1 : order); ++j) {
       if (!g.stored(off + i, off + j)) continue;
@@ -36,12 +37,13 @@ SmStatus save_block(const Model& g, Index order, Index off, Model& p) {
 SmStatus model_add_block(Model& g, const Model& b, Model* p, Index off, double s, double tolerance) {
   if (g.empty()) return SM_OK;
   if (&g == &b || p == &g || p == &b) return SM_BAD_ARGUMENT;
-  if (!addable(g, b)) return SM_UNAVAILABLE;
+  if (!g.symmetric() && !addable(g, b)) return SM_UNAVAILABLE;
   if (off < 0 || (g.diagonal() && off + b.rows > g.rows)) return SM_BAD_ARGUMENT;
   if (g.symmetric()) {
     if (b.rows != g.rows - off) return SM_DIMENSION_MISMATCH;
+    if (!addable(g, b)) return SM_UNAVAILABLE;
     if (g.sparse() && g.state > SM_STATE_OPEN) return SM_ALREADY_CLOSED;
-    if (!b.closed()) return SM_NOT_CLOSED;
+    if (!b.empty() && !b.closed()) return SM_NOT_CLOSED;
   }
   if (p && !g.general()) {
     const SmStatus status = save_block(g, b.rows, off, *p);
@@ -60,25 +62,21 @@ void call_add_block(Machine& m) {
   const Index off = m.random.below(3) - (m.random.chance(3) ? 1 : 0);
   Model* b = m.any([&](const Model& y) { return addable(*g, y) && (g->general() || y.rows == g->rows - off); });
   if (!b || m.random.chance(5)) b = m.any();
-  Model* p = m.random.chance(40) ? m.any([&](const Model& y) { return y.packed() && y.rows > 0; }) : nullptr;
-  // Left out: operands without elements; an open B of a packed target; a diagonal block that ends before G, of which it
-  // is not told how far the tolerance goes; and a block that is saved where it does not fit.
-  if (!b || b->empty() || (!g->sparse() && !b->closed())) return;
-  if (g->diagonal() && (off + b->rows != g->rows || (p && p->rows < b->rows))) return;
-  // Nor is it told whether a general B is refused for its kind or for its place.
-  if (g->symmetric() && b->general() && (off < 0 || b->rows != g->rows - off)) return;
+  Model* p = m.random.chance(40) ? m.any([&](const Model& y) { return y.packed() || m.random.chance(30); }) : nullptr;
+  // What a dense target keeps when a B without elements is added to it is not told.
+  if (!b || (b->empty() && !g->sparse())) return;
   const double factors[] = {1.0, -1.0, 0.5, 2.0};
   const double tolerances[] = {0.0, 0.0, kNan, -1.0, 2.0};
   const double s = factors[m.random.below(4)];
   const double tolerance = tolerances[m.random.below(5)];
-  m.begin("qxsmAddGinv", m.number(*g), m.number(*b), p ? m.number(*p) : -1, off, s, tolerance);
+  m.begin("qxsmAddGinv", *g, *b, p, off, s, tolerance);
   const SmStatus got = qxsmAddGinv(g->handle, b->handle, p ? p->handle : nullptr, off, s, tolerance);
   m.answer(got, model_add_block(*g, *b, p, off, s, tolerance));
 }
 
 SmStatus model_vaxpy(Model& c, const Model& a, const Model& b, double scale, double tolerance) {
-  if (&c == &b) return SM_BAD_ARGUMENT;
   if (&a == &c) return model_add_block(c, b, nullptr, 0, scale, tolerance);
+  if (&c == &b) return SM_BAD_ARGUMENT;
   if (a.none() || b.none() || c.none()) return SM_UNTYPED;
   if (!a.closed() || !b.closed()) return SM_NOT_CLOSED;
   if (a.rows != b.rows || a.cols != b.cols) return SM_DIMENSION_MISMATCH;
@@ -94,15 +92,40 @@ void call_vaxpy(Machine& m) {
     return (y.rows == a->rows && y.cols == a->cols && y.kind == a->kind) || m.random.chance(3);
   })
                : nullptr;
-  if (!c || !a || !b || b->empty() || a->empty()) return;
-  if (a == c && c->symmetric() && b->general() && b->rows != c->rows) return;  // as for the block
+  if (!c || !a || !b || (b->empty() && !c->sparse())) return;
   const double factors[] = {1.0, -1.0, 0.5, 2.0};
   const double tolerances[] = {0.0, kNan, -1.0, 2.0};
   const double scale = factors[m.random.below(4)];
   const double tolerance = tolerances[m.random.below(4)];
-  m.begin("qxsmvaxpy", m.number(*c), m.number(*a), m.number(*b), scale, tolerance);
+  m.begin("qxsmvaxpy", *c, *a, *b, scale, tolerance);
   const SmStatus got = m.fn().qxsmvaxpy(c->handle, a->handle, b->handle, scale, tolerance);
   m.answer(got, model_vaxpy(*c, *a, *b, scale, tolerance));
+}
+
+void update_sparse(Model& g, const Model& a, const Model& b, Index r, Index c, double s) {
+  for (Index i = 0; i < a.rows; ++i)
+    for (Index j = i; j < a.rows; ++j) {
+      if (r + i < 0 || r + j >= g.rows || !g.stored(r + i, r + j)) continue;
+      const double from_a = element_read(a, i, j);
+      g.v(r + i, r + j) = (std::isnan(s) ? from_a : s * from_a) + element_read(b, c + i, c + j);
+    }
+}
+
+// The values of A are used up one by one; in format 23 the columns end at the order of A.
+void update_packed(Model& g, const Model& a, const Model& b, Index r, Index c, double s) {
+  const std::vector<double> values = array_of(a.kind, a.format, a.v);
+  std::size_t used = 0;
+  for (Index p = r; p < r + a.rows; ++p) {
+    const bool by_columns = g.format == SM_FORMAT_COLUMNS;
+    for (Index q = by_columns ? r : p; q < (by_columns ? p + 1 : a.rows); ++q) {
+      const Index row = c + std::min(p, q) - r;
+      const Index col = c + std::max(p, q) - r;
+      if (std::min(p, q) < 0 || std::max(p, q) >= g.rows || row < 0 || col >= b.rows) continue;
+      const double from_a = std::isnan(s) ? 0.0 : s * values[used];
+      used += 1;
+      g.v(std::min(p, q), std::max(p, q)) = from_a + b.v(row, col);
+    }
+  }
 }
 
 SmStatus model_update(Model& g, const Model& a, const Model& b, Index r, Index c, double s) {
@@ -112,17 +135,12 @@ SmStatus model_update(Model& g, const Model& a, const Model& b, Index r, Index c
   if (!a.symmetric() || !b.symmetric()) return SM_KIND_MISMATCH;
   if (!g.symmetric()) return SM_KIND_MISMATCH;
   if (b.format != g.format || (g.packed() && a.format != g.format)) return SM_UNAVAILABLE;
-  for (Index i = 0; i < a.rows && r + i < g.rows; ++i)
-    for (Index j = i; j < a.rows && r + j < g.rows; ++j) {
-      if (!g.stored(r + i, r + j)) continue;
-      // Packed operands are read as they lie, sparse ones through the element reader.
-      const double from_a = g.packed() ? a.v(i, j) : element_read(a, i, j);
-      const double from_b = g.packed() ? b.v(c + i, c + j) : element_read(b, c + i, c + j);
-      const double scaled = std::isnan(s) ? (g.packed() ? 0.0 : from_a) : s * from_a;
-      g.v(r + i, r + j) = scaled + from_b;
-    }
+  if (g.packed())
+    update_packed(g, a, b, r, c, s);
+  else
+    update_sparse(g, a, b, r, c, s);
   const bool factored = g.state == SM_STATE_FACTORED;
-  if (g.dense() && factored) g.separate = false, g.spoiled = true;
+  if (g.dense() && factored) g.spoiled = !g.separate, g.separate = false;
   if (g.state == SM_STATE_INVERTED) g.changed();
   if (factored) g.state = SM_STATE_SYMBOLIC;
   g.void_results();
@@ -135,18 +153,12 @@ void call_update(Machine& m) {
   Model* a = g ? m.any([&](const Model& y) { return y.format == g->format && y.symmetric(); }) : nullptr;
   if (!a || m.random.chance(10)) a = m.any();
   if (!b || m.random.chance(5)) b = m.any();
-  if (!g || !a || !b || a->empty() || b->empty()) return;
-  Index r = m.random.below(3);
-  Index c = m.random.below(3);
-  // Only the leading blocks of packed operands have a meaning of their own, as far as each of them goes. Elements below
-  // the diagonal of a packed A, and packed places that are not there, are not asked of the element reader.
-  if (g->packed()) {
-    r = c = 0;
-    if (a->rows > g->rows || a->rows > b->rows) return;
-  }
+  if (!g || !a || !b) return;
+  const Index r = m.random.chance(50) ? 0 : m.random.below(4) - 1;
+  const Index c = m.random.chance(50) ? 0 : m.random.below(4) - 1;
   const double factors[] = {1.0, -1.0, 0.5, kNan};
   const double s = factors[m.random.below(4)];
-  m.begin("qxsmUpdateGinv", m.number(*g), m.number(*a), m.number(*b), r, c, s);
+  m.begin("qxsmUpdateGinv", *g, *a, *b, r, c, s);
   const SmStatus got = m.fn().qxsmUpdateGinv(g->handle, a->handle, b->handle, r, c, s);
   m.answer(got, model_update(*g, *a, *b, r, c, s));
 }
@@ -163,6 +175,7 @@ bool remove_component(Model& a, Index i, Index k, double squared, double toleran
     if (std::fabs(value) > 1e-13 && std::fabs(value) < 1e-11) return false;
     a.stored(k, j) = std::fabs(value) < kTolerance;
     a.v(k, j) = a.stored(k, j) ? value : 0.0;
+    a.touched += 1;
   }
   return true;
 }
@@ -194,7 +207,7 @@ void call_orthogonal(Machine& m) {
   std::vector<std::int16_t> left = active;
   const bool served = a->general_sparse() && a->rows == a->cols && !a->empty();
   if (served && !model_orthogonal(after, left, lo, hi, 1e-6)) return;
-  m.begin("qxsmorth", m.number(*a), lo, hi);
+  m.begin("qxsmorth", *a, lo, hi);
   const SmStatus got = qxsmorth(a->handle, active.data(), lo, hi, 1e-6);
   if (const auto refused = not_readable(*a)) return m.answer(got, *refused);
   if (a->rows != a->cols) return m.answer(got, SM_NOT_SQUARE);

@@ -8,6 +8,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <limits>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -80,6 +81,9 @@ struct Model {
   bool reads_factor = false;  // the call has left a new sparse factor: compared within factor_slack, then taken over
   double factor_slack = 0;
   bool takes_cached = false;  // nothing is promised about rank and log-determinant after this answer: take them over
+  Mask open;                  // places of a sparse matrix that may hold a rounded zero or nothing: taken over
+  bool unsure = false;        // a pivot fell too near a limit for a prediction
+  Index touched = 0;          // grows whenever entries, size or type change
 
   bool none() const { return kind == SM_KIND_NONE; }
   bool general() const { return kind == SM_KIND_GENERAL; }
@@ -100,6 +104,7 @@ struct Model {
   Values full() const;                                       // rows x cols
   const Values& second() const { return separate ? w : v; }  // where a factor or an inverse is
   void set(Index r, Index c, double value);                  // stores; the caller has made sure that it fits
+  void leave_open(Index r, Index c);                         // may be stored, as a rounded zero, or not
   void void_results();
   void changed();  // values changed: what becomes of rank, log-determinant and factor of any record
 };
@@ -115,5 +120,10 @@ std::vector<double> array_of(std::int32_t kind, std::int32_t format, const Value
 // Compares a record with its model; takes over what was compared within a slack. Empty when nothing differs.
 std::string difference(Model& model);
 std::string describe(const Model& model);
+// The model of a record as it is found, for a record whose last call was refused memory; nothing when it has lost the
+// storage of its type, so that only a reset or a new size leads on.
+std::optional<Model> found(const Model& before, SmMatrix* handle);
+// Whether the elements of `now` are those of `before`, or those that were predicted instead.
+bool kept(const Model& now, const Model& before, const Model& predicted);
 
 }  // namespace sm::test
