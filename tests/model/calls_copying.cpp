@@ -108,7 +108,8 @@ void call_load(Machine& m) {
   if (!record) return;
   const std::int32_t kinds[] = {SM_KIND_GENERAL, SM_KIND_SYMMETRIC, SM_KIND_DIAGONAL, 5};
   std::int32_t kind = kinds[m.random.below(m.random.chance(5) ? 4 : 3)];
-  std::int32_t format = static_cast<std::int32_t>(22 + m.random.below(2) - (m.random.chance(5) ? 1 : 0));
+  std::int32_t format = static_cast<std::int32_t>(22 + m.random.below(2) - (m.random.chance(10) ? 1 : 0));
+  if (m.random.chance(4)) format = 24;
   // Shapes without elements are left out: whether they fit cannot be told from the values.
   Index rows = 1 + m.order();
   Index cols = kind == SM_KIND_GENERAL && m.random.chance(50) ? 1 + m.order() : rows;

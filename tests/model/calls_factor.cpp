@@ -151,7 +151,7 @@ void call_numeric(Machine& m) {
   if (x->empty() || x->state == SM_STATE_FACTORED) return m.answer(got, SM_OK);
   if (!x->closed()) return m.answer(got, SM_NOT_CLOSED);
   if (x->state > SM_STATE_FACTORED) return m.answer(got, SM_OK);
-  if (x->state != SM_STATE_SYMBOLIC) return m.answer(got, SM_WRONG_STATE);
+  if (x->state != SM_STATE_SYMBOLIC || !x->symmetric_sparse()) return m.answer(got, SM_WRONG_STATE);
   m.answer(got, factor_values(*x));
 }
 

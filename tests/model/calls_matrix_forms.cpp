@@ -21,6 +21,13 @@ Sums form(const Model& a, const Model& x) {
 // Whether rounding could make a zero of the sum, or something else of a zero.
 bool undecided(const Sum& sum) { return sum.slack() > 0 && std::fabs(sum.value()) <= 4 * sum.slack(); }
 
+// A result that is written as a whole has nothing left of what it was.
+void begin_whole(Model& r) {
+  r.separate = r.spoiled = false;
+  if (r.state >= SM_STATE_FACTORED) r.state = SM_STATE_CLOSED;
+  r.void_results();
+}
+
 // A packed result of order r written as a whole.
 SmStatus write_whole(Model& r, const Sums& sums) {
   if (r.rows != sums.rows()) return SM_DIMENSION_MISMATCH;
@@ -29,9 +36,7 @@ SmStatus write_whole(Model& r, const Sums& sums) {
       r.v(i, j) = sums(i, j).value();
       r.slack = std::max(r.slack, sums(i, j).slack());
     }
-  r.separate = r.spoiled = false;
-  if (r.state >= SM_STATE_FACTORED) r.state = SM_STATE_CLOSED;
-  r.void_results();
+  begin_whole(r);
   return SM_OK;
 }
 
@@ -75,7 +80,7 @@ SmStatus model_quad(const Model& a, const Model& x, Model& r, bool keep, const S
 void call_quad(Machine& m) {
   Model* a = m.any([](const Model& y) { return y.rows == y.cols; });
   Model* x = a ? m.any([&](const Model& y) { return y.cols == a->rows || m.random.chance(3); }) : nullptr;
-  Model* r = m.any([&](const Model& y) { return y.symmetric() || m.random.chance(5); });
+  Model* r = m.other({a, x}, [&](const Model& y) { return y.symmetric() || m.random.chance(5); });
   if (!a || !x || !r) return;
   const bool keep = m.random.chance(30);
   const bool fits = a->rows == x->cols;
@@ -116,7 +121,7 @@ SmStatus model_dense_quad(const Model& g, const Values& s, Model& r, bool keep) 
 
 void call_dense_quad(Machine& m) {
   Model* g = m.any([&](const Model& y) { return y.general_sparse() || m.random.chance(5); });
-  Model* r = m.any([&](const Model& y) { return y.symmetric_sparse() || m.random.chance(5); });
+  Model* r = m.other({g}, [&](const Model& y) { return y.symmetric_sparse() || m.random.chance(5); });
   if (!g || !r) return;
   const bool keep = m.random.chance(30);
   Values s(g->cols, g->cols);
@@ -166,7 +171,7 @@ void call_invquad(Machine& m) {
   Model* a = solvable(m);
   Model* x =
       a ? m.any([&](const Model& y) { return y.cols == a->rows && (y.general() || m.random.chance(5)); }) : nullptr;
-  Model* r = m.any([&](const Model& y) { return y.symmetric() || m.random.chance(5); });
+  Model* r = m.other({a, x}, [&](const Model& y) { return y.symmetric() || m.random.chance(5); });
   if (!a || !x || !r) return;
   m.begin("qxsminvquad", *a, *x, *r);
   const SmStatus got = m.fn().qxsminvquad(a->handle, x->handle, r->handle);
@@ -181,7 +186,7 @@ bool product_is_served(const Model& a, const Model& b) {
 
 SmStatus multiply_diagonals(const Model& a, const Model& b, Model& c, bool keep) {
   if (c.diagonal() && c.rows != a.rows) return SM_DIMENSION_MISMATCH;
-  if (c.diagonal()) c.changed();
+  if (c.diagonal()) begin_whole(c);
   for (Index i = 0; i < a.rows; ++i) {
     const double value = a.v(i, i) * b.v(i, i);
     if (c.diagonal()) c.v(i, i) = value;
@@ -231,7 +236,7 @@ bool has_empty_row(const Model& a) {
 void call_multiply(Machine& m) {
   Model* a = m.any([&](const Model& y) { return !y.none() || m.random.chance(10); });
   Model* b = a ? m.any([&](const Model& y) { return y.rows == a->cols || m.random.chance(3); }) : nullptr;
-  Model* c = m.any();
+  Model* c = m.other({a, b}, [](const Model&) { return true; });
   if (!a || !b || !c) return;
   const bool keep = m.random.chance(30);
   // Whether a row without entries times full rows is entered, and lets a kept sparse result grow, is not told.
@@ -246,7 +251,7 @@ void call_multiply(Machine& m) {
 }  // namespace
 
 void add_matrix_form_calls(std::vector<Call>& list) {
-  list.insert(list.end(), {{call_quad, 14}, {call_dense_quad, 8}, {call_invquad, 10}, {call_multiply, 16}});
+  list.insert(list.end(), {{call_quad, 16}, {call_dense_quad, 8}, {call_invquad, 16}, {call_multiply, 22}});
 }
 
 }  // namespace sm::test

@@ -91,6 +91,6 @@ void call_sum(Machine& m) {
 
 }  // namespace
 
-void add_product_calls(std::vector<Call>& list) { list.insert(list.end(), {{call_mults, 8}, {call_sum, 10}}); }
+void add_product_calls(std::vector<Call>& list) { list.insert(list.end(), {{call_mults, 8}, {call_sum, 20}}); }
 
 }  // namespace sm::test

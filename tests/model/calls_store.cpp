@@ -76,8 +76,10 @@ SmStatus type_status(std::int32_t kind, std::int32_t format) {
   return array || (format == SM_FORMAT_SPARSE && kind != SM_KIND_DIAGONAL) ? SM_OK : SM_BAD_FORMAT;
 }
 
-std::array<std::int32_t, 2> draw_type(Machine& m) {
-  auto type = kTypes[static_cast<std::size_t>(m.random.below(8))];
+// Each record has a type that it mostly takes, so that the pool has some of every type.
+std::array<std::int32_t, 2> draw_type(Machine& m, const Model& record) {
+  const Index usual = m.number(record) % static_cast<Index>(kTypes.size());
+  auto type = kTypes[static_cast<std::size_t>(m.random.chance(70) ? usual : m.random.below(8))];
   if (m.random.chance(3)) type[0] = static_cast<std::int32_t>(m.random.below(8));
   if (m.random.chance(3)) type[1] = static_cast<std::int32_t>(20 + m.random.below(5));
   return type;
@@ -85,14 +87,14 @@ std::array<std::int32_t, 2> draw_type(Machine& m) {
 
 // A record to be typed: a new one, or one that was reset. A typed one would lose what it holds.
 Model* untyped(Machine& m) {
-  Model* record = m.random.chance(50) ? m.vacant() : m.any([](const Model& x) { return x.none(); });
+  Model* record = m.random.chance(50) ? m.vacant() : m.only([](const Model& x) { return x.none(); });
   return record;
 }
 
 void call_new(Machine& m) {
   Model* record = untyped(m);
   if (!record) return;
-  const auto [kind, format] = draw_type(m);
+  const auto [kind, format] = draw_type(m, *record);
   m.begin("qxsmnew", *record, kind, format);
   m.asks_for(kind, format);
   const SmStatus want = type_status(kind, format);
@@ -178,7 +180,7 @@ SmStatus model_tie(Model& m, double* data, Index rows, Index cols, std::int32_t 
 void call_tie(Machine& m) {
   Model* record = m.random.chance(35) ? m.any([](const Model& x) { return x.none(); }) : m.any();
   if (!record) return;
-  const auto [kind, format] = draw_type(m);
+  const auto [kind, format] = draw_type(m, *record);
   const Index rows = m.order();
   Index cols = (kind == SM_KIND_GENERAL && m.random.chance(50)) || m.random.chance(3) ? m.order() : rows;
   if (m.random.chance(3)) cols = -1;

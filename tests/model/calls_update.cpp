@@ -60,9 +60,9 @@ void call_add_block(Machine& m) {
   Model* g = m.any([&](const Model& y) { return !y.general() || y.sparse() || m.random.chance(5); });
   if (!g) return;
   const Index off = m.random.below(3) - (m.random.chance(3) ? 1 : 0);
-  Model* b = m.any([&](const Model& y) { return addable(*g, y) && (g->general() || y.rows == g->rows - off); });
+  Model* b = m.other({g}, [&](const Model& y) { return addable(*g, y) && (g->general() || y.rows == g->rows - off); });
   if (!b || m.random.chance(5)) b = m.any();
-  Model* p = m.random.chance(40) ? m.any([&](const Model& y) { return y.packed() || m.random.chance(30); }) : nullptr;
+  Model* p = m.random.chance(40) ? m.other({g, b}, [&](const Model& y) { return y.packed() || m.random.chance(30); }) : nullptr;
   // What a dense target keeps when a B without elements is added to it is not told.
   if (!b || (b->empty() && !g->sparse())) return;
   const double factors[] = {1.0, -1.0, 0.5, 2.0};
@@ -88,10 +88,9 @@ SmStatus model_vaxpy(Model& c, const Model& a, const Model& b, double scale, dou
 void call_vaxpy(Machine& m) {
   Model* c = m.any();
   Model* a = m.random.chance(15) ? c : m.any();
-  Model* b = a ? m.any([&](const Model& y) {
-    return (y.rows == a->rows && y.cols == a->cols && y.kind == a->kind) || m.random.chance(3);
-  })
-               : nullptr;
+  Model* b = m.other({c}, [&](const Model& y) {
+    return c && a && y.rows == a->rows && y.cols == a->cols && addable(*c, y);
+  });
   if (!c || !a || !b || (b->empty() && !c->sparse())) return;
   const double factors[] = {1.0, -1.0, 0.5, 2.0};
   const double tolerances[] = {0.0, kNan, -1.0, 2.0};
@@ -149,8 +148,9 @@ SmStatus model_update(Model& g, const Model& a, const Model& b, Index r, Index c
 
 void call_update(Machine& m) {
   Model* g = m.any([&](const Model& y) { return y.symmetric() || m.random.chance(3); });
-  Model* b = g ? m.any([&](const Model& y) { return y.format == g->format && y.symmetric(); }) : nullptr;
-  Model* a = g ? m.any([&](const Model& y) { return y.format == g->format && y.symmetric(); }) : nullptr;
+  const auto fits = [&](const Model& y) { return g && y.format == g->format && y.symmetric(); };
+  Model* b = m.other({g}, fits);
+  Model* a = m.other({g}, fits);
   if (!a || m.random.chance(10)) a = m.any();
   if (!b || m.random.chance(5)) b = m.any();
   if (!g || !a || !b) return;
@@ -220,7 +220,7 @@ void call_orthogonal(Machine& m) {
 }  // namespace
 
 void add_update_calls(std::vector<Call>& list) {
-  list.insert(list.end(), {{call_add_block, 14}, {call_vaxpy, 14}, {call_update, 14}, {call_orthogonal, 6}});
+  list.insert(list.end(), {{call_add_block, 14}, {call_vaxpy, 18}, {call_update, 18}, {call_orthogonal, 6}});
 }
 
 }  // namespace sm::test

@@ -7,7 +7,7 @@
 namespace sm::test {
 
 namespace {
-constexpr std::size_t kRecords = 7;
+constexpr std::size_t kRecords = 10;
 }
 
 void Machine::print(std::ostream& text, const Model& model) {
@@ -60,13 +60,24 @@ Model* Machine::any() {
 }
 
 Model* Machine::any(const std::function<bool(const Model&)>& test) {
-  for (int draw = 0; draw < 12; ++draw) {
+  return only([&](const Model& m) { return wide_ || test(m); });
+}
+
+Model* Machine::only(const std::function<bool(const Model&)>& test) {
+  for (int draw = 0; draw < 20; ++draw) {
     Model& m = records_[static_cast<std::size_t>(random.below(kRecords))];
     if (!m.handle || !test(m)) continue;
     drawn_[static_cast<std::size_t>(number(m))] = true;
     return &m;
   }
   return nullptr;
+}
+
+Model* Machine::other(const std::vector<const Model*>& taken, const std::function<bool(const Model&)>& test) {
+  const bool any_at_all = random.chance(5);
+  return any([&](const Model& x) {
+    return test(x) && (any_at_all || std::find(taken.begin(), taken.end(), &x) == taken.end());
+  });
 }
 
 Model* Machine::vacant() {

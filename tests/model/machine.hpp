@@ -63,9 +63,13 @@ class Machine {
   SmInstance* instance() { return session_.instance(); }
   SmExtension* extension() { return session_.extension(); }
   const SmFunctionTable& fn() { return session_.fn(); }
-  // A record of the pool with a handle; one whose model passes the test, as far as a few draws find it; or null.
+  // A record of the pool with a handle; one whose model passes the test, as far as a few draws find it; or null. In some
+  // steps the test is passed over, so that every type comes to every place: only() always asks it.
   Model* any();
   Model* any(const std::function<bool(const Model&)>& test);
+  Model* only(const std::function<bool(const Model&)>& test);
+  // Likewise, and rarely one of those that the call has already.
+  Model* other(const std::vector<const Model*>& taken, const std::function<bool(const Model&)>& test);
   Model* vacant();                                  // without a handle
   double* lend(const std::vector<double>& values);  // an array that lives as long as the session
   // An array of n places that holds kUntouched.
@@ -133,6 +137,7 @@ class Machine {
   Index stretch_ = 0;  // steps until the usual order changes
   bool faulty_ = false;  // a request of the next call is going to be refused
   bool armed_ = false;
+  bool wide_ = false;  // the step passes over what the generators look for
   Index refused_ = 0;
   Index reader_ = 0;
 };

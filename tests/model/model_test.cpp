@@ -19,7 +19,7 @@ constexpr std::uint64_t kOnceFailed[] = {1};
 
 struct Seeds {
   unsigned long long first = 1;
-  unsigned long long last = 24;
+  unsigned long long last = 80;
 };
 
 Seeds seeds() {

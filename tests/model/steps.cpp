@@ -10,7 +10,8 @@ void Machine::start_step() {
   drawn_.assign(drawn_.size(), false);
   name_.clear();
   refused_ = 0;
-  faulty_ = random.chance(4);
+  faulty_ = random.chance(6);
+  wide_ = random.chance(20);
   if (stretch_-- > 0) return;
   stretch_ = 60 + random.below(120);
   usual_order_ = random.chance(20)   ? random.below(4)
