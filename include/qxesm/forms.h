@@ -58,7 +58,7 @@ QXESM_API SmStatus qxsmbilin(SmMatrix* a, const double* x, const double* y, doub
  * log-determinant.
  * Answers: 0 with R untouched (empty A); 1 (A); 113 (A or X); 104 (R is A or X); 121 (X's columns are not A's rows);
  * 110 (R not symmetric); then, R having been sized, 124 (pair not served); 118 (X symmetric sparse past state 2); 105;
- * 101; 121 (written as a whole: R is not of the order of X's rows, or has no array); the answer of qxsmassign that
+ * 101; 111 (A general and not square); 121 (written as a whole: R is not of the order of X's rows, or has no array); the answer of qxsmassign that
  * ended it; that of qxsmclose; 0. The answer of sizing R is passed over, except that a result that has no array for
  * want of memory is told by 101 or 105.
  * Work: by vectors a packed form and the copy of X; by rows 2n doubles, and an index of a symmetric sparse X.

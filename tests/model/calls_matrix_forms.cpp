@@ -7,6 +7,24 @@ namespace {
 
 using Sums = Table<Sum>;
 
+double largest(const Model& m) {
+  double most = 0;
+  for (Index r = 0; r < m.rows; ++r)
+    for (Index c = 0; c < m.cols; ++c) most = std::max(most, std::fabs(m.v(r, c)));
+  return most;
+}
+
+// Elements that products of small dyadics can be added to without rounding.
+bool small_dyadics(const Model& m) {
+  for (Index r = 0; r < m.rows; ++r)
+    for (Index c = 0; c < m.cols; ++c)
+      if (std::ldexp(m.v(r, c), 24) != std::floor(std::ldexp(m.v(r, c), 24))) return false;
+  return true;
+}
+
+// How far an element may be off when a value that is not known to the bit is added to it.
+double rounding(const Model& m) { return 1e-12 + 4 * kEps * largest(m); }
+
 // X A X' for the elements as they are, both triangles of a symmetric matrix.
 Sums form(const Model& a, const Model& x) {
   Sums out(x.rows, x.rows);
@@ -30,7 +48,7 @@ void begin_whole(Model& r) {
 
 // A packed result of order r written as a whole.
 SmStatus write_whole(Model& r, const Sums& sums) {
-  if (r.rows != sums.rows()) return SM_DIMENSION_MISMATCH;
+  if (r.rows != sums.rows() || r.empty()) return SM_DIMENSION_MISMATCH;  // one of order 0 has no array
   for (Index i = 0; i < r.rows; ++i)
     for (Index j = i; j < r.rows; ++j) {
       r.v(i, j) = sums(i, j).value();
@@ -47,16 +65,16 @@ SmStatus enter(Model& r, const Sums& sums, bool by_columns, bool zeros) {
     for (Index b = by_columns ? 0 : a; b < (by_columns ? a + 1 : n); ++b) {
       const Sum& sum = by_columns ? sums(b, a) : sums(a, b);
       if (!zeros && undecided(sum) && r.sparse()) {
-        r.slack = std::max(r.slack, 2 * sum.slack() + 1e-12);
+        r.slack = std::max(r.slack, 2 * sum.slack() + rounding(r));
         r.unsure = r.unsure || r.state != SM_STATE_OPEN || std::max(a, b) >= r.rows;  // refused, or grown, or not
         if (!r.unsure) r.leave_open(std::min(a, b), std::max(a, b));
         continue;
       }
-      if (sum.slack() > 0) r.slack = std::max(r.slack, sum.slack() + 1e-12);
+      if (sum.slack() > 0) r.slack = std::max(r.slack, sum.slack() + rounding(r));
       if (sum.value() == 0 && !zeros) continue;
       const SmStatus status = model_assign(r, by_columns ? b : a, by_columns ? a : b, true, sum.value());
       if (status != SM_OK) return status;
-      if (sum.slack() > 0) r.slack = std::max(r.slack, sum.slack() + 1e-12);
+      if (sum.slack() > 0) r.slack = std::max(r.slack, sum.slack() + rounding(r));
     }
   return SM_OK;
 }
@@ -71,6 +89,7 @@ SmStatus model_quad(const Model& a, const Model& x, Model& r, bool keep, const S
   const bool by_vectors = x.general() && x.dense();
   if (!by_vectors && !a.symmetric()) return SM_UNAVAILABLE;
   if (x.symmetric_sparse() && x.state > SM_STATE_ORDERED) return SM_REORDERED;
+  if (by_vectors && a.rows != a.cols) return SM_NOT_SQUARE;
   const bool whole = by_vectors && r.format == SM_FORMAT_COLUMNS;
   const SmStatus status = whole ? write_whole(r, sums) : enter(r, sums, by_vectors, false);
   if (status != SM_OK) return status;
@@ -114,7 +133,7 @@ SmStatus model_dense_quad(const Model& g, const Values& s, Model& r, bool keep) 
           if (g.stored(i, k) && g.stored(l, j)) sum.add(g.v(i, k), s(std::min(k, j), std::max(k, j)), g.v(l, j));
       const SmStatus status = model_assign(r, i, l, true, sum.value());
       if (status != SM_OK) return status;
-      if (sum.slack() > 0) r.slack = std::max(r.slack, sum.slack() + 1e-12);
+      if (sum.slack() > 0) r.slack = std::max(r.slack, sum.slack() + rounding(r));
     }
   return keep ? SM_OK : model_close(r, kNan);
 }
@@ -206,6 +225,8 @@ SmStatus model_multiply(const Model& a, const Model& b, Model& c, bool keep) {
   if (!product_is_served(a, b)) return SM_UNAVAILABLE;
   if (a.empty() || b.empty()) return SM_OK;
   if (a.diagonal() && b.diagonal()) return multiply_diagonals(a, b, c, keep);
+  const double there = small_dyadics(c) ? 0 : largest(c);
+  const bool folded = c.general() && c.dense() && (c.rows != a.rows || c.cols != b.cols);  // places meet again
   for (Index i = 0; i < a.rows; ++i)
     for (Index j = 0; j < b.cols; ++j) {
       Sum sum;
@@ -219,8 +240,11 @@ SmStatus model_multiply(const Model& a, const Model& b, Model& c, bool keep) {
         c.leave_open(i, j);
       const SmStatus status = entered ? model_assign(c, i, j, true, sum.value()) : SM_OK;
       if (status != SM_OK && status != SM_BAD_ARGUMENT && status != SM_OUTSIDE) return status;
-      if (sum.slack() > 0) c.slack += sum.slack() + 1e-12;
+      // The products are entered one by one, and may round against what is there.
+      if (there > 0 && entered) sum.widen(8 * static_cast<double>(a.cols + 1) * kEps * there);
+      if (sum.slack() > 0) c.slack = std::max(c.slack, sum.slack()) + (folded ? sum.slack() : 0);
     }
+  if (c.slack > 0) c.slack += rounding(c);
   return SM_OK;
 }
 

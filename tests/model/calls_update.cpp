@@ -87,10 +87,9 @@ SmStatus model_vaxpy(Model& c, const Model& a, const Model& b, double scale, dou
 
 void call_vaxpy(Machine& m) {
   Model* c = m.any();
-  Model* a = m.random.chance(15) ? c : m.any();
-  Model* b = m.other({c}, [&](const Model& y) {
-    return c && a && y.rows == a->rows && y.cols == a->cols && addable(*c, y);
-  });
+  Model* b = m.other({c}, [&](const Model& y) { return c && addable(*c, y); });
+  const auto fits = [&](const Model& y) { return b && y.rows == b->rows && y.cols == b->cols; };
+  Model* a = m.random.chance(15) ? c : m.other({c}, fits);
   if (!c || !a || !b || (b->empty() && !c->sparse())) return;
   const double factors[] = {1.0, -1.0, 0.5, 2.0};
   const double tolerances[] = {0.0, kNan, -1.0, 2.0};

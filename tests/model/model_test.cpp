@@ -13,7 +13,7 @@
 namespace sm::test {
 namespace {
 
-constexpr Index kSteps = 3000;
+constexpr Index kSteps = 4000;
 // Seeds that have found a difference once.
 constexpr std::uint64_t kOnceFailed[] = {1};
 
