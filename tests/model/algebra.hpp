@@ -14,8 +14,8 @@ using Reals = Table<Real>;
 constexpr double kTolerance = 1.110223024625157e-12;  // settings 0 to 2
 constexpr double kEps = 2.220446049250313e-16;
 
-// A sum of products: its value, and how far the same sum in another order may be from it. Small multiples of 2^-30 cannot
-// round, so that their sums have no slack.
+// A sum of products: its value, and how far the same sum in another order may be from it. Small multiples of 2^-30
+// cannot round, so that their sums have no slack.
 class Sum {
  public:
   void add(Real a, Real b = 1, Real c = 1) {
@@ -40,8 +40,8 @@ class Sum {
   int terms_ = 0;
 };
 
-// A = U'DU by the rule of the pivots, in a given order of the rows. `clear` is false when a pivot is so near a limit, or
-// so small, that rounding could decide otherwise or spoil what follows.
+// A = U'DU by the rule of the pivots, in a given order of the rows. `clear` is false when a pivot is so near a limit,
+// or so small, that rounding could decide otherwise or spoil what follows.
 struct Elimination {
   bool clear = true;
   bool definite = true;  // false: 103, and the rest is not filled
@@ -62,8 +62,8 @@ bool clear_in_some_orders(const Values& a);
 // R with R'R = A: sqrt(D) U, zero in dropped rows.
 Values packed_factor(const Elimination& e);
 
-// The generalized inverse that belongs to a packed factor: the inverse of the accepted block, zero elsewhere. Empty rows
-// mean that its error could not be bounded usefully.
+// The generalized inverse that belongs to a packed factor: the inverse of the accepted block, zero elsewhere. It is not
+// clear when its error could not be bounded usefully.
 struct Inverse {
   bool clear = true;
   Values g;

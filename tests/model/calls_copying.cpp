@@ -18,6 +18,7 @@ void copy_factored(const Model& source, Model& target) {
 SmStatus model_clone(const Model& source, Model& target, bool reassemble) {
   if (source.none()) return SM_UNTYPED;
   if (!source.closed()) return SM_NOT_CLOSED;
+  target.word = source.word;
   const SmStatus sized = model_resize(target, source.rows, source.cols);
   if (sized != SM_OK) return sized;
   if (source.empty()) {

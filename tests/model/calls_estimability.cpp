@@ -75,7 +75,7 @@ SmStatus want_estimable(Machine& m, Model& a, const std::vector<double>& x, Inde
 
 void call_estimable(Machine& m) {
   Model* a = m.random.chance(70) ? solvable(m) : m.any([](const Model& y) { return y.general_sparse(); });
-  if (!a) return;
+  if (!a || a->spoiled || !factor_is_clear(*a)) return;
   const Index k = m.random.below(4);
   const char mode = m.random.chance(a->general() ? 90 : 5) ? 'H' : 'G';
   std::vector<double> x = m.dyadics(kBlock);
@@ -161,10 +161,12 @@ void call_hermite(Machine& m) {
 struct Progress {
   Index last = 0;
   Index stop = -1;
+  Index word = 0;
 };
 
-std::int32_t follow(void* context, double, std::int64_t, std::int64_t iteration) {
+std::int32_t follow(void* context, double, std::int64_t word, std::int64_t iteration) {
   auto& progress = *static_cast<Progress*>(context);
+  progress.word = word;
   progress.last = std::max(progress.last, iteration);
   return iteration == progress.stop;
 }
@@ -219,6 +221,7 @@ void check_iteration(Machine& m, const Model& a, const Iteration& t, SmStatus go
     if (a.diagonal() && want == SM_OK) check_quotients(m, a, t);
   } else {
     const Index limit = t.limit < 1 ? a.rows + 2 : t.limit;
+    if (t.progress.last > 0 && t.progress.word != a.word) m.wrong("another user word was told");
     if (t.steps < 0 || t.steps > limit || t.progress.last < t.steps) m.wrong("steps that were not told");
     if (got == SM_OK && dominant(a)) check_solution(m, a, t);
   }
@@ -244,6 +247,7 @@ void call_iterative(Machine& m) {
   if (m.random.chance(20)) t.limit = m.random.below(3);
   if (t.limit == 500 && dominant(*a) && m.random.chance(10)) t.progress.stop = 1;
   const bool same = m.random.chance(3);
+  if (!a->none()) a->word = a->handle->solver_word = m.random.below(100);
   t.b = m.dyadics(kBlock);
   t.x = m.blank(kBlock);
   m.begin("qxsmsetprogress");

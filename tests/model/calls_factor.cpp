@@ -99,6 +99,7 @@ SmStatus model_factor(Model& m, bool in_place) {
   if (!in_place) m.w = m.v;
   const SmStatus status = m.diagonal() ? factor_diagonal(m, target) : factor_packed(m, target);
   if (status == SM_OK) m.state = SM_STATE_FACTORED;
+  m.leftover = m.leftover || status != SM_OK;
   if (m.separate) m.slack = 0;
   return status;
 }

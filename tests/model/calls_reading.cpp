@@ -20,7 +20,8 @@ SmStatus want_element(const Model& x, Index row, Index col, double& value) {
     // The place is counted as for any pair; one outside the array is an index outside.
     const std::vector<double> array = array_of(x.kind, x.format, x.v);
     const Index n = x.rows;
-    const Index at = x.format == SM_FORMAT_COLUMNS ? row + col * (col + 1) / 2 : (2 * n - row + 1) * row / 2 - row + col;
+    const Index at =
+        x.format == SM_FORMAT_COLUMNS ? row + col * (col + 1) / 2 : (2 * n - row + 1) * row / 2 - row + col;
     if (at < 0 || at >= static_cast<Index>(array.size())) return SM_OUTSIDE;
     value = array[static_cast<std::size_t>(at)];
     return SM_OK;

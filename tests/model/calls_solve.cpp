@@ -284,6 +284,7 @@ SmStatus model_invert(Model& x, bool in_place, double tolerance) {
   if (factored && x.separate && in_place) move_separate(x);
   if (!factored) x.separate = !in_place;
   if (!factored && !in_place) x.w = x.v;
+  x.leftover = true;  // unless it ends well
   Values& target = x.separate ? x.w : x.v;
   if (x.diagonal()) {
     const SmStatus status = invert_diagonal(x, target, std::isnan(tolerance) ? kTolerance : tolerance);
@@ -299,6 +300,7 @@ SmStatus model_invert(Model& x, bool in_place, double tolerance) {
     if (factored) x.rank = rank, x.log_det = log_det;
   }
   x.state = SM_STATE_INVERTED;
+  x.leftover = false;
   return SM_OK;
 }
 

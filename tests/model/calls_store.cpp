@@ -29,6 +29,7 @@ SmStatus model_resize(Model& m, Index rows, Index cols) {
   m.state = SM_STATE_CLOSED;
   if (!m.general() && rows != cols) {
     m.spoiled = false;
+    m.leftover = m.leftover || m.separate;
     m.perm.clear();
     return SM_NOT_SQUARE;
   }
@@ -37,7 +38,7 @@ SmStatus model_resize(Model& m, Index rows, Index cols) {
   m.cols = cols;
   m.v = Values(rows, cols);
   m.stored = m.sparse() ? Mask(rows, cols) : places(m.kind, rows, cols);
-  m.separate = m.compressed = m.spoiled = false;
+  m.separate = m.compressed = m.spoiled = m.leftover = false;
   m.w = Values();
   m.open = Mask();
   m.perm.clear();

@@ -62,7 +62,8 @@ void call_add_block(Machine& m) {
   const Index off = m.random.below(3) - (m.random.chance(3) ? 1 : 0);
   Model* b = m.other({g}, [&](const Model& y) { return addable(*g, y) && (g->general() || y.rows == g->rows - off); });
   if (!b || m.random.chance(5)) b = m.any();
-  Model* p = m.random.chance(40) ? m.other({g, b}, [&](const Model& y) { return y.packed() || m.random.chance(30); }) : nullptr;
+  Model* p = m.random.chance(40) ? m.other({g, b}, [&](const Model& y) { return y.packed() || m.random.chance(30); })
+                                 : nullptr;
   // What a dense target keeps when a B without elements is added to it is not told.
   if (!b || (b->empty() && !g->sparse())) return;
   const double factors[] = {1.0, -1.0, 0.5, 2.0};

@@ -83,6 +83,7 @@ std::int64_t Coverage::records_of_order(std::int64_t least, std::int64_t most) c
 
 std::string Coverage::table() const {
   std::ostringstream text;
+  text << calls() << " calls, " << refused_ << " refused requests\n";
   for (const auto& [name, answers] : answers_) {
     text << name << ": " << calls(name) << " calls, answers";
     for (const auto& [answer, count] : answers) text << " " << answer << " x" << count;

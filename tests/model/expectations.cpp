@@ -96,8 +96,8 @@ bool added(int g, int b) {
 bool alike(int a, int b) { return a == b; }
 bool every(int, int) { return true; }
 
-// An operation of several matrices: every pair of types is met at the two places, those that `serves` names are answered
-// 0. An operation may stand here more than once, for its other places.
+// An operation of several matrices: every pair of types is met at the two places, those that `serves` names are
+// answered 0. An operation may stand here more than once, for its other places.
 struct OfTwo {
   const char* name;
   std::size_t first;
@@ -110,38 +110,67 @@ const std::vector<OfTwo>& of_two() {
   static const std::vector<OfTwo> list = {
       {"qxsmclone", 0, 1, alike, {0, 1, 101, 110, 113}},
       {"qxsmconvert", 0, 1, convertible, {0, 1, 101, 111, 113, 124}},
-      {"qxsmtraceAB", 0, 1, [](int a, int b) { return general(a) ? general(b) : a != 4 || !general(b); },
+      {"qxsmtraceAB",
+       0,
+       1,
+       [](int a, int b) { return general(a) ? general(b) : a != 4 || !general(b); },
        {0, 100, 113, 121, 124}},
       {"qxsmtraceinvAB", 0, 1, [](int a, int) { return !general(a); }, {0, 100, 101, 103, 111, 113, 117, 118, 124}},
       {"qxsmAddSS", 0, 1, accumulated, {0, 110, 119, 121, 124}},
       {"qxsmAddSS_10", 0, 1, accumulated, {0, 110, 119, 121, 124}},
       {"qxsmAddGinv", 0, 1, added, {0, 104, 113, 119, 121, 124}},
-      {"qxsmUpdateGinv", 0, 1, [](int g, int a) { return g == 3 ? symmetric(a) : packed(g) && a == g; },
+      {"qxsmUpdateGinv",
+       0,
+       1,
+       [](int g, int a) { return g == 3 ? symmetric(a) : packed(g) && a == g; },
        {0, 104, 110, 113, 124}},
       {"qxsmUpdateGinv", 0, 2, [](int g, int b) { return symmetric(g) && b == g; }, {}},
-      {"qxsmhermite", 0, 1, [](int a, int h) { return symmetric(a) ? general(h) : diagonal(a) && !symmetric(h); },
+      {"qxsmhermite",
+       0,
+       1,
+       [](int a, int h) { return symmetric(a) ? general(h) : diagonal(a) && !symmetric(h); },
        {0, 101, 103, 104, 110, 113, 120, 123, 124}},
-      {"qxsmquad", 0, 1, [](int a, int x) { return symmetric(a) || (general(x) && !sparse(x)); },
+      {"qxsmquad",
+       0,
+       1,
+       [](int a, int x) { return symmetric(a) || (general(x) && !sparse(x)); },
        {0, 101, 104, 110, 113, 118, 119, 121, 124}},
       {"qxsmquad", 0, 2, [](int, int r) { return symmetric(r); }, {}},
       {"qxsmquad", 1, 2, [](int, int r) { return symmetric(r); }, {}},
       {"qxsmDenseQuad", 0, 1, [](int g, int r) { return g == 0 ? r == 3 : !sparse(g); }, {0, 101, 104, 113, 119, 124}},
-      {"qxsminvquad", 0, 1, [](int a, int x) { return !general(a) && general(x); }, {0, 101, 103, 104, 110, 113, 120, 124}},
+      {"qxsminvquad",
+       0,
+       1,
+       [](int a, int x) { return !general(a) && general(x); },
+       {0, 101, 103, 104, 110, 113, 120, 124}},
       {"qxsminvquad", 0, 2, [](int a, int r) { return !general(a) && symmetric(r); }, {}},
       {"qxsminvquad", 1, 2, [](int x, int r) { return general(x) && symmetric(r); }, {}},
       {"qxsmmultm", 0, 1, multiplied, {0, 101, 104, 113, 119, 121, 124}},
       {"qxsmmultm", 0, 2, every, {}},
       {"qxsmmultm", 1, 2, every, {}},
-      {"qxsmvaxpy", 1, 2, [](int a, int b) { return b == 0 || (!general(a) && !general(b)); }, {0, 1, 104, 113, 119, 121, 124}},
-      {"qxsmvaxpy", 0, 1, [](int c, int a) { return convertible(a, c) && (c != 3 || a == 3) && (!general(c) || c == 0); }, {}},
+      {"qxsmvaxpy",
+       1,
+       2,
+       [](int a, int b) { return b == 0 || (!general(a) && !general(b)); },
+       {0, 1, 104, 113, 119, 121, 124}},
+      {"qxsmvaxpy",
+       0,
+       1,
+       [](int c, int a) { return convertible(a, c) && (c != 3 || a == 3) && (!general(c) || c == 0); },
+       {}},
   };
   return list;
 }
 
-
 std::string type_name(int t) {
-  return std::to_string(kTypes[static_cast<std::size_t>(t)][0]) + "/" + std::to_string(kTypes[static_cast<std::size_t>(t)][1]);
+  return std::to_string(kTypes[static_cast<std::size_t>(t)][0]) + "/" +
+         std::to_string(kTypes[static_cast<std::size_t>(t)][1]);
 }
+
+// What takes no matrix, or makes one of its own type.
+constexpr const char* kOthers[] = {"qxsmnewss",      "qxsmnewds",           "qxsmnewsg",           "qxsmnewsd",
+                                   "CreateInstance", "qxsmGetANewInstance", "qxsmDestroyInstance", "qxsmGetReqVersion",
+                                   "qxsmGetVersion", "qxsmsetprogress"};
 
 class Missing {
  public:
@@ -174,6 +203,25 @@ class Missing {
         if (operation.serves(t, u)) expect(count.served > 0, what + " is not served");
       }
   }
+  void situation(const std::string& text) {
+    expect(coverage_.records(text) >= 20, "records of " + text + " are met too rarely");
+  }
+  // Kinds and formats in the states that they can be in, and orders.
+  void records() {
+    for (const char* type : {"2/21", "2/22", "2/23", "3/22", "3/23", "6/22", "6/23"})
+      situation(std::string(type) + " state 1");
+    for (const char* type : {"2/22", "2/23", "3/22", "3/23", "6/22", "6/23"})
+      for (const char* state : {" state 0 tied", " state 1 tied"}) situation(std::string(type) + state);
+    for (const char* state : {"0", "1", "2", "3", "4", "5"}) situation(std::string("3/21 state ") + state);
+    for (const char* type : {"3/22", "3/23", "6/22", "6/23"})
+      for (const char* state : {" state 5", " state 6"})
+        for (const char* place : {" separate", " in place"}) situation(std::string(type) + state + place);
+    for (const char* type : {"3/22", "3/23"}) situation(std::string(type) + " state 4");
+    for (std::int64_t order = 0; order <= 8; ++order)
+      expect(coverage_.records_of_order(order, order) >= 1000, "order " + std::to_string(order) + " is met too rarely");
+    expect(coverage_.records_of_order(9, 16) >= 1000, "orders from 9 on are met too rarely");
+    expect(coverage_.records_of_order(17, 26) >= 1000, "orders from 17 on are met too rarely");
+  }
   std::vector<std::string> lines() { return std::move(lines_); }
 
  private:
@@ -185,6 +233,11 @@ class Missing {
 
 std::vector<std::string> missing_from(const Coverage& coverage) {
   Missing missing(coverage);
+  missing.expect(coverage.calls() >= 100000, "too few calls");
+  missing.expect(coverage.refused() >= 300, "too few refused requests");
+  missing.records();
+  for (const char* name : kOthers)
+    missing.expect(coverage.answers(name, SM_OK) >= 5, std::string(name) + " is not met");
   for (const OfOne& operation : of_one()) {
     missing.answers(operation.name, operation.answers);
     missing.types(operation);

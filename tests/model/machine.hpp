@@ -63,8 +63,8 @@ class Machine {
   SmInstance* instance() { return session_.instance(); }
   SmExtension* extension() { return session_.extension(); }
   const SmFunctionTable& fn() { return session_.fn(); }
-  // A record of the pool with a handle; one whose model passes the test, as far as a few draws find it; or null. In some
-  // steps the test is passed over, so that every type comes to every place: only() always asks it.
+  // A record of the pool with a handle; one whose model passes the test, as far as a few draws find it; or null. In
+  // some steps the test is passed over, so that every type comes to every place: only() always asks it.
   Model* any();
   Model* any(const std::function<bool(const Model&)>& test);
   Model* only(const std::function<bool(const Model&)>& test);
@@ -134,7 +134,7 @@ class Machine {
   Coverage coverage_;
   std::string wrong_;
   Index usual_order_ = 4;
-  Index stretch_ = 0;  // steps until the usual order changes
+  Index stretch_ = 0;    // steps until the usual order changes
   bool faulty_ = false;  // a request of the next call is going to be refused
   bool armed_ = false;
   bool wide_ = false;  // the step passes over what the generators look for

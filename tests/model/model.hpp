@@ -1,5 +1,5 @@
-// A plain model of one matrix record: what it is, and its elements as a dense table with a mask of what is stored. It is
-// written from the headers and knows nothing of the module's sources; only observe() looks into a record.
+// A plain model of one matrix record: what it is, and its elements as a dense table with a mask of what is stored. It
+// is written from the headers and knows nothing of the module's sources; only observation.cpp looks into a record.
 #pragma once
 
 #include <qxesm/qxesm.h>
@@ -64,18 +64,21 @@ struct Model {
   Index rank = -1;
   double log_det = missing_value();
   int definite = -1;
+  Index word = 0;           // the user word of the iterative solver
   Values v;                 // zero where nothing is stored; of a symmetric matrix the upper triangle
   Mask stored;              // of a dense matrix: the places that it has
   bool compressed = false;  // symmetric sparse: compressed rows are there
   bool separate = false;    // dense and diagonal: a separate factor or inverse array is there
   Values w;                 // its elements
+  bool leftover = false;    // below state 5 such an array may be there: a factorization was refused
   double* lent = nullptr;   // the caller's array that is tied
   std::vector<Index> perm;  // symmetric sparse, state 2 and above
   SparseFactor factor;      // symmetric sparse, state 5
   // The values replaced by a factor or inverse, and changed since: what they mean then is left to the caller, and only
   // calls that read values as values are made.
   bool spoiled = false;
-  // How far the elements (of v and of w) may be from the prediction where the order of arithmetic is free. 0: to the bit.
+  // How far the elements (of v and of w) may be from the prediction where the order of arithmetic is free; 0: to the
+  // bit.
   double slack = 0;
   double separate_slack = 0;
   bool reads_factor = false;  // the call has left a new sparse factor: compared within factor_slack, then taken over

@@ -5,7 +5,6 @@
 
 #include <cstdio>
 #include <cstdlib>
-#include <map>
 #include <string>
 
 #include "model/machine.hpp"
@@ -14,17 +13,19 @@ namespace sm::test {
 namespace {
 
 constexpr Index kSteps = 4000;
-// Seeds that have found a difference once.
-constexpr std::uint64_t kOnceFailed[] = {1};
+// Seeds beyond the ordinary ones that have found a difference once.
+constexpr std::uint64_t kOnceFailed[] = {212, 5200};
 
 struct Seeds {
   unsigned long long first = 1;
-  unsigned long long last = 80;
+  unsigned long long last = 100;
+  bool ordinary = true;
 };
 
 Seeds seeds() {
   Seeds s;
   const char* text = std::getenv("QXESM_MODEL_SEEDS");
+  s.ordinary = text == nullptr;
   if (text && std::sscanf(text, "%llu-%llu", &s.first, &s.last) != 2) s.last = 0;
   return s;
 }
@@ -47,7 +48,13 @@ TEST_P(ModelTest, random_calls_agree_with_the_model) {
   const Seeds s = seeds();
   ASSERT_GE(s.last, s.first) << "QXESM_MODEL_SEEDS is first-last";
   for (std::uint64_t seed = s.first; seed <= s.last && !HasFailure(); ++seed) run(seed);
-  std::printf("%lld calls, %lld refused\n%s", static_cast<long long>(coverage_.calls()), static_cast<long long>(coverage_.refused()), coverage_.table().c_str());
+  RecordProperty("calls", std::to_string(coverage_.calls()));
+  RecordProperty("refused_requests", std::to_string(coverage_.refused()));
+  if (HasFailure()) return;
+  if (!s.ordinary) {
+    std::printf("%s", coverage_.table().c_str());
+    return;
+  }
   for (const std::string& line : missing_from(coverage_)) ADD_FAILURE() << line;
 }
 

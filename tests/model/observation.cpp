@@ -133,8 +133,9 @@ void settle_open_places(Model& model) {
 std::string compare_separate(Model& model) {
   const SmMatrix& m = *model.handle;
   if (!model.dense() || model.empty()) return "";
-  // Below state 5 nothing promises whether an array that a refused factorization took is still there.
+  // Below state 5 nothing promises whether an array that a refused factorization took is still there; no other is.
   if (model.state < SM_STATE_FACTORED) {
+    if (m.dense_factor && !model.leftover) return "a separate array below state 5";
     model.separate = m.dense_factor != nullptr;
     model.w = model.v;
     return "";
@@ -167,6 +168,7 @@ std::string compare_fields(Model& model) {
     model.takes_cached = false;
   }
   field("rank", m.rank, model.rank);
+  field("solver_word", m.solver_word, model.word);
   if (model.definite == kUnknown) model.definite = m.definite;
   field("definite", m.definite, model.definite);
   if (!agree(m.log_det, model.log_det, 1e-9 * (1 + std::fabs(model.log_det))))
@@ -218,8 +220,9 @@ std::optional<Model> found(const Model& before, SmMatrix* handle) {
   now.rank = m.rank;
   now.log_det = m.log_det;
   now.definite = m.definite;
+  now.word = m.solver_word;
   now.compressed = now.symmetric_sparse() && m.row_start != nullptr;
-  now.separate = now.dense() && m.dense_factor != nullptr;
+  now.separate = now.leftover = now.dense() && m.dense_factor != nullptr;
   if (now.dense() && m.values && m.values == before.lent) now.lent = before.lent;
   const Observed seen = observe(now);
   now.v = seen.v;
