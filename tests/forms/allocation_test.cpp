@@ -2,7 +2,7 @@
 #include <algorithm>
 #include <memory>
 
-#include "forms/product_support.hpp"
+#include "forms/forms_support.hpp"
 
 namespace sm::test {
 namespace {
@@ -143,6 +143,11 @@ TEST_P(FormsAllocationTest, forms_of_matrices_around_an_inverse) {
                          [](Session& s, const Matrices& m) { return s.fn().qxsminvquad(m[0], m[1], m[2]); }, last_of});
             EXPECT_GE(requests, (factored ? 1 : 2) + (fresh ? 1 : 0));
           }
+}
+
+bool multiplies(Shape a, Shape b) {
+  if (a.kind == SM_KIND_GENERAL) return b.kind != SM_KIND_SYMMETRIC;
+  return a != kSymmetricColumns || b.kind != SM_KIND_GENERAL;
 }
 
 TEST_P(FormsAllocationTest, products_of_matrices) {

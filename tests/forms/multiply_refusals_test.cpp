@@ -12,6 +12,10 @@ class MultiplyRefusalsTest : public FormsTest {
   }
   // Ranges that lie outside a matrix of that size, or are reversed.
   static std::vector<Block> bad_ranges(std::int64_t rows, std::int64_t cols);
+  SmMatrix* of(Operand operand, std::int64_t n = 4) {
+    Random random(static_cast<std::uint64_t>(n));
+    return build(operand, random_known(random, operand.shape, n, n));
+  }
 };
 INSTANTIATE_BOTH_HOSTS(MultiplyRefusalsTest);
 
