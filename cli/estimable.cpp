@@ -55,8 +55,8 @@ std::vector<bool> passes(ModuleSession& session, SmMatrix* matrix, char mode, st
   const SmStatus status = session.fn().qxsmcke(matrix, rows.data(), static_cast<std::int32_t>(count), &failures,
                                                failed.data(), mode, tolerance);
   session.expect_ok(status, "checking the rows");
-  std::vector<bool> good;
-  for (const std::int32_t flag : failed) good.push_back(flag == 0);
+  std::vector<bool> good(failed.size());
+  for (std::size_t k = 0; k < good.size(); ++k) good[k] = failed[k] == 0;
   return good;
 }
 

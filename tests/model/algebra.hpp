@@ -14,8 +14,8 @@ using Reals = Table<Real>;
 constexpr double kTolerance = 1.110223024625157e-12;  // settings 0 to 2
 constexpr double kEps = 2.220446049250313e-16;
 
-// A sum of products: its value, and how far the same sum in another order may be from it. Small multiples of 2^-30 cannot
-// round, so that their sums have no slack.
+// A sum of products: its value, and how far the same sum in another order may be from it. Small multiples of 2^-30
+// cannot round, so that their sums have no slack.
 class Sum {
  public:
   void add(Real a, Real b = 1, Real c = 1) {
@@ -24,22 +24,24 @@ class Sum {
     exact_ = exact_ && fits(a) && fits(b) && fits(c) && fits(a * b) && fits(b * c) && fits(a * b * c);
     ++terms_;
   }
+  void widen(double slack) { extra_ += slack; }  // for a term that is not known better
   double value() const { return static_cast<double>(value_); }
   double slack() const {
-    if (exact_ && magnitude_ < 1048576.0L) return 0;
-    return 4 * static_cast<double>(terms_ + 2) * kEps * static_cast<double>(magnitude_);
+    if (!std::isfinite(magnitude_) || (exact_ && extra_ == 0 && magnitude_ < 1048576.0L)) return 0;
+    return extra_ + 4 * static_cast<double>(terms_ + 2) * kEps * static_cast<double>(magnitude_);
   }
 
  private:
   static bool fits(Real x) { return std::fabs(x) < 1048576.0L && std::ldexp(x, 30) == std::floor(std::ldexp(x, 30)); }
   Real value_ = 0;
   Real magnitude_ = 0;
+  double extra_ = 0;
   bool exact_ = true;
   int terms_ = 0;
 };
 
-// A = U'DU by the rule of the pivots, in a given order of the rows. `clear` is false when a pivot is so near a limit, or
-// so small, that rounding could decide otherwise or spoil what follows.
+// A = U'DU by the rule of the pivots, in a given order of the rows. `clear` is false when a pivot is so near a limit,
+// or so small, that rounding could decide otherwise or spoil what follows.
 struct Elimination {
   bool clear = true;
   bool definite = true;  // false: 103, and the rest is not filled
@@ -54,12 +56,14 @@ Elimination eliminate(const Values& a, const std::vector<Index>& order, double t
 std::vector<Index> natural_order(Index n);
 // Whether elimination is clear in every order.
 bool clear_in_every_order(const Values& a);
+// The same for a few orders, of a matrix that has too many.
+bool clear_in_some_orders(const Values& a);
 
 // R with R'R = A: sqrt(D) U, zero in dropped rows.
 Values packed_factor(const Elimination& e);
 
-// The generalized inverse that belongs to a packed factor: the inverse of the accepted block, zero elsewhere. Empty rows
-// mean that its error could not be bounded usefully.
+// The generalized inverse that belongs to a packed factor: the inverse of the accepted block, zero elsewhere. It is not
+// clear when its error could not be bounded usefully.
 struct Inverse {
   bool clear = true;
   Values g;

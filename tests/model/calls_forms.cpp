@@ -45,15 +45,16 @@ void call_multv(Machine& m) {
   if (m.random.chance(50) && a->rows > 0 && a->cols > 0) {
     p.r0 = m.random.below(a->rows + 1) - (m.random.chance(4) ? 1 : 0);
     p.r1 = p.r0 + m.random.below(a->rows) - (m.random.chance(4) ? 1 : 0);
-    p.c0 = m.random.below(a->cols);
+    p.c0 = m.random.below(a->cols) - (m.random.chance(4) ? 1 : 0);
     p.c1 = p.c0 + m.random.below(a->cols);
   }
-  std::vector<double> x = m.dyadics(64);
-  std::vector<double> y = m.blank(64);
-  m.begin("qxsmmultv", m.number(*a), p.r0, p.r1, p.c0, p.c1, p.k, p.accumulate, p.same);
+  if (m.random.chance(2)) (m.random.chance(50) ? p.r1 : p.c0) = m.place(a->rows);
+  std::vector<double> x = m.dyadics(kBlock);
+  std::vector<double> y = m.blank(kBlock);
+  m.begin("qxsmmultv", *a, p.r0, p.r1, p.c0, p.c1, p.k, p.accumulate, p.same);
   double* to = p.same ? x.data() : y.data();
   const SmStatus got = qxsmmultv(a->handle, x.data(), to, p.r0, p.r1, p.c0, p.c1, p.k, p.accumulate);
-  Wanted want(64);
+  Wanted want(kBlock);
   m.answer(got, want_product(*a, p, x.data(), want));
   m.output(y.data(), want);
 }
@@ -61,14 +62,14 @@ void call_multv(Machine& m) {
 void call_vmult(Machine& m) {
   Model* a = m.any();
   if (!a) return;
-  const Index k = m.random.below(4);
+  const Index k = m.random.below(4) - (m.random.chance(3) ? 1 : 0);
   const bool accumulate = m.random.chance(40);
   const bool same = m.random.chance(3);
-  std::vector<double> x = m.dyadics(64);
-  std::vector<double> y = m.blank(64);
-  m.begin("qxsmvmult", m.number(*a), k, accumulate, same);
+  std::vector<double> x = m.dyadics(kBlock);
+  std::vector<double> y = m.blank(kBlock);
+  m.begin("qxsmvmult", *a, k, accumulate, same);
   const SmStatus got = qxsmvmult(x.data(), a->handle, same ? x.data() : y.data(), k, accumulate);
-  Wanted want(64);
+  Wanted want(kBlock);
   SmStatus status = same ? SM_BAD_ARGUMENT : SM_OK;
   if (const auto refused = not_readable(*a)) {
     status = *refused;
@@ -102,10 +103,11 @@ void call_quadv(Machine& m) {
   if (m.random.chance(50)) {
     c0 = m.random.below(a->rows + 1) - (m.random.chance(4) ? 1 : 0);
     c1 = c0 + m.random.below(a->rows + 1) - (m.random.chance(4) ? 1 : 0);
+    if (m.random.chance(3)) c1 = m.place(a->rows);
   }
-  const std::vector<double> x = m.dyadics(64);
+  const std::vector<double> x = m.dyadics(kBlock);
   std::vector<double> r = m.blank(16);
-  m.begin("qxsmquadv", m.number(*a), p, c0, c1);
+  m.begin("qxsmquadv", *a, p, c0, c1);
   const SmStatus got = m.fn().qxsmquadv(a->handle, x.data(), r.data(), p, c0, c1);
   Wanted want(16);
   SmStatus status = SM_OK;
@@ -131,10 +133,10 @@ void call_bilin(Machine& m) {
   const Index p = m.random.below(4);
   const Index q = m.random.below(4);
   const bool same = m.random.chance(3);
-  std::vector<double> x = m.dyadics(64);
-  const std::vector<double> y = m.dyadics(64);
+  std::vector<double> x = m.dyadics(kBlock);
+  const std::vector<double> y = m.dyadics(kBlock);
   std::vector<double> r = m.blank(16);
-  m.begin("qxsmbilin", m.number(*a), p, q, same);
+  m.begin("qxsmbilin", *a, p, q, same);
   const SmStatus got = m.fn().qxsmbilin(a->handle, x.data(), y.data(), same ? x.data() : r.data(), p, q);
   Wanted want(16);
   SmStatus status = SM_OK;

@@ -8,33 +8,54 @@ namespace sm::test {
 
 namespace {
 
+SmStatus want_element(const Model& x, Index row, Index col, double& value) {
+  value = missing_value();
+  if (x.empty()) {
+    value = 0;
+    return SM_NO_ELEMENT;
+  }
+  if (!x.closed()) return SM_NOT_CLOSED;
+  if (row < 0 || col < 0 || row >= x.rows || col >= x.cols) return SM_OUTSIDE;
+  if (x.packed() && col < row) {
+    // The place is counted as for any pair; one outside the array is an index outside.
+    const std::vector<double> array = array_of(x.kind, x.format, x.v);
+    const Index n = x.rows;
+    const Index at =
+        x.format == SM_FORMAT_COLUMNS ? row + col * (col + 1) / 2 : (2 * n - row + 1) * row / 2 - row + col;
+    if (at < 0 || at >= static_cast<Index>(array.size())) return SM_OUTSIDE;
+    value = array[static_cast<std::size_t>(at)];
+    return SM_OK;
+  }
+  if (x.symmetric_sparse() && (col < row || (x.state > SM_STATE_CLOSED && row != col))) return SM_NO_ELEMENT;
+  value = x.diagonal() ? x.v(row, row) : x.at(row, col);
+  return SM_OK;
+}
+
+}  // namespace
+
+double element_read(const Model& x, Index row, Index col) {
+  double value = 0;
+  want_element(x, row, col, value);
+  return value;
+}
+
+namespace {
+
 void call_get(Machine& m) {
   Model* record = m.any();
   if (!record) return;
-  const Index row = m.random.below(record->rows + 1) - (m.random.chance(3) ? 1 : 0);
-  Index col = m.random.below(record->cols + 1);
-  if (record->packed() && col < row) col = row;  // what is read there is told for a sparse one only
+  const Index row = m.place(record->rows);
+  const Index col = m.place(record->cols);
   double value = Wanted::kUntouched;
-  m.begin("qxsmget", m.number(*record), row, col);
+  double want = 0;
+  m.begin("qxsmget", *record, row, col);
   const SmStatus got = m.fn().qxsmget(record->handle, row, col, &value);
-  SmStatus want = SM_OK;
-  double element = missing_value();
-  if (record->empty()) {
-    want = SM_NO_ELEMENT;
-    element = 0;
-  } else if (!record->closed()) {
-    want = SM_NOT_CLOSED;
-  } else if (row < 0 || row >= record->rows || col >= record->cols) {
-    want = SM_OUTSIDE;
-  } else if (record->symmetric_sparse() && (col < row || (record->state > SM_STATE_CLOSED && row != col))) {
-    want = SM_NO_ELEMENT;
-  } else {
-    element = record->diagonal() ? record->v(row, row) : record->at(row, col);
-  }
-  m.answer(got, want);
-  m.same(value, element, 0, "element");
-  if (std::isnan(element) && std::bit_cast<std::uint64_t>(value) != SM_MISSING_BITS) m.wrong("not the missing value");
+  m.answer(got, want_element(*record, row, col, want));
+  m.same(value, want, 0, "element");
+  if (std::isnan(want) && !is_missing(value)) m.wrong("not the missing value");
 }
+
+}  // namespace
 
 SmStatus want_row(const Model& x, Index row, Index start, Wanted& out) {
   if (const auto status = not_readable(x)) return *status;
@@ -53,12 +74,14 @@ SmStatus want_row(const Model& x, Index row, Index start, Wanted& out) {
   return SM_OK;
 }
 
+namespace {
+
 void call_row(Machine& m) {
   Model* record = m.any();
   if (!record) return;
-  const Index row = m.random.below(record->rows + 1) - (m.random.chance(3) ? 1 : 0);
+  const Index row = m.place(record->rows);
   const Index start = m.random.chance(50) ? 0 : m.random.below(record->cols + 2) - 1;
-  m.begin("qxsmrow", m.number(*record), row, start);
+  m.begin("qxsmrow", *record, row, start);
   std::vector<double> out = m.blank(record->cols + 2);
   Wanted want(record->cols + 2);
   const SmStatus got = qxsmrow(record->handle, row, out.data(), start);
@@ -80,8 +103,8 @@ SmStatus want_upper_row(const Model& x, Index row, Wanted& out) {
 void call_upper_row(Machine& m) {
   Model* record = m.random.chance(70) ? m.any([](const Model& x) { return x.symmetric(); }) : m.any();
   if (!record) return;
-  const Index row = m.random.below(record->rows + 1) - (m.random.chance(3) ? 1 : 0);
-  m.begin("qxsmUpperRow", m.number(*record), row);
+  const Index row = m.place(record->rows);
+  m.begin("qxsmUpperRow", *record, row);
   std::vector<double> out = m.blank(record->cols + 2);
   Wanted want(record->cols + 2);
   const SmStatus got = qxsmUpperRow(record->handle, row, out.data());
@@ -117,11 +140,11 @@ SmStatus want_block(const Model& x, const Block& b, Wanted& out) {
 void call_upper_block(Machine& m) {
   Model* record = m.random.chance(80) ? m.any([](const Model& x) { return x.symmetric_sparse(); }) : m.any();
   if (!record) return;
-  Block b{m.random.below(record->rows + 1), 0, 0, 0};
-  b.r1 = b.r0 + m.random.below(3) - (m.random.chance(5) ? 1 : 0);
+  Block b{m.random.below(record->rows + 1) - (m.random.chance(3) ? 1 : 0), 0, 0, 0};
+  b.r1 = b.r0 + m.random.below(m.random.chance(80) ? 4 : record->rows + 1) - (m.random.chance(5) ? 1 : 0);
   b.c0 = b.r0 + (m.random.chance(50) ? 0 : m.random.below(3)) - (m.random.chance(5) ? 1 : 0);
   b.c1 = b.c0 + m.random.below(4) - (m.random.chance(5) ? 1 : 0);
-  m.begin("qxsmUpperSub", m.number(*record), b.r0, b.r1, b.c0, b.c1);
+  m.begin("qxsmUpperSub", *record, b.r0, b.r1, b.c0, b.c1);
   std::vector<double> out = m.blank(b.size() + 2);
   Wanted want(b.size() + 2);
   const SmStatus got = qxsmUpperSub(record->handle, out.data(), b.r0, b.r1, b.c0, b.c1);
@@ -141,8 +164,9 @@ void call_diagonal(Machine& m) {
   Model* record = m.any();
   if (!record) return;
   const Index first = m.random.below(record->rows + 1) - (m.random.chance(3) ? 1 : 0);
-  const Index last = first + m.random.below(4) - (m.random.chance(5) ? 1 : 0);
-  m.begin("qxsmdiag", m.number(*record), first, last);
+  const Index length = m.random.below(m.random.chance(70) ? 4 : record->rows + 2) - (m.random.chance(5) ? 1 : 0);
+  const Index last = first + length;
+  m.begin("qxsmdiag", *record, first, last);
   std::vector<double> out = m.blank(last - first + 3);
   Wanted want(last - first + 3);
   const SmStatus got = m.fn().qxsmdiag(record->handle, out.data(), first, last);
@@ -171,7 +195,7 @@ void call_dense(Machine& m) {
   Model* record = m.any();
   if (!record) return;
   const int mode = static_cast<int>(m.random.chance(50) ? 2 : m.random.below(5) - 1);
-  m.begin("qxsmdense", m.number(*record), mode);
+  m.begin("qxsmdense", *record, mode);
   std::vector<double> out = m.blank(dense_size(*record, mode) + 2);
   Wanted want(dense_size(*record, mode) + 2);
   const SmStatus got = m.fn().qxsmdense(record->handle, out.data(), static_cast<std::int16_t>(mode));
@@ -185,7 +209,7 @@ void call_is_diagonal(Machine& m) {
   const double tolerances[] = {0.0, kNan, 2.0, 100.0};
   const double tolerance = tolerances[m.random.below(4)];
   std::int16_t flag = 77;
-  m.begin("qxsmIsDiag", m.number(*record), tolerance);
+  m.begin("qxsmIsDiag", *record, tolerance);
   const SmStatus got = m.fn().qxsmIsDiag(record->handle, &flag, tolerance);
   SmStatus want = SM_OK;
   std::int16_t diagonal = 0;
@@ -206,6 +230,47 @@ void call_is_diagonal(Machine& m) {
 }
 
 }  // namespace
+
+namespace {
+
+void read_rank(Machine& m, Model& x) {
+  if (x.general() || x.state < SM_STATE_FACTORED) return;
+  Index rank = 0;
+  double log_det = 0;
+  if (m.fn().qxsmrank(x.handle, &rank) != SM_OK || rank != x.rank) m.wrong("rank read back");
+  if (m.fn().qxsmlogdet(x.handle, &log_det) != SM_OK) m.wrong("log-determinant read back");
+  m.same(log_det, x.log_det, 1e-9 * (1 + std::fabs(x.log_det)), "log-determinant read back");
+}
+
+}  // namespace
+
+void read_back(Machine& m, Model& x, Index which) {
+  const Index n = std::min(x.rows, x.cols);
+  const Index row = which % x.rows;
+  Wanted want(x.rows * x.cols);
+  std::vector<double> out = m.blank(want.size());
+  SmStatus got = SM_OK;
+  SmStatus expected = SM_OK;
+  if (which % 5 == 0) {
+    got = m.fn().qxsmdense(x.handle, out.data(), 2);
+    expected = want_dense(x, 2, want);
+  } else if (which % 5 == 1) {
+    got = qxsmrow(x.handle, row, out.data(), 0);
+    expected = want_row(x, row, 0, want);
+  } else if (which % 5 == 2) {
+    got = m.fn().qxsmdiag(x.handle, out.data(), 0, n - 1);
+    expected = want_diagonal(x, 0, n - 1, want);
+  } else if (which % 5 == 3) {
+    double element = 0;
+    expected = want_element(x, row, which % x.cols, element);
+    want.set(0, element);
+    got = m.fn().qxsmget(x.handle, row, which % x.cols, out.data());
+  } else {
+    read_rank(m, x);
+  }
+  if (got != expected) m.wrong("read back with the answer " + std::to_string(got));
+  m.output(out.data(), want);
+}
 
 void add_reading_calls(std::vector<Call>& list) {
   list.insert(list.end(), {{call_get, 12},

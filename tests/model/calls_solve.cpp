@@ -47,10 +47,18 @@ SmStatus want_subst(const Model& x, const double* b, bool same, Index count, Wan
   return SM_OK;
 }
 
-SmStatus want_product(Model& x, const double* b, bool same, Index count, Wanted& want) {
+}  // namespace
+
+void settle(Machine& m, Model& x) {
+  const std::string text = difference(x);
+  if (!text.empty()) m.wrong("record " + std::to_string(m.number(x)) + ": " + text + "\n  model: " + describe(x));
+}
+
+SmStatus model_solve(const Model& x, const double* b, Wanted& want) { return want_subst(x, b, false, 1, want); }
+
+SmStatus model_inverse_product(Machine& m, Model& x, const double* b, bool same, Index count, Wanted& want) {
   if (const auto status = not_readable(x)) return *status;
-  const bool rows_there = x.sparse() || x.separate;
-  if (x.state >= SM_STATE_FACTORED && !rows_there) return SM_NO_FACTOR;
+  if (x.state >= SM_STATE_FACTORED && x.in_place()) return SM_NO_FACTOR;
   if (same) return SM_BAD_ARGUMENT;
   if (x.rows != x.cols) return SM_NOT_SQUARE;
   want.clear(x.rows * std::max<Index>(count, 0));
@@ -60,7 +68,9 @@ SmStatus want_product(Model& x, const double* b, bool same, Index count, Wanted&
     for (Index k = 0; k < count; ++k) store(want, k, multiply(x, x.w, b + k * x.rows));
     return SM_OK;
   }
+  const bool fresh = x.state < SM_STATE_FACTORED;
   const SmStatus status = model_factor(x, false);
+  if (fresh) settle(m, x);
   if (status != SM_OK) return status;
   return want_subst(x, b, false, count, want);
 }
@@ -70,6 +80,8 @@ Model* solvable(Machine& m) {
       m.random.chance(85) ? m.any([](const Model& y) { return y.closed() && !y.general() && !y.empty(); }) : m.any();
   return x && factor_is_clear(*x) && !x->spoiled ? x : nullptr;
 }
+
+namespace {
 
 struct Sides {
   Index count;
@@ -85,12 +97,6 @@ Sides draw_sides(Machine& m, const Model& model) {
   return s;
 }
 
-// A new factor is compared, and taken over, before its solves are predicted with it.
-void settle(Machine& m, Model& x) {
-  const std::string text = difference(x);
-  if (!text.empty()) m.wrong("record " + std::to_string(m.number(x)) + ": " + text + "\n  model: " + describe(x));
-}
-
 void finish(Machine& m, const Sides& s, const Wanted& want) {
   if (!s.same) m.output(s.x.data(), want);
 }
@@ -99,7 +105,7 @@ void call_subst(Machine& m) {
   Model* x = m.random.chance(70) ? m.any([](const Model& y) { return y.state == SM_STATE_FACTORED; }) : m.any();
   if (!x || x->spoiled) return;
   Sides s = draw_sides(m, *x);
-  m.begin("qxsmsubst", m.number(*x), s.count, s.same);
+  m.begin("qxsmsubst", *x, s.count, s.same);
   Wanted want(x->rows * 4 + 4);
   const SmStatus got =
       m.fn().qxsmsubst(x->handle, s.b.data(), s.same ? s.b.data() : s.x.data(), static_cast<int>(s.count));
@@ -111,21 +117,10 @@ void call_invmultv(Machine& m) {
   Model* x = solvable(m);
   if (!x) return;
   Sides s = draw_sides(m, *x);
-  m.begin("qxsminvmultv", m.number(*x), s.count, s.same);
+  m.begin("qxsminvmultv", *x, s.count, s.same);
   const SmStatus got = qxsminvmultv(x->handle, s.b.data(), s.same ? s.b.data() : s.x.data(), s.count);
   Wanted want(x->rows * 4 + 4);
-  const bool factors = x->closed() && x->rows == x->cols && !s.same && x->state < SM_STATE_FACTORED && !x->general();
-  if (factors && !x->empty()) {
-    Wanted cleared(want.size());
-    cleared.clear(x->rows * std::max<Index>(s.count, 0));
-    const SmStatus status = model_factor(*x, false);
-    settle(m, *x);
-    if (status != SM_OK) {
-      m.answer(got, status);
-      return finish(m, s, cleared);
-    }
-  }
-  m.answer(got, want_product(*x, s.b.data(), s.same, s.count, want));
+  m.answer(got, model_inverse_product(m, *x, s.b.data(), s.same, s.count, want));
   finish(m, s, want);
 }
 
@@ -146,11 +141,11 @@ SmStatus solve_diagonal(Model& x, const Sides& s, Wanted& want) {
 }
 
 // The packed road of the one-call solve: the array becomes the generalized inverse.
-SmStatus invert_packed(Model& x) {
+SmStatus invert_packed(Model& x, double tolerance) {
   if (x.state == SM_STATE_INVERTED) return SM_OK;
   Values r = x.second();
   if (x.state < SM_STATE_FACTORED) {
-    const Elimination e = eliminate(x.v, natural_order(x.rows), kTolerance);
+    const Elimination e = eliminate(x.v, natural_order(x.rows), tolerance);
     x.definite = kUnknown;  // the one-call solve says nothing about it
     x.takes_cached = !e.definite;
     if (!e.definite) return SM_NOT_DEFINITE;
@@ -165,12 +160,16 @@ SmStatus invert_packed(Model& x) {
   return SM_OK;
 }
 
-bool inverse_is_clear(const Model& x) {
+}  // namespace
+
+bool inverse_is_clear(const Model& x, double tolerance) {
   if (!x.packed() || !x.closed() || x.empty() || x.state == SM_STATE_INVERTED) return true;
   if (x.state == SM_STATE_FACTORED) return inverse_of_factor(x.second()).clear;
-  const Elimination e = eliminate(x.v, natural_order(x.rows), kTolerance);
+  const Elimination e = eliminate(x.v, natural_order(x.rows), tolerance);
   return e.clear && (!e.definite || inverse_of_factor(packed_factor(e)).clear);
 }
+
+namespace {
 
 void call_direct(Machine& m) {
   Model* x = solvable(m);
@@ -180,7 +179,7 @@ void call_direct(Machine& m) {
   model_close(closed, kNan);
   if (!factor_is_clear(closed) || !inverse_is_clear(closed)) return;
   Sides s = draw_sides(m, *x);
-  m.begin("qxsmsoldirect", m.number(*x), s.count, s.same);
+  m.begin("qxsmsoldirect", *x, s.count, s.same);
   double* to = s.same ? s.b.data() : s.x.data();
   const SmStatus got = m.fn().qxsmsoldirect(x->handle, s.b.data(), to, static_cast<int>(s.count));
   Wanted want(x->rows * 4 + 4);
@@ -194,7 +193,7 @@ void call_direct(Machine& m) {
     m.answer(got, status);
     return finish(m, s, want);
   }
-  status = x->sparse() ? model_factor(*x, false) : invert_packed(*x);
+  status = x->sparse() ? model_factor(*x, false) : invert_packed(*x, kTolerance);
   settle(m, *x);
   m.answer(got, status);
   if (status != SM_OK) return;
@@ -222,7 +221,7 @@ void call_inverse_diagonal(Machine& m) {
   if (!x || !inverse_is_clear(*x)) return;
   std::vector<double> out = m.blank(x->rows + 2);
   Wanted want(x->rows + 2);
-  m.begin("qxsminvdiag", m.number(*x));
+  m.begin("qxsminvdiag", *x);
   const SmStatus got = m.fn().qxsminvdiag(x->handle, out.data());
   SmStatus status = SM_OK;
   if (const auto refused = not_readable(*x)) {
@@ -270,6 +269,8 @@ SmStatus invert_diagonal(Model& x, Values& d, double tolerance) {
   return SM_OK;
 }
 
+}  // namespace
+
 SmStatus model_invert(Model& x, bool in_place, double tolerance) {
   if (const auto status = not_readable(x)) return *status;
   const bool factored = x.state >= SM_STATE_FACTORED;
@@ -283,6 +284,7 @@ SmStatus model_invert(Model& x, bool in_place, double tolerance) {
   if (factored && x.separate && in_place) move_separate(x);
   if (!factored) x.separate = !in_place;
   if (!factored && !in_place) x.w = x.v;
+  x.leftover = true;  // unless it ends well
   Values& target = x.separate ? x.w : x.v;
   if (x.diagonal()) {
     const SmStatus status = invert_diagonal(x, target, std::isnan(tolerance) ? kTolerance : tolerance);
@@ -292,22 +294,24 @@ SmStatus model_invert(Model& x, bool in_place, double tolerance) {
     const Index rank = x.rank;
     const double log_det = x.log_det;
     const int definite = x.definite;
-    const SmStatus status = invert_packed(x);
+    const SmStatus status = invert_packed(x, std::isnan(tolerance) ? kTolerance : tolerance);
     if (status != SM_OK) return status;
     x.definite = factored ? definite : 1;
     if (factored) x.rank = rank, x.log_det = log_det;
   }
   x.state = SM_STATE_INVERTED;
+  x.leftover = false;
   return SM_OK;
 }
 
+namespace {
+
 void call_invert(Machine& m) {
   Model* x = solvable(m);
-  if (!x || !inverse_is_clear(*x)) return;
   const bool in_place = m.random.chance(50);
-  // Of a packed matrix another tolerance would need pivots that are clear for it.
-  const double tolerance = x->diagonal() && m.random.chance(50) ? 0.25 : kNan;
-  m.begin("qxsminv", m.number(*x), in_place, tolerance);
+  const double tolerance = m.random.chance(50) ? 0.25 : kNan;
+  if (!x || !inverse_is_clear(*x, std::isnan(tolerance) ? kTolerance : tolerance)) return;
+  m.begin("qxsminv", *x, in_place, tolerance);
   const SmStatus got = m.fn().qxsminv(x->handle, in_place ? 1 : 0, tolerance);
   m.answer(got, model_invert(*x, in_place, tolerance));
 }

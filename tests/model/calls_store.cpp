@@ -1,5 +1,4 @@
 // Creation, sizes, reset, ties, closing.
-#include <array>
 #include <bit>
 #include <cmath>
 
@@ -7,19 +6,19 @@
 
 namespace sm::test {
 
-void model_reset(Model& m) {
-  SmMatrix* handle = m.handle;
-  m = Model();
-  m.handle = handle;
-  m.definite = kUnknown;
-}
-
 void model_new(Model& m, std::int32_t kind, std::int32_t format) {
   SmMatrix* handle = m.handle;
+  const Index touched = m.touched + 1;
   m = Model();
   m.handle = handle;
+  m.touched = touched;
   m.kind = kind;
   m.format = format;
+}
+
+void model_reset(Model& m) {
+  model_new(m, SM_KIND_NONE, SM_FORMAT_NONE);
+  m.definite = kUnknown;
 }
 
 SmStatus model_resize(Model& m, Index rows, Index cols) {
@@ -30,6 +29,7 @@ SmStatus model_resize(Model& m, Index rows, Index cols) {
   m.state = SM_STATE_CLOSED;
   if (!m.general() && rows != cols) {
     m.spoiled = false;
+    m.leftover = m.leftover || m.separate;
     m.perm.clear();
     return SM_NOT_SQUARE;
   }
@@ -38,8 +38,9 @@ SmStatus model_resize(Model& m, Index rows, Index cols) {
   m.cols = cols;
   m.v = Values(rows, cols);
   m.stored = m.sparse() ? Mask(rows, cols) : places(m.kind, rows, cols);
-  m.separate = m.compressed = m.spoiled = false;
+  m.separate = m.compressed = m.spoiled = m.leftover = false;
   m.w = Values();
+  m.open = Mask();
   m.perm.clear();
   if (m.symmetric_sparse()) {
     m.state = SM_STATE_OPEN;
@@ -69,15 +70,6 @@ SmStatus model_close(Model& m, double tolerance) {
 
 namespace {
 
-constexpr std::array<std::array<std::int32_t, 2>, 8> kTypes{{{SM_KIND_GENERAL, 21},
-                                                             {SM_KIND_GENERAL, 22},
-                                                             {SM_KIND_GENERAL, 23},
-                                                             {SM_KIND_SYMMETRIC, 21},
-                                                             {SM_KIND_SYMMETRIC, 22},
-                                                             {SM_KIND_SYMMETRIC, 23},
-                                                             {SM_KIND_DIAGONAL, 22},
-                                                             {SM_KIND_DIAGONAL, 23}}};
-
 SmStatus type_status(std::int32_t kind, std::int32_t format) {
   const bool known = kind == SM_KIND_GENERAL || kind == SM_KIND_SYMMETRIC || kind == SM_KIND_DIAGONAL;
   if (!known) return SM_UNAVAILABLE;
@@ -85,8 +77,10 @@ SmStatus type_status(std::int32_t kind, std::int32_t format) {
   return array || (format == SM_FORMAT_SPARSE && kind != SM_KIND_DIAGONAL) ? SM_OK : SM_BAD_FORMAT;
 }
 
-std::array<std::int32_t, 2> draw_type(Machine& m) {
-  auto type = kTypes[static_cast<std::size_t>(m.random.below(8))];
+// Each record has a type that it mostly takes, so that the pool has some of every type.
+std::array<std::int32_t, 2> draw_type(Machine& m, const Model& record) {
+  const Index usual = m.number(record) % static_cast<Index>(kTypes.size());
+  auto type = kTypes[static_cast<std::size_t>(m.random.chance(70) ? usual : m.random.below(8))];
   if (m.random.chance(3)) type[0] = static_cast<std::int32_t>(m.random.below(8));
   if (m.random.chance(3)) type[1] = static_cast<std::int32_t>(20 + m.random.below(5));
   return type;
@@ -94,15 +88,16 @@ std::array<std::int32_t, 2> draw_type(Machine& m) {
 
 // A record to be typed: a new one, or one that was reset. A typed one would lose what it holds.
 Model* untyped(Machine& m) {
-  Model* record = m.random.chance(50) ? m.vacant() : m.any([](const Model& x) { return x.none(); });
+  Model* record = m.random.chance(50) ? m.vacant() : m.only([](const Model& x) { return x.none(); });
   return record;
 }
 
 void call_new(Machine& m) {
   Model* record = untyped(m);
   if (!record) return;
-  const auto [kind, format] = draw_type(m);
-  m.begin("qxsmnew", m.number(*record), kind, format);
+  const auto [kind, format] = draw_type(m, *record);
+  m.begin("qxsmnew", *record, kind, format);
+  m.asks_for(kind, format);
   const SmStatus want = type_status(kind, format);
   SmMatrix* handle = record->handle;
   m.answer(m.fn().qxsmnew(m.instance(), &handle, kind, format), want);
@@ -118,13 +113,14 @@ void call_new(Machine& m) {
 void call_new_sized(Machine& m) {
   Model* record = untyped(m);
   if (!record) return;
-  const Index n = m.random.below(8) - 1;
-  const Index k = m.random.chance(20) ? n : m.random.below(7);
+  const Index n = m.random.chance(4) ? -1 : m.order();
+  const Index k = m.random.chance(40) ? n : m.order();
   const Index which = m.random.below(4);
   const char* names[] = {"qxsmnewss", "qxsmnewds", "qxsmnewsg", "qxsmnewsd"};
   const std::size_t types[] = {3, 4, 0, 7};
-  m.begin(names[which], m.number(*record), n, k);
   const auto type = kTypes[types[which]];
+  m.begin(names[which], *record, n, k);
+  m.asks_for(type[0], type[1]);
   SmStatus got = SM_OK;
   if (which == 0) got = m.fn().qxsmnewss(m.instance(), &record->handle, n);
   if (which == 1) got = m.fn().qxsmnewds(m.instance(), &record->handle, n);
@@ -137,18 +133,18 @@ void call_new_sized(Machine& m) {
 void call_resize(Machine& m) {
   Model* record = m.any();
   if (!record) return;
-  Index rows = m.random.below(7);
-  Index cols = record->general() || m.random.chance(3) ? m.random.below(7) : rows;
+  Index rows = m.order();
+  Index cols = (record->general() && m.random.chance(50)) || m.random.chance(3) ? m.order() : rows;
   if (m.random.chance(25)) rows = record->rows, cols = record->cols;
   if (m.random.chance(3)) rows = -1;
-  m.begin("qxsmresize", m.number(*record), rows, cols);
+  m.begin("qxsmresize", *record, rows, cols);
   m.answer(m.fn().qxsmresize(record->handle, rows, cols), model_resize(*record, rows, cols));
 }
 
 void call_delete(Machine& m) {
   Model* record = m.any();
   if (!record) return;
-  m.begin("qxsmdelete", m.number(*record));
+  m.begin("qxsmdelete", *record);
   m.answer(m.fn().qxsmdelete(record->handle), SM_OK);
   model_reset(*record);
 }
@@ -156,7 +152,7 @@ void call_delete(Machine& m) {
 void call_destroy(Machine& m) {
   Model* record = m.any();
   if (!record) return;
-  m.begin("qxsmDestroyMatrix", m.number(*record));
+  m.begin("qxsmDestroyMatrix", *record);
   m.answer(m.fn().qxsmDestroyMatrix(m.instance(), &record->handle), SM_OK);
   if (record->handle) m.wrong("the handle is still there");
   *record = Model();
@@ -183,14 +179,15 @@ SmStatus model_tie(Model& m, double* data, Index rows, Index cols, std::int32_t 
 }
 
 void call_tie(Machine& m) {
-  Model* record = m.any();
+  Model* record = m.random.chance(35) ? m.any([](const Model& x) { return x.none(); }) : m.any();
   if (!record) return;
-  const auto [kind, format] = draw_type(m);
-  Index rows = 1 + m.random.below(6);  // a shape with one dimension zero is left out
-  Index cols = kind == SM_KIND_GENERAL || m.random.chance(3) ? 1 + m.random.below(6) : rows;
+  const auto [kind, format] = draw_type(m, *record);
+  const Index rows = m.order();
+  Index cols = (kind == SM_KIND_GENERAL && m.random.chance(50)) || m.random.chance(3) ? m.order() : rows;
   if (m.random.chance(3)) cols = -1;
-  double* data = m.random.chance(4) ? nullptr : m.lend(m.dyadics(64));
-  m.begin("qxsmtie", m.number(*record), data != nullptr, rows, cols, kind, format);
+  double* data = m.random.chance(4) ? nullptr : m.lend(m.dyadics(kLargestOrder * kLargestOrder));
+  m.begin("qxsmtie", *record, data != nullptr, rows, cols, kind, format);
+  m.asks_for(kind, format);
   const SmStatus got = qxsmtie(record->handle, data, rows, cols, kind, format);
   m.answer(got, model_tie(*record, data, rows, cols, kind, format));
 }
@@ -200,7 +197,7 @@ void call_close(Machine& m) {
   if (!record) return;
   const double tolerances[] = {0.0, -1.0, kNan, 0.5, 2.0};
   const double tolerance = tolerances[m.random.below(5)];
-  m.begin("qxsmclose", m.number(*record), tolerance);
+  m.begin("qxsmclose", *record, tolerance);
   m.answer(m.fn().qxsmclose(record->handle, tolerance), model_close(*record, tolerance));
 }
 
@@ -210,9 +207,9 @@ void add_store_calls(std::vector<Call>& list) {
   list.insert(list.end(), {{call_new, 8},
                            {call_new_sized, 10},
                            {call_resize, 10},
-                           {call_delete, 3},
+                           {call_delete, 5},
                            {call_destroy, 3},
-                           {call_tie, 5},
+                           {call_tie, 8},
                            {call_close, 25}});
 }
 

@@ -1,6 +1,5 @@
 #include "model/model.hpp"
 
-#include <algorithm>
 #include <cmath>
 #include <cstring>
 #include <sstream>
@@ -43,11 +42,19 @@ Values Model::full() const {
 void Model::set(Index r, Index c, double value) {
   v(r, c) = value;
   stored(r, c) = 1;
+  touched += 1;
+}
+
+void Model::leave_open(Index r, Index c) {
+  if (stored(r, c)) return;
+  if (open.rows() != rows || open.cols() != cols) open.reshape(rows, cols);
+  open(r, c) = 1;
 }
 
 void Model::void_results() {
   rank = 0;
   log_det = missing_value();
+  touched += 1;
 }
 
 void Model::changed() {
@@ -91,178 +98,6 @@ std::vector<double> array_of(std::int32_t kind, std::int32_t format, const Value
     for (Index c = 0; c < v.cols(); ++c)
       if (mask(r, c)) out[static_cast<std::size_t>(slot_of(kind, format, v.rows(), v.cols(), r, c))] = v(r, c);
   return out;
-}
-
-namespace {
-
-struct Observed {
-  Values v;
-  Mask stored;
-  std::string broken;  // what is wrong with the storage itself
-  void put(Index r, Index c, double value) {
-    if (r < 0 || c < 0 || r >= v.rows() || c >= v.cols() || stored(r, c)) {
-      broken = "an entry outside, or one that is stored twice";
-      return;
-    }
-    v(r, c) = value;
-    stored(r, c) = 1;
-  }
-};
-
-void walk_trees(const SmMatrix& m, std::uint64_t* roots, Observed& out) {
-  for (Index r = 0; roots && r < m.rows; ++r) {
-    if (roots[r] == 0) continue;
-    Index last = -1;
-    for (const NonzeroNode* node = m.tree->first(m.tree, roots + r); node; node = sm_node_next(node)) {
-      if (node->key <= last) out.broken = "a row that does not ascend";
-      last = node->key;
-      out.put(r, node->key, node->value);
-    }
-  }
-}
-
-void walk_rows(const SmMatrix& m, Observed& out) {
-  if (m.row_start[0] != 0 || m.row_start[m.rows] != m.nnz) out.broken = "row offsets";
-  for (Index r = 0; r < m.rows; ++r) {
-    if (m.col_index[m.row_start[r]] != r) out.broken = "a row that does not begin with its diagonal";
-    for (Index p = m.row_start[r]; p < m.row_start[r + 1]; ++p) {
-      const Index c = m.col_index[p];
-      if (m.state < SM_STATE_REORDERED && p > m.row_start[r] && c <= m.col_index[p - 1]) out.broken = "columns";
-      out.put(std::min(r, c), std::max(r, c), m.nz_values[p]);
-    }
-  }
-}
-
-void read_array(const Model& model, const double* array, Observed& out) {
-  out.stored = places(model.kind, model.rows, model.cols);
-  for (Index r = 0; r < model.rows; ++r)
-    for (Index c = 0; c < model.cols; ++c)
-      if (out.stored(r, c)) out.v(r, c) = array[slot_of(model.kind, model.format, model.rows, model.cols, r, c)];
-}
-
-Observed observe(const Model& model) {
-  const SmMatrix& m = *model.handle;
-  Observed out{Values(model.rows, model.cols), Mask(model.rows, model.cols), ""};
-  if (model.none() || model.rows < 1) return out;
-  if (model.general_sparse())
-    walk_trees(m, m.row_roots, out);
-  else if (model.symmetric_sparse() && model.compressed && m.row_start)
-    walk_rows(m, out);
-  else if (model.symmetric_sparse())
-    walk_trees(m, m.sym_roots, out);
-  else if (m.values)
-    read_array(model, m.values, out);
-  return out;
-}
-
-bool agree(double got, double want, double slack) {
-  return same_value(got, want) || (slack > 0 && std::fabs(got - want) <= slack);
-}
-
-std::string compare_values(const Values& got, const Values& want, double slack, const char* of) {
-  for (Index r = 0; r < want.rows(); ++r)
-    for (Index c = 0; c < want.cols(); ++c)
-      if (!agree(got(r, c), want(r, c), slack)) {
-        std::ostringstream text;
-        text.precision(17);
-        text << of << " (" << r << ", " << c << ") is " << got(r, c) << ", not " << want(r, c) << " within " << slack;
-        return text.str();
-      }
-  return "";
-}
-
-SparseFactor decode(const SmMatrix& m) {
-  SparseFactor f{Values(m.rows, m.rows), {}};
-  for (Index k = 0; k < m.rows; ++k) {
-    f.reciprocal.push_back(m.factor_diag[k]);
-    f.u(k, k) = 1;
-    for (Index p = m.factor_iu[k]; p < m.factor_iu[k + 1]; ++p)
-      f.u(k, m.factor_ju[m.factor_iju[k] + p - m.factor_iu[k]]) = -m.factor_values[p];
-  }
-  return f;
-}
-
-std::string compare_factor(Model& model) {
-  const SparseFactor got = decode(*model.handle);
-  for (std::size_t k = 0; k < got.reciprocal.size(); ++k)
-    if (!agree(got.reciprocal[k], model.factor.reciprocal[k], model.factor_slack)) return "a reciprocal pivot differs";
-  std::string text = compare_values(got.u, model.factor.u, model.factor_slack, "element of U");
-  model.factor = got;
-  model.reads_factor = false;
-  return text;
-}
-
-std::string compare_elements(Model& model) {
-  const Observed seen = observe(model);
-  if (!seen.broken.empty()) return seen.broken;
-  for (Index r = 0; r < model.rows; ++r)
-    for (Index c = 0; c < model.cols; ++c)
-      if ((seen.stored(r, c) != 0) != (model.stored(r, c) != 0))
-        return "stored or not: (" + std::to_string(r) + ", " + std::to_string(c) + ")";
-  std::string text = compare_values(seen.v, model.v, model.slack, "element");
-  model.v = seen.v;
-  model.slack = 0;
-  return text;
-}
-
-std::string compare_separate(Model& model) {
-  const SmMatrix& m = *model.handle;
-  if (!model.dense() || model.empty()) return "";
-  // Below state 5 nothing promises whether an array that a refused factorization took is still there.
-  if (model.state < SM_STATE_FACTORED) {
-    model.separate = m.dense_factor != nullptr;
-    model.w = model.v;
-    return "";
-  }
-  if ((m.dense_factor != nullptr) != model.separate) return "the separate array is there, or is not";
-  if (!model.separate) return "";
-  Observed seen{Values(model.rows, model.cols), Mask(model.rows, model.cols), ""};
-  read_array(model, m.dense_factor, seen);
-  std::string text = compare_values(seen.v, model.w, model.separate_slack, "element of the separate array");
-  model.w = seen.v;
-  model.separate_slack = 0;
-  return text;
-}
-
-std::string compare_fields(Model& model) {
-  const SmMatrix& m = *model.handle;
-  std::ostringstream text;
-  const auto field = [&](const char* name, auto got, auto want) {
-    if (got != want) text << name << " is " << got << ", not " << want << "; ";
-  };
-  field("kind", m.kind, model.kind);
-  field("format", m.format, model.format);
-  field("state", m.state, model.state);
-  field("rows", m.rows, model.rows);
-  field("cols", m.cols, model.cols);
-  field("nnz", m.nnz, model.nnz());
-  if (model.takes_cached) {
-    model.rank = m.rank;
-    model.log_det = m.log_det;
-    model.takes_cached = false;
-  }
-  field("rank", m.rank, model.rank);
-  if (model.definite == kUnknown) model.definite = m.definite;
-  field("definite", m.definite, model.definite);
-  if (!agree(m.log_det, model.log_det, 1e-9 * (1 + std::fabs(model.log_det))))
-    text << "log_det is " << m.log_det << ", not " << model.log_det << "; ";
-  if (std::isnan(model.log_det) && std::memcmp(&m.log_det, &model.log_det, sizeof(double)) != 0)
-    text << "log_det is another NaN than the missing value; ";
-  model.log_det = m.log_det;
-  if (model.lent && m.values != model.lent) text << "the tied array is not the matrix's; ";
-  if (model.dense() && !model.empty() && (m.owns_values != 0) != (model.lent == nullptr)) text << "ownership; ";
-  return text.str();
-}
-
-}  // namespace
-
-std::string difference(Model& model) {
-  if (!model.handle) return "";
-  std::string text = compare_fields(model);
-  if (text.empty()) text = compare_elements(model);
-  if (text.empty()) text = compare_separate(model);
-  if (text.empty() && model.reads_factor) text = compare_factor(model);
-  return text;
 }
 
 std::string describe(const Model& model) {

@@ -1,5 +1,5 @@
-// A plain model of one matrix record: what it is, and its elements as a dense table with a mask of what is stored. It is
-// written from the headers and knows nothing of the module's sources; only observe() looks into a record.
+// A plain model of one matrix record: what it is, and its elements as a dense table with a mask of what is stored. It
+// is written from the headers and knows nothing of the module's sources; only observation.cpp looks into a record.
 #pragma once
 
 #include <qxesm/qxesm.h>
@@ -8,6 +8,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <limits>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -63,23 +64,29 @@ struct Model {
   Index rank = -1;
   double log_det = missing_value();
   int definite = -1;
+  Index word = 0;           // the user word of the iterative solver
   Values v;                 // zero where nothing is stored; of a symmetric matrix the upper triangle
   Mask stored;              // of a dense matrix: the places that it has
   bool compressed = false;  // symmetric sparse: compressed rows are there
   bool separate = false;    // dense and diagonal: a separate factor or inverse array is there
   Values w;                 // its elements
+  bool leftover = false;    // below state 5 such an array may be there: a factorization was refused
   double* lent = nullptr;   // the caller's array that is tied
   std::vector<Index> perm;  // symmetric sparse, state 2 and above
   SparseFactor factor;      // symmetric sparse, state 5
   // The values replaced by a factor or inverse, and changed since: what they mean then is left to the caller, and only
   // calls that read values as values are made.
   bool spoiled = false;
-  // How far the elements (of v and of w) may be from the prediction where the order of arithmetic is free. 0: to the bit.
+  // How far the elements (of v and of w) may be from the prediction where the order of arithmetic is free; 0: to the
+  // bit.
   double slack = 0;
   double separate_slack = 0;
   bool reads_factor = false;  // the call has left a new sparse factor: compared within factor_slack, then taken over
   double factor_slack = 0;
   bool takes_cached = false;  // nothing is promised about rank and log-determinant after this answer: take them over
+  Mask open;                  // places of a sparse matrix that may hold a rounded zero or nothing: taken over
+  bool unsure = false;        // a pivot fell too near a limit for a prediction
+  Index touched = 0;          // grows whenever entries, size or type change
 
   bool none() const { return kind == SM_KIND_NONE; }
   bool general() const { return kind == SM_KIND_GENERAL; }
@@ -100,6 +107,7 @@ struct Model {
   Values full() const;                                       // rows x cols
   const Values& second() const { return separate ? w : v; }  // where a factor or an inverse is
   void set(Index r, Index c, double value);                  // stores; the caller has made sure that it fits
+  void leave_open(Index r, Index c);                         // may be stored, as a rounded zero, or not
   void void_results();
   void changed();  // values changed: what becomes of rank, log-determinant and factor of any record
 };
@@ -115,5 +123,10 @@ std::vector<double> array_of(std::int32_t kind, std::int32_t format, const Value
 // Compares a record with its model; takes over what was compared within a slack. Empty when nothing differs.
 std::string difference(Model& model);
 std::string describe(const Model& model);
+// The model of a record as it is found, for a record whose last call was refused memory; nothing when it has lost the
+// storage of its type, so that only a reset or a new size leads on.
+std::optional<Model> found(const Model& before, SmMatrix* handle);
+// Whether the elements of `now` are those of `before`, or those that were predicted instead.
+bool kept(const Model& now, const Model& before, const Model& predicted);
 
 }  // namespace sm::test

@@ -181,7 +181,7 @@ TEST_P(Load, values_inside_an_array_that_would_be_given_back_are_refused_whereve
         EXPECT_EQ(load(array + from, a.matrix, 1, 1, kGeneralRows), SM_BAD_ARGUMENT) << from;
         EXPECT_EQ(load(array + from, a.matrix, 3, -3, {9, 99}), SM_BAD_ARGUMENT) << "before the type is looked at";
       }
-    EXPECT_EQ(contents(a.matrix), a.stored);
+    EXPECT_EQ(entries(a.matrix), a.stored);
     EXPECT_EQ(a.matrix->state, SM_STATE_FACTORED);
     EXPECT_EQ(a.matrix->rank, 4);
     EXPECT_EQ(a.matrix->dense_factor, factor);
@@ -214,7 +214,7 @@ TEST_P(Load, into_its_shape_a_matrix_takes_values_from_its_own_factor_and_from_a
   expect_loaded(m, {2.0, 3.0, 4.0}, 3, 3, kDiagonalRows);
   for (const std::ptrdiff_t from : {0, 1, 2}) {
     std::vector<double> mine = counted(8);
-    SmMatrix* tied = sized(session(), kGeneralRows, 1, 1);
+    SmMatrix* tied = new_sized(session(), kGeneralRows, 1, 1);
     ASSERT_EQ(qxsmtie(tied, mine.data() + 1, 2, 3, SM_KIND_GENERAL, SM_FORMAT_ROWS), SM_OK);
     const std::vector<double> want(mine.begin() + from, mine.begin() + from + 6);
     ASSERT_EQ(load(mine.data() + from, tied, 2, 3, kGeneralRows), SM_OK);

@@ -225,6 +225,18 @@ TEST_P(UpperExtraction, an_empty_block_has_nothing_to_clear) {
   EXPECT_TRUE(out.untouched());
 }
 
+TEST_P(UpperExtraction, a_block_larger_than_any_array_has_nothing_to_clear_either) {
+  Random random(10);
+  SmMatrix* m = filled_definite(session(), kSymmetricSparse, 4, random).matrix;
+  constexpr std::int64_t side = std::int64_t{1} << 27;
+  Output out(16);
+  for (const Block& b : {Block{-kHuge - 1, kHuge, 0, 0}, Block{0, 0, -kHuge - 1, kHuge}, Block{0, kHuge, 0, kHuge},
+                         Block{0, SM_MAX_ELEMENTS, 1, 1}, Block{0, side, 0, side}, Block{0, kHuge - 1, 0, 1}}) {
+    EXPECT_EQ(block(m, out.data(), b), SM_OUTSIDE) << b.r0 << ".." << b.r1 << ", " << b.c0 << ".." << b.c1;
+  }
+  EXPECT_TRUE(out.untouched());
+}
+
 INSTANTIATE_BOTH_HOSTS(UpperExtraction);
 
 }  // namespace
