@@ -14,7 +14,7 @@ namespace {
 
 struct X {
   using Vector = __m256d;
-  static constexpr int kWidth = 4;
+  static constexpr i64 kWidth = 4;
   static constexpr int kRows = 4;
   static constexpr int kVectors = 3;
 

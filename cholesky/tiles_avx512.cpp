@@ -14,7 +14,7 @@ namespace {
 
 struct X {
   using Vector = __m512d;
-  static constexpr int kWidth = 8;
+  static constexpr i64 kWidth = 8;
   static constexpr int kRows = 8;
   static constexpr int kVectors = 3;
 

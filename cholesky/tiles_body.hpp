@@ -74,7 +74,7 @@ SM_TILE_TARGET void tile(i64 depth, const double* coefficient, const double* sou
 // The columns of a strip behind its last full tile.
 template <int kTileRows, int kTileVectors>
 SM_TILE_TARGET void tile_rest(i64 depth, const double* coefficient, const double* source, const TileSource& s,
-                              int columns, double* const* target, i64 column, Finish finish) {
+                              i64 columns, double* const* target, i64 column, Finish finish) {
   if constexpr (kTileVectors > 1) {
     if (columns <= (kTileVectors - 1) * X::kWidth) {
       tile_rest<kTileRows, kTileVectors - 1>(depth, coefficient, source, s, columns, target, column, finish);
@@ -82,22 +82,23 @@ SM_TILE_TARGET void tile_rest(i64 depth, const double* coefficient, const double
     }
   }
   tile<kTileRows, kTileVectors, false>(depth, coefficient, source, s.step, s.shrink,
-                                       columns - (kTileVectors - 1) * X::kWidth, target, column, finish);
+                                       static_cast<int>(columns - (kTileVectors - 1) * X::kWidth), target, column,
+                                       finish);
 }
 
 template <int kTileRows>
 SM_TILE_TARGET void strip_of(i64 depth, const double* coefficient, const TileSource& source, i64 columns,
                              double* const* target, Finish finish) {
-  constexpr int kColumns = X::kVectors * X::kWidth;
+  constexpr i64 kColumns = X::kVectors * X::kWidth;
   const double* tile_source = source.first;
   i64 column = 0;
   for (; column + kColumns <= columns; column += kColumns, tile_source += source.tile_step) {
-    tile<kTileRows, X::kVectors, true>(depth, coefficient, tile_source, source.step, source.shrink, X::kWidth, target,
-                                       column, finish);
+    tile<kTileRows, X::kVectors, true>(depth, coefficient, tile_source, source.step, source.shrink, 0, target, column,
+                                       finish);
   }
   if (column < columns) {
-    tile_rest<kTileRows, X::kVectors>(depth, coefficient, tile_source, source, static_cast<int>(columns - column),
-                                      target, column, finish);
+    tile_rest<kTileRows, X::kVectors>(depth, coefficient, tile_source, source, columns - column, target, column,
+                                      finish);
   }
 }
 

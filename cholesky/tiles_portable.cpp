@@ -13,7 +13,7 @@ namespace {
 
 struct X {
   using Vector = double __attribute__((vector_size(16)));
-  static constexpr int kWidth = 2;
+  static constexpr i64 kWidth = 2;
   static constexpr int kRows = 4;
   static constexpr int kVectors = 2;
 
