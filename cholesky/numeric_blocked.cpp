@@ -25,7 +25,7 @@ namespace sm {
 
 namespace {
 
-constexpr i64 kFewProducts = 200;  // below, a kernel's overhead is larger than its gain
+constexpr i64 kFewProducts = 400;  // below, a kernel's overhead is larger than its gain
 
 // target[to[j]] += sum over the rows of factor[s] * row s of the source, for j < count.
 template <class Place>
@@ -186,7 +186,7 @@ void BlockedRows::update_target(const Target& target, const Source& s) {
   const i64 end = target.block.first + target.block.width;
   i64 rows = 1;
   while (rows < s.count && s.column[rows] < end) ++rows;
-  if (s.count <= kPanelColumns && (s.width == 1 || s.width * rows * s.count < kFewProducts)) {
+  if (s.count <= kPanelColumns && s.width * rows * s.count < kFewProducts) {
     subtract_products(target, s, rows);
   } else {
     update_block(target, s, rows, panels_);

@@ -37,8 +37,8 @@ struct Run {
 
 struct TileKernels {
   const char* name;
-  int strip_rows;    // rows of a full strip
-  int tile_columns;  // columns of a full tile
+  i64 strip_rows;    // rows of a full strip
+  i64 tile_columns;  // columns of a full tile
   // target[i][j] gets sum over s < depth of coefficient[s * strip_rows + i] * source(s, j), for i < rows, j < columns.
   void (*strip)(int rows, i64 depth, const double* coefficient, const TileSource& source, i64 columns,
                 double* const* target, Finish finish);
