@@ -54,9 +54,36 @@ class Blocks {
   Block at(i64 first, i64 width) const {
     return {first, width, a_.iu[first + 1] - a_.iu[first], a_.ju + a_.iju[first] + width - 1, a_.values + a_.iu[first]};
   }
-  // The first block that waits for block `first`, -1 when there is none, and the one after it; that is read before
-  // the block is made to wait elsewhere.
-  i64 waiting(i64 first) const { return a_.jl[first]; }
+  // f(source) for every block that waits for block `first`; f makes it wait elsewhere. Sources are read some at a time,
+  // so that what they need from memory is under way before the first of them is used.
+  template <class F>
+  void for_each_waiting(i64 first, F&& f) const {
+    for (i64 i = a_.jl[first]; i >= 0;) {
+      Source batch[kBatch];
+      int count = 0;
+      for (; i >= 0 && count < kBatch; i = a_.jl[i]) {
+        batch[count] = source(i);
+        __builtin_prefetch(batch[count].column);
+        __builtin_prefetch(batch[count].value, 1);
+        ++count;
+      }
+      for (int s = 0; s < count; ++s) f(batch[s]);
+    }
+  }
+  // The finished block waits for the block that holds its column `done` places on.
+  void await(const Source& s, i64 done) const {
+    if (done < s.count) queue(s.first, s.width, s.place + done, s.column[done]);
+  }
+  void await(const Block& b) const {
+    if (b.tail_length() > 0) queue(b.first, b.width, 0, b.tail[0]);
+  }
+
+ private:
+  static constexpr int kBatch = 16;
+  static constexpr int kWidthBits = 8;
+  static constexpr i64 kWidthMask = (i64{1} << kWidthBits) - 1;
+  static_assert(kMostBlockRows <= kWidthMask);
+
   Source source(i64 first) const {
     const i64 word = a_.position[first];
     const i64 width = word & kWidthMask;
@@ -71,19 +98,6 @@ class Blocks {
             length - 1,
             a_.diag + first};
   }
-  // The finished block waits for the block that holds its column `done` places on.
-  void await(const Source& s, i64 done) const {
-    if (done < s.count) queue(s.first, s.width, s.place + done, s.column[done]);
-  }
-  void await(const Block& b) const {
-    if (b.tail_length() > 0) queue(b.first, b.width, 0, b.tail[0]);
-  }
-
- private:
-  static constexpr int kWidthBits = 8;
-  static constexpr i64 kWidthMask = (i64{1} << kWidthBits) - 1;
-  static_assert(kMostBlockRows <= kWidthMask);
-
   bool continues(i64 k) const {
     const i64 length = a_.iu[k + 1] - a_.iu[k];
     return length > 0 && a_.iu[k + 2] - a_.iu[k + 1] == length - 1 && a_.ju[a_.iju[k]] == k + 1;

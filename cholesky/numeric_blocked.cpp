@@ -114,9 +114,7 @@ double BlockedRows::subtract_block(const Source& s, double d) {
 
 // Everything that waits for row k. Answers the pivot.
 double BlockedRows::update_row(i64 k, double d) {
-  for (i64 i = blocks_.waiting(k); i >= 0;) {
-    const i64 following = blocks_.waiting(i);
-    const Source s = blocks_.source(i);
+  blocks_.for_each_waiting(k, [&](const Source& s) {
     if (s.width == 1) {
       const double u = *s.value;
       const double f = -u * *s.pivot;
@@ -127,8 +125,7 @@ double BlockedRows::update_row(i64 k, double d) {
       d = subtract_block(s, d);
     }
     blocks_.await(s, 1);
-    i = following;
-  }
+  });
   return d;
 }
 
@@ -198,11 +195,7 @@ SmStatus BlockedRows::block(i64 first) {
   const Block b = blocks_.at(first, blocks_.width(first));
   const Target target = {b, place_, a_.diag};
   load_block(target);
-  for (i64 i = blocks_.waiting(first); i >= 0;) {
-    const i64 following = blocks_.waiting(i);
-    update_target(target, blocks_.source(i));
-    i = following;
-  }
+  blocks_.for_each_waiting(first, [&](const Source& s) { update_target(target, s); });
   SM_TRY(factor_block(b, a_.diag, pivots_, panels_));
   blocks_.await(b);
   return SM_OK;
