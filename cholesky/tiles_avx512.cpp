@@ -31,7 +31,7 @@ struct X {
 
 #include "cholesky/tiles_body.hpp"
 
-const TileKernels kKernels = {"AVX-512", X::kRows, X::kVectors* X::kWidth, strip, spread};
+const TileKernels kKernels = {"AVX-512", X::kRows, X::kVectors* X::kWidth, strip, pack, spread};
 
 }  // namespace
 

@@ -33,7 +33,7 @@ struct X {
 
 #include "cholesky/tiles_body.hpp"
 
-const TileKernels kKernels = {"portable", X::kRows, X::kVectors* X::kWidth, strip, spread};
+const TileKernels kKernels = {"portable", X::kRows, X::kVectors* X::kWidth, strip, pack, spread};
 
 }  // namespace
 
