@@ -87,7 +87,7 @@ void BlockUpdate::fetch_targets(int rows, i64 from, double* const* row) const {
   for (const Run* run = panels_.run; run != panels_.run + runs_; ++run) {
     if (run->from + run->length <= from) continue;
     for (i64 j = 0; j < run->length; j += 8) {
-      for (int i = 0; i < rows; ++i) __builtin_prefetch(row[i] + run->to + j, 1, 2);
+      for (int i = 0; i < rows; ++i) __builtin_prefetch(row[i] + run->to + j, 1);
     }
   }
 }

@@ -141,6 +141,7 @@ SM_TILE_TARGET void pack(i64 depth, const double* first, i64 step, i64 columns, 
     double* out = panel + s * kColumns;
     i64 j = 0;
     for (; j + kColumns <= columns; j += kColumns, out += depth * kColumns) {
+      for (i64 t = 0; t < kColumns; t += 8) __builtin_prefetch(first + step + j + t);  // of the next row
 #pragma GCC unroll 8
       for (int v = 0; v < X::kVectors; ++v) X::store(out + v * X::kWidth, X::load(first + j + v * X::kWidth));
     }
