@@ -1,8 +1,9 @@
 // Blocks of rows of U, and the lists in which finished blocks wait for the block that they update next.
 //
-// Rows k and k + 1 of U with lengths L and L - 1, the first column of row k being k + 1, have the same structure but for
-// that column. Runs of such rows are a block: its values are one stretch of factor_values, of rows that shorten by one,
-// and the columns behind the block, its tail, are the same for all. The subscripts of its first row serve the block.
+// Rows k and k + 1 of U with lengths L and L - 1, the first column of row k being k + 1, have the same structure but
+// for that column. Runs of such rows are a block: its values are one stretch of factor_values, of rows that shorten by
+// one, and the columns behind the block, its tail, are the same for all. The subscripts of its first row serve the
+// block.
 //
 // While a factorization runs, two arrays of n words hold what is needed of the blocks; f is the first row of one:
 //   position[f]  its width, in the low bits, and above them the place in its tail where its next update begins

@@ -3,18 +3,18 @@
 // Left-looking: block by block, everything that finished blocks have for its rows is subtracted, then the block is
 // factored. A finished block waits in the list of the block that holds the next column of its tail, as the rows of the
 // plain road do (numeric_rows.cpp; Eisenstat, Gursky, Schultz, Sherman 1982); rows with equal structure as blocks for
-// dense kernels: Ng, Peyton, "Block sparse Cholesky algorithms on advanced uniprocessor computers", SIAM J. Sci. Comput.
-// 14 (1993) 1034-1056. The storage is that of the plain road, with its fill: blocks are what is found in it, and no zero
-// is ever stored to make one.
+// dense kernels: Ng, Peyton, "Block sparse Cholesky algorithms on advanced uniprocessor computers", SIAM J. Sci.
+// Comput. 14 (1993) 1034-1056. The storage is that of the plain road, with its fill: blocks are what is found in it,
+// and no zero is ever stored to make one.
 //
 //   blocks.hpp        what a block is, and the lists
 //   block_update.cpp  a block updates a later one: strips of coefficients -V D times the rows of the source
 //   block_factor.cpp  a block is factored
 //   tiles.hpp         the kernels under both
 //
-// Most blocks of two-dimensional and of pedigree matrices are single rows, and so are most updates. A single row gathers
-// its updates in the dense row, by column; a wider block in its stored rows, at places that the words of the dense row
-// behind it hold for the columns of its tail. Small products are added one by one, without a kernel.
+// Most blocks of two-dimensional and of pedigree matrices are single rows, and so are most updates. A single row
+// gathers its updates in the dense row, by column; a wider block in its stored rows, at places that the words of the
+// dense row behind it hold for the columns of its tail. Small products are added one by one, without a kernel.
 #include <algorithm>
 #include <bit>
 

@@ -1,4 +1,5 @@
-// Linked into a suite, runs all of it with one set of tile kernels; with the portable ones where the CPU lacks that set.
+// Linked into a suite, runs all of it with one set of tile kernels; with the portable ones where the CPU lacks that
+// set.
 #include <gtest/gtest.h>
 
 #include <cstdio>
