@@ -23,7 +23,7 @@ class BlockUpdate {
   void find_coefficients();
   void keep_multipliers();
   void find_places(i64 begin, i64 end);
-  void pack(i64 begin, i64 end);
+  void fetch_targets(int rows, i64 from, double* const* row) const;
   void strip(i64 first_row, i64 begin, i64 end);
   i64 head_of_strip(i64 first_row, int rows, i64 end);
   TileSource in_place(i64 column) const { return {s_.value + column, s_.step, 1, tiles_.tile_columns}; }
@@ -82,18 +82,12 @@ void BlockUpdate::find_places(i64 begin, i64 end) {
   runs_ = run + 1 - panels_.run;
 }
 
-// Columns [begin, end) of the source, tile by tile, the last one filled up with zeros.
-void BlockUpdate::pack(i64 begin, i64 end) {
-  const i64 columns = tiles_.tile_columns;
-  double* out = panels_.source;
-  for (i64 j = begin; j < end; j += columns) {
-    const i64 n = std::min(columns, end - j);
-    const double* v = s_.value + j;
-    for (i64 s = 0; s < s_.width; ++s) {
-      std::copy_n(v, n, out);
-      std::fill_n(out + n, columns - n, 0.0);
-      out += columns;
-      v += s_.step - s;
+// Asks for what the runs behind column `from` add to, while the sums are made.
+void BlockUpdate::fetch_targets(int rows, i64 from, double* const* row) const {
+  for (const Run* run = panels_.run; run != panels_.run + runs_; ++run) {
+    if (run->from + run->length <= from) continue;
+    for (i64 j = 0; j < run->length; j += 8) {
+      for (int i = 0; i < rows; ++i) __builtin_prefetch(row[i] + run->to + j, 1);
     }
   }
 }
@@ -133,6 +127,7 @@ void BlockUpdate::strip(i64 first_row, i64 begin, i64 end) {
     tiles_.strip(rows, s_.width, coefficients(first_row), source, end - from, row, Finish::add);
     return;
   }
+  fetch_targets(rows, from - begin, row);
   double* sums[kMostStripRows];
   for (int i = 0; i < rows; ++i) sums[i] = panels_.sums + i * kPanelColumns;
   tiles_.strip(rows, s_.width, coefficients(first_row), source, end - from, sums, Finish::store);
@@ -144,7 +139,7 @@ void BlockUpdate::run() {
   for (i64 begin = 0; begin < s_.count; begin += kPanelColumns) {
     const i64 end = std::min(begin + kPanelColumns, s_.count);
     find_places(begin, end);
-    if (packed_) pack(begin, end);
+    if (packed_) tiles_.pack(s_.width, s_.value + begin, s_.step, end - begin, panels_.source);
     for (i64 r = 0; r < rows_; r += tiles_.strip_rows) strip(r, begin, end);
   }
   keep_multipliers();

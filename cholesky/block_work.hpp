@@ -7,6 +7,7 @@
 namespace sm {
 
 inline constexpr i64 kPanelColumns = 240;  // a multiple of every tile
+static_assert(kMostBlockRows <= kPanelColumns, "the rows that a block updates are columns of the first panel");
 
 // Work memory of fixed size, on the stack: 395 kB.
 struct Panels {

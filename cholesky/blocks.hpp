@@ -1,8 +1,9 @@
 // Blocks of rows of U, and the lists in which finished blocks wait for the block that they update next.
 //
-// Rows k and k + 1 of U with lengths L and L - 1, the first column of row k being k + 1, have the same structure but for
-// that column. Runs of such rows are a block: its values are one stretch of factor_values, of rows that shorten by one,
-// and the columns behind the block, its tail, are the same for all. The subscripts of its first row serve the block.
+// Rows k and k + 1 of U with lengths L and L - 1, the first column of row k being k + 1, have the same structure but
+// for that column. Runs of such rows are a block: its values are one stretch of factor_values, of rows that shorten by
+// one, and the columns behind the block, its tail, are the same for all. The subscripts of its first row serve the
+// block.
 //
 // While a factorization runs, two arrays of n words hold what is needed of the blocks; f is the first row of one:
 //   position[f]  its width, in the low bits, and above them the place in its tail where its next update begins
@@ -54,9 +55,36 @@ class Blocks {
   Block at(i64 first, i64 width) const {
     return {first, width, a_.iu[first + 1] - a_.iu[first], a_.ju + a_.iju[first] + width - 1, a_.values + a_.iu[first]};
   }
-  // The first block that waits for block `first`, -1 when there is none, and the one after it; that is read before
-  // the block is made to wait elsewhere.
-  i64 waiting(i64 first) const { return a_.jl[first]; }
+  // f(source) for every block that waits for block `first`; f makes it wait elsewhere. Sources are read some at a time,
+  // so that what they need from memory is under way before the first of them is used.
+  template <class F>
+  void for_each_waiting(i64 first, F&& f) const {
+    for (i64 i = a_.jl[first]; i >= 0;) {
+      Source batch[kBatch];
+      int count = 0;
+      for (; i >= 0 && count < kBatch; i = a_.jl[i]) {
+        batch[count] = source(i);
+        __builtin_prefetch(batch[count].column);
+        __builtin_prefetch(batch[count].value, 1);
+        ++count;
+      }
+      for (int s = 0; s < count; ++s) f(batch[s]);
+    }
+  }
+  // The finished block waits for the block that holds its column `done` places on.
+  void await(const Source& s, i64 done) const {
+    if (done < s.count) queue(s.first, s.width, s.place + done, s.column[done]);
+  }
+  void await(const Block& b) const {
+    if (b.tail_length() > 0) queue(b.first, b.width, 0, b.tail[0]);
+  }
+
+ private:
+  static constexpr int kBatch = 16;
+  static constexpr int kWidthBits = 8;
+  static constexpr i64 kWidthMask = (i64{1} << kWidthBits) - 1;
+  static_assert(kMostBlockRows <= kWidthMask);
+
   Source source(i64 first) const {
     const i64 word = a_.position[first];
     const i64 width = word & kWidthMask;
@@ -71,19 +99,6 @@ class Blocks {
             length - 1,
             a_.diag + first};
   }
-  // The finished block waits for the block that holds its column `done` places on.
-  void await(const Source& s, i64 done) const {
-    if (done < s.count) queue(s.first, s.width, s.place + done, s.column[done]);
-  }
-  void await(const Block& b) const {
-    if (b.tail_length() > 0) queue(b.first, b.width, 0, b.tail[0]);
-  }
-
- private:
-  static constexpr int kWidthBits = 8;
-  static constexpr i64 kWidthMask = (i64{1} << kWidthBits) - 1;
-  static_assert(kMostBlockRows <= kWidthMask);
-
   bool continues(i64 k) const {
     const i64 length = a_.iu[k + 1] - a_.iu[k];
     return length > 0 && a_.iu[k + 2] - a_.iu[k + 1] == length - 1 && a_.ju[a_.iju[k]] == k + 1;

@@ -16,9 +16,12 @@ class LookAhead {
   [[gnu::always_inline]] void past(i64 k) const {
     if (k + 3 * kRows >= m_.rows) return;  // the last rows come without
     __builtin_prefetch(m_.row_start + m_.perm[k + 3 * kRows]);
-    const i64 start = m_.row_start[m_.perm[k + 2 * kRows]];
-    __builtin_prefetch(m_.col_index + start);
-    if (values_) __builtin_prefetch(m_.nz_values + start);
+    const i64* row_start = m_.row_start + m_.perm[k + 2 * kRows];
+    const i64 ends[] = {row_start[0], row_start[1] - 1};  // most rows are short, and lie in two lines of the cache
+    for (const i64 p : ends) {
+      __builtin_prefetch(m_.col_index + p);
+      if (values_) __builtin_prefetch(m_.nz_values + p);
+    }
     const i64 row = m_.perm[k + kRows];
     const i64 end = std::min(m_.row_start[row + 1], m_.row_start[row] + kEntries);
     for (i64 p = m_.row_start[row]; p < end; ++p) __builtin_prefetch(m_.inv_perm + m_.col_index[p]);

@@ -3,18 +3,18 @@
 // Left-looking: block by block, everything that finished blocks have for its rows is subtracted, then the block is
 // factored. A finished block waits in the list of the block that holds the next column of its tail, as the rows of the
 // plain road do (numeric_rows.cpp; Eisenstat, Gursky, Schultz, Sherman 1982); rows with equal structure as blocks for
-// dense kernels: Ng, Peyton, "Block sparse Cholesky algorithms on advanced uniprocessor computers", SIAM J. Sci. Comput.
-// 14 (1993) 1034-1056. The storage is that of the plain road, with its fill: blocks are what is found in it, and no zero
-// is ever stored to make one.
+// dense kernels: Ng, Peyton, "Block sparse Cholesky algorithms on advanced uniprocessor computers", SIAM J. Sci.
+// Comput. 14 (1993) 1034-1056. The storage is that of the plain road, with its fill: blocks are what is found in it,
+// and no zero is ever stored to make one.
 //
 //   blocks.hpp        what a block is, and the lists
 //   block_update.cpp  a block updates a later one: strips of coefficients -V D times the rows of the source
 //   block_factor.cpp  a block is factored
 //   tiles.hpp         the kernels under both
 //
-// Most blocks of two-dimensional and of pedigree matrices are single rows, and so are most updates. A single row gathers
-// its updates in the dense row, by column; a wider block in its stored rows, at places that the words of the dense row
-// behind it hold for the columns of its tail. Small products are added one by one, without a kernel.
+// Most blocks of two-dimensional and of pedigree matrices are single rows, and so are most updates. A single row
+// gathers its updates in the dense row, by column; a wider block in its stored rows, at places that the words of the
+// dense row behind it hold for the columns of its tail. Small products are added one by one, without a kernel.
 #include <algorithm>
 #include <bit>
 
@@ -25,7 +25,7 @@ namespace sm {
 
 namespace {
 
-constexpr i64 kFewProducts = 200;  // below, a kernel's overhead is larger than its gain
+constexpr i64 kFewProducts = 400;  // below, a kernel's overhead is larger than its gain
 
 // target[to[j]] += sum over the rows of factor[s] * row s of the source, for j < count.
 template <class Place>
@@ -114,9 +114,7 @@ double BlockedRows::subtract_block(const Source& s, double d) {
 
 // Everything that waits for row k. Answers the pivot.
 double BlockedRows::update_row(i64 k, double d) {
-  for (i64 i = blocks_.waiting(k); i >= 0;) {
-    const i64 following = blocks_.waiting(i);
-    const Source s = blocks_.source(i);
+  blocks_.for_each_waiting(k, [&](const Source& s) {
     if (s.width == 1) {
       const double u = *s.value;
       const double f = -u * *s.pivot;
@@ -127,8 +125,7 @@ double BlockedRows::update_row(i64 k, double d) {
       d = subtract_block(s, d);
     }
     blocks_.await(s, 1);
-    i = following;
-  }
+  });
   return d;
 }
 
@@ -186,7 +183,7 @@ void BlockedRows::update_target(const Target& target, const Source& s) {
   const i64 end = target.block.first + target.block.width;
   i64 rows = 1;
   while (rows < s.count && s.column[rows] < end) ++rows;
-  if (s.count <= kPanelColumns && (s.width == 1 || s.width * rows * s.count < kFewProducts)) {
+  if (s.count <= kPanelColumns && s.width * rows * s.count < kFewProducts) {
     subtract_products(target, s, rows);
   } else {
     update_block(target, s, rows, panels_);
@@ -198,11 +195,7 @@ SmStatus BlockedRows::block(i64 first) {
   const Block b = blocks_.at(first, blocks_.width(first));
   const Target target = {b, place_, a_.diag};
   load_block(target);
-  for (i64 i = blocks_.waiting(first); i >= 0;) {
-    const i64 following = blocks_.waiting(i);
-    update_target(target, blocks_.source(i));
-    i = following;
-  }
+  blocks_.for_each_waiting(first, [&](const Source& s) { update_target(target, s); });
   SM_TRY(factor_block(b, a_.diag, pivots_, panels_));
   blocks_.await(b);
   return SM_OK;

@@ -5,10 +5,11 @@
 // of linear and nonlinear equations", thesis, Yale University (1975).
 //
 // Row k of U is its own entries joined with the tails of the earlier rows whose first column is k; those rows are
-// chained from jl[k]. The longest of the tails is sorted and stored already, so only what is not in it is collected, the
-// extras: mostly none. They are searched for in that tail, or flagged against it when they are many. Workspace, in words:
-// iju [0, n), iu [n, 2n], jl [2n+1, 3n+1), ju from 3n+1; and at the top, while this runs, two words for each column. The
-// words of iu whose rows are still to come hold the columns collected: behind row k there are as many as columns.
+// chained from jl[k]. The longest of the tails is sorted and stored already, so only what is not in it is collected,
+// the extras: mostly none. They are searched for in that tail, or flagged against it when they are many. Workspace, in
+// words: iju [0, n), iu [n, 2n], jl [2n+1, 3n+1), ju from 3n+1; and at the top, while this runs, two words for each
+// column. The words of iu whose rows are still to come hold the columns collected: behind row k there are as many as
+// columns.
 #include <algorithm>
 #include <cmath>
 

@@ -37,11 +37,14 @@ struct Run {
 
 struct TileKernels {
   const char* name;
-  int strip_rows;    // rows of a full strip
-  int tile_columns;  // columns of a full tile
+  i64 strip_rows;    // rows of a full strip
+  i64 tile_columns;  // columns of a full tile
   // target[i][j] gets sum over s < depth of coefficient[s * strip_rows + i] * source(s, j), for i < rows, j < columns.
   void (*strip)(int rows, i64 depth, const double* coefficient, const TileSource& source, i64 columns,
                 double* const* target, Finish finish);
+  // Columns [0, columns) of the source's rows, tile by tile, each tile's rows one behind the other; the last tile's
+  // missing columns as zeros.
+  void (*pack)(i64 depth, const double* first, i64 step, i64 columns, double* panel);
   // target[i][to + x] += sums[i * sums_step + from + x - first] for i < rows over the runs, what is before `first` of
   // them left out.
   void (*spread)(int rows, const double* sums, i64 sums_step, i64 first, const Run* run, const Run* end,

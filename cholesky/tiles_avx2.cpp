@@ -14,7 +14,7 @@ namespace {
 
 struct X {
   using Vector = __m256d;
-  static constexpr int kWidth = 4;
+  static constexpr i64 kWidth = 4;
   static constexpr int kRows = 4;
   static constexpr int kVectors = 3;
 
@@ -33,7 +33,7 @@ struct X {
 
 #include "cholesky/tiles_body.hpp"
 
-const TileKernels kKernels = {"AVX2", X::kRows, X::kVectors* X::kWidth, strip, spread};
+const TileKernels kKernels = {"AVX2", X::kRows, X::kVectors* X::kWidth, strip, pack, spread};
 
 }  // namespace
 

@@ -14,7 +14,7 @@ namespace {
 
 struct X {
   using Vector = __m512d;
-  static constexpr int kWidth = 8;
+  static constexpr i64 kWidth = 8;
   static constexpr int kRows = 8;
   static constexpr int kVectors = 3;
 
@@ -31,7 +31,7 @@ struct X {
 
 #include "cholesky/tiles_body.hpp"
 
-const TileKernels kKernels = {"AVX-512", X::kRows, X::kVectors* X::kWidth, strip, spread};
+const TileKernels kKernels = {"AVX-512", X::kRows, X::kVectors* X::kWidth, strip, pack, spread};
 
 }  // namespace
 

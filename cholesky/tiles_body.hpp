@@ -12,10 +12,25 @@ SM_TILE_INLINE V load_last(const double* p, int last) {
   return X::load(p, last);
 }
 
+constexpr i64 kWorthFetching = 8;  // source rows that take longer than a target line from the next cache
+
+// What a tile adds to, under way while its sums are made.
+template <int kTileRows, int kTileVectors>
+SM_TILE_INLINE void fetch_targets(double* const* target, i64 column) {
+#pragma GCC unroll 8
+  for (int i = 0; i < kTileRows; ++i) {
+    const double* row = target[i] + column;
+#pragma GCC unroll 8
+    for (i64 j = 0; j < kTileVectors * X::kWidth; j += 8) __builtin_prefetch(row + j, 1);
+    __builtin_prefetch(row + kTileVectors * X::kWidth - 1, 1);
+  }
+}
+
 template <int kTileRows, int kTileVectors, bool kFull>
 SM_TILE_TARGET void tile(i64 depth, const double* coefficient, const double* source, i64 step, i64 shrink, int last,
                          double* const* target, i64 column, Finish finish) {
   using V = typename X::Vector;
+  if (depth >= kWorthFetching && finish != Finish::store) fetch_targets<kTileRows, kTileVectors>(target, column);
   V sum[kTileRows][kTileVectors];
 #pragma GCC unroll 8
   for (int i = 0; i < kTileRows; ++i) {
@@ -74,7 +89,7 @@ SM_TILE_TARGET void tile(i64 depth, const double* coefficient, const double* sou
 // The columns of a strip behind its last full tile.
 template <int kTileRows, int kTileVectors>
 SM_TILE_TARGET void tile_rest(i64 depth, const double* coefficient, const double* source, const TileSource& s,
-                              int columns, double* const* target, i64 column, Finish finish) {
+                              i64 columns, double* const* target, i64 column, Finish finish) {
   if constexpr (kTileVectors > 1) {
     if (columns <= (kTileVectors - 1) * X::kWidth) {
       tile_rest<kTileRows, kTileVectors - 1>(depth, coefficient, source, s, columns, target, column, finish);
@@ -82,22 +97,23 @@ SM_TILE_TARGET void tile_rest(i64 depth, const double* coefficient, const double
     }
   }
   tile<kTileRows, kTileVectors, false>(depth, coefficient, source, s.step, s.shrink,
-                                       columns - (kTileVectors - 1) * X::kWidth, target, column, finish);
+                                       static_cast<int>(columns - (kTileVectors - 1) * X::kWidth), target, column,
+                                       finish);
 }
 
 template <int kTileRows>
 SM_TILE_TARGET void strip_of(i64 depth, const double* coefficient, const TileSource& source, i64 columns,
                              double* const* target, Finish finish) {
-  constexpr int kColumns = X::kVectors * X::kWidth;
+  constexpr i64 kColumns = X::kVectors * X::kWidth;
   const double* tile_source = source.first;
   i64 column = 0;
   for (; column + kColumns <= columns; column += kColumns, tile_source += source.tile_step) {
-    tile<kTileRows, X::kVectors, true>(depth, coefficient, tile_source, source.step, source.shrink, X::kWidth, target,
-                                       column, finish);
+    tile<kTileRows, X::kVectors, true>(depth, coefficient, tile_source, source.step, source.shrink, 0, target, column,
+                                       finish);
   }
   if (column < columns) {
-    tile_rest<kTileRows, X::kVectors>(depth, coefficient, tile_source, source, static_cast<int>(columns - column),
-                                      target, column, finish);
+    tile_rest<kTileRows, X::kVectors>(depth, coefficient, tile_source, source, columns - column, target, column,
+                                      finish);
   }
 }
 
@@ -116,6 +132,25 @@ SM_TILE_TARGET void strip_up_to(int rows, i64 depth, const double* coefficient, 
 SM_TILE_TARGET void strip(int rows, i64 depth, const double* coefficient, const TileSource& source, i64 columns,
                           double* const* target, Finish finish) {
   strip_up_to<X::kRows>(rows, depth, coefficient, source, columns, target, finish);
+}
+
+// Row by row, as the source lies in memory.
+SM_TILE_TARGET void pack(i64 depth, const double* first, i64 step, i64 columns, double* panel) {
+  constexpr i64 kColumns = X::kVectors * X::kWidth;
+  for (i64 s = 0; s < depth; ++s) {
+    double* out = panel + s * kColumns;
+    i64 j = 0;
+    for (; j + kColumns <= columns; j += kColumns, out += depth * kColumns) {
+      for (i64 t = 0; t < kColumns; t += 8) __builtin_prefetch(first + step + j + t);  // of the next row
+#pragma GCC unroll 8
+      for (int v = 0; v < X::kVectors; ++v) X::store(out + v * X::kWidth, X::load(first + j + v * X::kWidth));
+    }
+    if (j < columns) {
+      for (i64 t = 0; t < kColumns; ++t) out[t] = j + t < columns ? first[j + t] : 0.0;
+    }
+    first += step;
+    --step;
+  }
 }
 
 SM_TILE_TARGET void spread(int rows, const double* sums, i64 sums_step, i64 first, const Run* run, const Run* end,

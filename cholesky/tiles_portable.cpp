@@ -13,7 +13,7 @@ namespace {
 
 struct X {
   using Vector = double __attribute__((vector_size(16)));
-  static constexpr int kWidth = 2;
+  static constexpr i64 kWidth = 2;
   static constexpr int kRows = 4;
   static constexpr int kVectors = 2;
 
@@ -33,7 +33,7 @@ struct X {
 
 #include "cholesky/tiles_body.hpp"
 
-const TileKernels kKernels = {"portable", X::kRows, X::kVectors* X::kWidth, strip, spread};
+const TileKernels kKernels = {"portable", X::kRows, X::kVectors* X::kWidth, strip, pack, spread};
 
 }  // namespace
 

@@ -164,8 +164,8 @@ TEST_P(BlockedTest, agrees_with_the_rows_on_linked_cliques) {
 
 TEST_P(BlockedTest, agrees_with_the_rows_at_the_edges_of_strips_tiles_and_panels) {
   Random random(2);
-  for (const std::int64_t width : {1, 2, 3, 4, 5, 7, 8, 9, 11, 12, 13, 15, 16, 17, 18, 23, 24, 25, 33})
-    for (const std::int64_t tail : {0, 1, 3, 4, 5, 7, 8, 9, 11, 12, 13, 17, 23, 24, 25, 49})
+  for (const std::int64_t width : {1, 2, 3, 4, 5, 7, 8, 9, 12, 13, 16, 17, 18, 25})
+    for (const std::int64_t tail : {0, 1, 3, 4, 5, 7, 8, 9, 12, 13, 23, 24, 25, 49})
       compare(positive_definite(bordered_clique(width, width % 3 == 0 ? 2 : 0, tail), random), true);
   for (const std::int64_t width : {1, 2, 17, 40})
     for (const std::int64_t tail : {239, 240, 241, 256, 257}) {

@@ -65,6 +65,26 @@ TEST_P(SymbolicTest, finds_the_true_fill_of_random_structures) {
   }
 }
 
+TEST_P(SymbolicTest, finds_the_true_fill_where_long_rows_take_over_from_many) {
+  for (std::uint64_t seed = 0; seed < 24; ++seed) {
+    Random random(seed);
+    const std::int64_t n = 100 + random.below(120);
+    const Graph families[] = {elements(random, n, n / 3, 4 + random.below(8)), grid(11, 13),
+                              multiplied(random, grid(8, 9)), arrowhead(n, 30), random_graph(random, n, 2)};
+    const Graph graph = families[seed % 5];
+    const Indices order = random.permutation(graph.n);
+    SmMatrix* m = reordered_matrix(graph, random.chance(50) ? &order : nullptr);
+    ASSERT_EQ(qxsmsymbfact(m), SM_OK) << "seed " << seed;
+    expect_well_formed(m);
+    const Indices perm = words(m->perm, graph.n);
+    EXPECT_EQ(stored_structure(m), true_fill(graph, perm)) << "seed " << seed;
+    EXPECT_EQ(words(m->factor_ju, m->factor_iju[graph.n - 1] + 1), compressed_subscripts(graph, perm))
+        << "seed " << seed;
+    destroy(m);
+    if (HasFailure()) FAIL() << "seed " << seed;
+  }
+}
+
 TEST_P(SymbolicTest, finds_the_true_fill_of_every_graph_of_up_to_five_vertices) {
   for (std::int64_t n = 1; n <= 5; ++n) {
     const Graph all = clique(n);
