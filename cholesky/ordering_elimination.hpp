@@ -105,6 +105,7 @@ Index* OrderingGraph<Index>::form_element(Index pivot, Index& size) {
       --other.elements;
       if (other.mark >= stamp_) continue;
       other.mark = stamp_;
+      __builtin_prefetch(&places_[from[b]]);
       *end++ = from[b];
     }
     if (e.size != 0) absorb(e);
@@ -136,10 +137,12 @@ template <class Index>
 void OrderingGraph<Index>::cover_edges(const Index* boundary, Index size) {
   its_hubs_ = passed_hubs_ = 0;
   passed_others_ = 0;
+  walked_ = std::max(size / 2, kWalked);
   for (Index b = 0; b < size; ++b) {
     const Index v = boundary[b];
     Vertex& mine = vertex(v);
     const std::uint64_t bit = hub_bit(v);
+    __builtin_prefetch(elements_of(v));
     its_hubs_ |= bit;
     if (!is_walked(mine)) {
       passed_hubs_ |= bit;
@@ -245,6 +248,11 @@ typename OrderingGraph<Index>::Element OrderingGraph<Index>::purge(Index pivot, 
   for (Index b = 0; b < size; ++b) {
     const Index v = boundary[b];
     Vertex& mine = vertex(v);
+    if (b + 2 < size) {
+      const Index* ahead = elements_of(boundary[b + 2]);
+      const Index cells = std::min<Index>(vertex(boundary[b + 2]).cells, 4);
+      for (Index k = 0; k < cells; ++k) __builtin_prefetch(&graph_[ahead[k]]);
+    }
     if (lists_.holds(v)) lists_.remove(v);
     if (mine.elements + mine.vertices == 0) {
       number(v);
@@ -273,7 +281,7 @@ typename OrderingGraph<Index>::Element OrderingGraph<Index>::purge(Index pivot, 
 template <class Index>
 void OrderingGraph<Index>::update_degree(Index v, const Element& made) {
   Vertex& mine = vertex(v);
-  if (mine.cells > kWalked + 1) {
+  if (mine.cells > walked_ + 1) {
     lists_.insert_newest(v, mine.degree, Known::bound);
     return;
   }

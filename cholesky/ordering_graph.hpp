@@ -98,7 +98,7 @@ class OrderingGraph {
   using Element = GraphElement<Index>;
   using Places = GraphPlaces<Index>;
   static constexpr Index kGone = static_cast<Index>(-1);
-  // Lists of more elements are not walked at each elimination beside them.
+  // Longer lists of elements are not walked at each elimination beside them, unless the boundary is twice as long.
   static constexpr Index kWalked = 32;
   static constexpr Index kHubs = 64;
 
@@ -106,7 +106,7 @@ class OrderingGraph {
   Element& element(Index e) const { return graph_[e].element; }
   Index* elements_of(Index v) const { return elements_ + places_[v].start + places_[v].start / 2 + v; }
   Index element_room(Index v) const { return static_cast<Index>(elements_of(v + 1) - elements_of(v)); }
-  bool is_walked(const Vertex& v) const { return v.cells <= kWalked || v.elements <= kWalked; }
+  bool is_walked(const Vertex& v) const { return v.cells <= walked_ || v.elements <= walked_; }
 
   void enter_edges(const SmMatrix& m, bool repeated);
   void own_edges();
@@ -171,6 +171,7 @@ class OrderingGraph {
   Index hub_count_ = 0;
   Index hubs_[kHubs];
   // While an element is formed:
+  Index walked_ = 0;  // the longest list that is walked
   std::uint64_t its_hubs_ = 0;
   std::uint64_t passed_hubs_ = 0;  // of them, those whose elements are not walked
   Index passed_others_ = 0;        // vertices of the boundary whose elements are not walked, but for these
