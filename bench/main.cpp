@@ -85,10 +85,12 @@ int main_of(int argc, char** argv) {
 }
 
 // Libraries read these when they are loaded, so they must be there before the process starts.
-void start_again_with_one_thread(char** argv) {
-  if (std::getenv("OPENBLAS_NUM_THREADS") && std::getenv("OMP_NUM_THREADS")) return;
+void start_again_with_settings(char** argv) {
+  if (std::getenv("QXBENCH_STARTED")) return;
+  setenv("QXBENCH_STARTED", "1", 1);
   setenv("OPENBLAS_NUM_THREADS", "1", 1);
   setenv("OMP_NUM_THREADS", "1", 1);
+  if (const char* kernels = better_kernels()) setenv("OPENBLAS_CORETYPE", kernels, 0);
   execv("/proc/self/exe", argv);
 }
 
@@ -97,7 +99,7 @@ void start_again_with_one_thread(char** argv) {
 
 int main(int argc, char** argv) {
   try {
-    sm::bench::start_again_with_one_thread(argv);
+    sm::bench::start_again_with_settings(argv);
     return sm::bench::main_of(argc, argv);
   } catch (const std::exception& e) {
     std::fprintf(stderr, "qxbench: %s\n", e.what());

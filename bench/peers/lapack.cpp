@@ -2,11 +2,13 @@
 
 #include <algorithm>
 #include <cstring>
+#include <string>
 
 #include "bench/harness/clock.hpp"
 
 extern "C" {
 void openblas_set_num_threads(int count);
+char* openblas_get_corename();
 void dpotrf_(const char* triangle, const int* n, double* a, const int* lda, int* info);
 void dpotri_(const char* triangle, const int* n, double* a, const int* lda, int* info);
 void dpptrf_(const char* triangle, const int* n, double* a, int* info);
@@ -18,6 +20,15 @@ void dgemm_(const char* trans_a, const char* trans_b, const int* m, const int* n
 namespace sm::bench {
 
 void use_one_thread() { openblas_set_num_threads(1); }
+
+const char* kernels() { return openblas_get_corename(); }
+
+const char* better_kernels() {
+  const std::string own = kernels();
+  const bool wide = __builtin_cpu_supports("avx512f") && __builtin_cpu_supports("avx512dq") &&
+                    __builtin_cpu_supports("avx512bw") && __builtin_cpu_supports("avx512vl");
+  return wide && (own == "Haswell" || own == "Zen") ? "SkylakeX" : nullptr;
+}
 
 bool factor_full(std::vector<double>& a, int n) {
   int info = 0;
