@@ -79,7 +79,7 @@ def shown(verdict, target):
     return f"{text.number(verdict.measured)} {target.unit}, {need}"
 
 
-def overview(run, reasons):
+def overview(run):
     rows = []
     for target in TARGETS:
         verdicts = target.judge(run)
