@@ -34,7 +34,7 @@ double run_cholmod(Workbench& bench, Ordering ordering, Kind kind, std::vector<d
 }  // namespace
 
 void measure_total(Workbench& bench) {
-  if (!bench.can_factor("total")) return;
+  if (!bench.can_factor({"total"})) return;
   const std::vector<double>& b = bench.problem().rhs;
   std::vector<double> x;
   std::vector<Contestant> contestants;
