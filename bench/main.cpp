@@ -2,9 +2,12 @@
 #include <unistd.h>
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
-#include <iostream>
+#include <filesystem>
+#include <map>
+#include <optional>
 
 #include "bench/cases.hpp"
 #include "bench/harness/clock.hpp"
@@ -91,7 +94,7 @@ void start_again_with_settings(char** argv) {
   setenv("OPENBLAS_NUM_THREADS", "1", 1);
   setenv("OMP_NUM_THREADS", "1", 1);
   if (const char* kernels = better_kernels()) setenv("OPENBLAS_CORETYPE", kernels, 0);
-  execv("/proc/self/exe", argv);
+  execv(std::filesystem::read_symlink("/proc/self/exe").c_str(), argv);
 }
 
 }  // namespace
