@@ -87,13 +87,15 @@ int main_of(int argc, char** argv) {
   return run(options);
 }
 
-// Libraries read these when they are loaded, so they must be there before the process starts.
+// Libraries read their settings when they are loaded, so these must be there before the process starts. What the
+// environment says about OpenBLAS goes: the peers get the kernels that the library itself takes for this processor.
 void start_again_with_settings(char** argv) {
   if (std::getenv("QXBENCH_STARTED")) return;
-  setenv("QXBENCH_STARTED", "1", 1);
+  for (const char* name : {"OPENBLAS_CORETYPE", "OPENBLAS_L2_SIZE", "OPENBLAS_VERBOSE"}) unsetenv(name);
+  if (const char* kernels = std::getenv("QXBENCH_KERNELS")) setenv("OPENBLAS_CORETYPE", kernels, 1);
   setenv("OPENBLAS_NUM_THREADS", "1", 1);
   setenv("OMP_NUM_THREADS", "1", 1);
-  if (const char* kernels = better_kernels()) setenv("OPENBLAS_CORETYPE", kernels, 0);
+  setenv("QXBENCH_STARTED", "1", 1);
   execv(std::filesystem::read_symlink("/proc/self/exe").c_str(), argv);
 }
 

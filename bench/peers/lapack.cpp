@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cstring>
-#include <string>
 
 #include "bench/harness/clock.hpp"
 
@@ -22,13 +21,6 @@ namespace sm::bench {
 void use_one_thread() { openblas_set_num_threads(1); }
 
 const char* kernels() { return openblas_get_corename(); }
-
-const char* better_kernels() {
-  const std::string own = kernels();
-  const bool wide = __builtin_cpu_supports("avx512f") && __builtin_cpu_supports("avx512dq") &&
-                    __builtin_cpu_supports("avx512bw") && __builtin_cpu_supports("avx512vl");
-  return wide && (own == "Haswell" || own == "Zen") ? "SkylakeX" : nullptr;
-}
 
 bool factor_full(std::vector<double>& a, int n) {
   int info = 0;

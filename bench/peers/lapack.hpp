@@ -14,10 +14,8 @@ bool invert_full(std::vector<double>& r, int n);
 // The same with the upper triangle packed by columns.
 bool factor_packed(std::vector<double>& a, int n);
 
-// The kernels that OpenBLAS works with, and those that it should: a version that is older than the processor takes a
-// general set, which has half the speed where there is AVX-512. Null when its own choice will do.
+// The set of kernels that OpenBLAS works with.
 const char* kernels();
-const char* better_kernels();
 
 struct Rates {
   double gemm = 0.0;  // multiplications and additions a second

@@ -59,8 +59,7 @@ def conditions(run):
         ["system, compiler", f"{m['system']}, GCC {m['compiler']}"],
         ["module", f"commit {m['commit']}"],
         ["peers", f"CHOLMOD {m['cholmod']}, METIS {m['metis']}, Eigen {m['eigen']}, {m['openblas'].strip()}"],
-        ["OpenBLAS kernels", f"{m['kernels']}; where the library knows the processor only as an older one, the "
-                             "AVX-512 ones are chosen for it"],
+        ["OpenBLAS kernels", m["kernels"]],
         ["dgemm, order 2000", f"{m['dgemm'] / 1e9:.1f} GFLOP/s"],
         ["copy, read and written", f"{m['copy'] / 1e9:.1f} GB/s"],
         ["load when the run began", f"{m['load']:.1f} (one minute)"],
