@@ -1,5 +1,9 @@
 // The diagonal of the inverse, and the trace of the inverse times a matrix on the pattern, beside a plain column by
 // column Takahashi on CHOLMOD's factor in the same order.
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <cmath>
 #include <optional>
 
 #include "bench/generators/random.hpp"
@@ -40,9 +44,14 @@ class DiagonalProbes {
   std::vector<std::pair<std::size_t, double>> probes_;
 };
 
+// Relative to the largest element: those off the diagonal may be small by cancellation.
 std::string difference(const std::vector<double>& got, const std::vector<double>& want) {
+  double largest = 0.0;
+  for (const double v : want) largest = std::max(largest, std::fabs(v));
   for (std::size_t i = 0; i < got.size(); ++i) {
-    if (std::string fault = number_fault("an element", got[i], want[i], 0.0, kTolerance); !fault.empty()) return fault;
+    if (std::string fault = number_fault("an element", got[i], want[i], largest, kTolerance); !fault.empty()) {
+      return fault;
+    }
   }
   return "";
 }
@@ -76,7 +85,26 @@ class InverseBench {
           [&] { expect_ok(bench_.module().fn().qxsminvdiag(matrix, ours_.data()), "inverting the diagonal"); });
     };
     contestants.push_back({kOurs, run, [this] { return fault_of_ours(); }});
-    record("inverse", contestants);
+    record("inverse", "", contestants);
+  }
+
+  // The inverse at the stored entries, in a module that has it.
+  void pattern() {
+    if (!bench_.module().by_name().qxsminvpattern || takahashi_->work() >= kTooMuch) return;
+    std::vector<double> theirs, ours(bench_.rows().value.size());
+    const auto run_peer = [&] {
+      const double seconds = seconds_of([&] { takahashi_->run(); });
+      theirs = takahashi_->on_pattern(bench_.rows());
+      return seconds;
+    };
+    const auto run = [&] {
+      const qxhost::Matrix matrix = fresh();
+      return seconds_of(
+          [&] { expect_ok(bench_.module().by_name().qxsminvpattern(matrix, ours.data()), "inverting the pattern"); });
+    };
+    // Its diagonal stands for the peer's, which has been compared with solves.
+    const auto fault = [&] { return theirs.empty() ? "no peer to compare with" : difference(ours, theirs); };
+    record("inverse", "on the pattern", {{kPeer, run_peer, [] { return ""; }}, {kOurs, run, fault}});
   }
 
   // B = A, entered by itself: the trace is the rank.
@@ -99,7 +127,7 @@ class InverseBench {
       return seconds_of([&] { expect_ok(bench_.module().by_name().qxsmtraceinvAB(matrix, b, 0, &trace), "tracing"); });
     };
     contestants.push_back({kOurs, run, fault});
-    record("trace", contestants);
+    record("trace", "", contestants);
   }
 
  private:
@@ -113,9 +141,9 @@ class InverseBench {
     return fault.empty() && !theirs_.empty() ? difference(ours_, theirs_) : fault;
   }
 
-  void record(const char* phase, const std::vector<Contestant>& contestants) {
-    const std::vector<Outcome> outcomes = bench_.race(phase, contestants);
-    bench_.record(phase, "", outcomes, {{"column_work", takahashi_->work()}});
+  void record(const char* phase, const char* variant, const std::vector<Contestant>& contestants) {
+    const std::vector<Outcome> outcomes = bench_.race(fmt::format("{}{}", phase, variant), contestants);
+    bench_.record(phase, variant, outcomes, {{"column_work", takahashi_->work()}});
   }
 
   Workbench& bench_;
@@ -131,6 +159,7 @@ void measure_inverse(Workbench& bench) {
   if (!bench.problem().definite() || !bench.can_factor({"inverse", "trace"})) return;
   InverseBench inverse(bench);
   inverse.diagonal();
+  inverse.pattern();
   inverse.trace();
 }
 

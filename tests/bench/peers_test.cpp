@@ -43,6 +43,13 @@ TEST(Peers, column_takahashi_gives_the_diagonal_of_the_inverse_and_traces) {
       takahashi.run();
       const std::vector<double> diagonal = takahashi.diagonal();
       for (int i = 0; i < p.n; ++i) EXPECT_NEAR(diagonal[static_cast<std::size_t>(i)], want(i, i), 1e-10);
+      const std::vector<double> z = takahashi.on_pattern(rows);
+      for (int i = 0; i < p.n; ++i) {
+        for (auto q = static_cast<std::size_t>(rows.start[static_cast<std::size_t>(i)]);
+             q < static_cast<std::size_t>(rows.start[static_cast<std::size_t>(i) + 1]); ++q) {
+          EXPECT_NEAR(z[q], want(i, rows.col[q]), 1e-10);
+        }
+      }
       EXPECT_NEAR(takahashi.trace_with(rows), p.n, 1e-9 * p.n);
     }
   }
