@@ -26,8 +26,8 @@ QXESM_API std::int32_t qxextver(HostServices* handle, std::int32_t* major, std::
   return qxextent(handle);
 }
 
-// Builds the extension, a TreeExtension; `owner` is handed to the host's create pool, `unused` is not read. Answers null,
-// with nothing left behind, before the service handle is there or when memory is short.
+// Builds the extension, a TreeExtension; `owner` is handed to the host's create pool, `unused` is not read. Answers
+// null, with nothing left behind, before the service handle is there or when memory is short.
 QXESM_API void* qxeavl(void* /*unused*/, void* owner) {
   return services ? sm::avl::create_extension(*services, owner) : nullptr;
 }

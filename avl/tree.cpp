@@ -88,7 +88,8 @@ Place locate(Word root, std::int64_t key, Node* node) {
   return {node, side, false};
 }
 
-// A subtree hangs on one of its two neighbours in key order: a right child follows its parent, a left child precedes it.
+// A subtree hangs on one of its two neighbours in key order: a right child follows its parent, a left child precedes
+// it.
 bool hangs_on(Node* before, const Node* top) {
   return before && has_child(*before, Side::right) && target(*before, Side::right) == top;
 }
@@ -104,8 +105,8 @@ void replace_below(Word& above, const Node* child) { above = address_of(child) |
 
 // Restores the balance after `node` came in as a leaf between its neighbours `before` and `after`.
 //
-// Parents are found through the threads: the climb keeps the two neighbours of the subtree that it has reached. Its k-th
-// level costs a walk of at most k links, down the sibling, and the whole climb less than the square of the height.
+// Parents are found through the threads: the climb keeps the two neighbours of the subtree that it has reached. Its
+// k-th level costs a walk of at most k links, down the sibling, and the whole climb less than the square of the height.
 //
 // Keys that ascend from the first on climb the right edge of the tree. Its node at height k comes to a climb either
 // even, is passed, and leans right from then on; or leaning right, ends the climb and is rotated away, which leaves an

@@ -15,8 +15,8 @@ namespace sm::avl {
 
 // A shortcut for the next insertion: the node that the last one ended at, good for the tree whose root word stands
 // at `root` and still reads `word`. Why an equal word is enough: an insertion always replaces the hint and a deletion
-// drops it, so the tree under an equal word is as the hint left it, wherever the caller's root array has been meanwhile.
-// A tree must therefore stay with one hint, that is, one manager.
+// drops it, so the tree under an equal word is as the hint left it, wherever the caller's root array has been
+// meanwhile. A tree must therefore stay with one hint, that is, one manager.
 struct Hint {
   const Word* root;
   Word word;

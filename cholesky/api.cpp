@@ -2,9 +2,12 @@
 #include "cholesky/steps.hpp"
 
 extern "C" SmStatus qxsmmd(SmMatrix* matrix) { return sm::order(*matrix); }
+extern "C" SmStatus qxsmorder(SmMatrix* matrix, const int64_t* perm) { return sm::order_as_given(*matrix, perm); }
 extern "C" SmStatus qxsmreorder(SmMatrix* matrix) { return sm::reorder(*matrix); }
 extern "C" SmStatus qxsmsymbfact(SmMatrix* matrix) { return sm::factor_symbolic(*matrix); }
 extern "C" SmStatus qxsmnumfact(SmMatrix* matrix) { return sm::factor_numeric(*matrix); }
+
+extern "C" SmStatus qxsmrefill(SmMatrix* matrix, const double* values) { return sm::refill(*matrix, values); }
 
 extern "C" SmStatus qxsmfact(SmMatrix* matrix, int32_t in_place) {
   return sm::factor(*matrix, static_cast<int16_t>(in_place) != 0);

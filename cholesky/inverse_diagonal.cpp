@@ -47,7 +47,7 @@ SmStatus packed_diagonal(SmMatrix& m, double* x) {
     const double* r = factor_array(m);
     for (i64 j = 0; j < m.rows; ++j) {
       if (!(r[layout.diagonal(j)] > 0.0)) continue;
-      std::fill_n(w, m.rows, 0.0);
+      std::fill_n(w, j, 0.0);
       w[j] = 1.0;
       solve_upper(layout, r, w, j);
       for (i64 i = 0; i <= j; ++i) x[i] += w[i] * w[i];
@@ -72,9 +72,7 @@ SmStatus symmetric_diagonal(SmMatrix& m, double* x) {
 }
 
 Gate may_read_diagonal(const SmMatrix& m) {
-  SM_STOP_IF(m.nnz < 1, SM_OK);
-  SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(m), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(m));
   SM_STOP_IF(m.rows != m.cols, SM_NOT_SQUARE);
   return {};
 }

@@ -16,6 +16,7 @@
 //             prototype while degrees are pending.
 #include <algorithm>
 
+#include "cholesky/ordering_steps.hpp"
 #include "cholesky/steps.hpp"
 #include "store/checks.hpp"
 
@@ -288,31 +289,9 @@ void MinimumDegree::number_from_zero() {
   }
 }
 
-// Grows the workspace by one step. What it held before goes back at once.
-SmStatus grow_workspace(SmMatrix& m) {
-  const double limit = static_cast<double>(SM_MAX_ELEMENTS);
-  if (m.work_capacity == 0) {
-    const i64 words_an_entry = 4 / m.factor_block;
-    const double first =
-        4.0 * static_cast<double>(m.rows) + static_cast<double>(m.nnz) * static_cast<double>(words_an_entry);
-    if (first > limit) return SM_TOO_LARGE;
-    m.work_capacity = static_cast<i64>(first);
-  }
-  give_back(m.pool, m.work);
-  const double capacity = static_cast<double>(m.work_capacity) + static_cast<double>(m.nnz);
-  if (capacity * static_cast<double>(m.factor_block) >= limit) return SM_TOO_LARGE;
-  m.work_capacity += m.nnz;
-  if (m.work_capacity < 1) return SM_TOO_LARGE;  // no size that this operation set
-  return allocate(m.pool, m.work_capacity, Fill::none, m.work);
-}
-
 SmStatus order_in_workspace(SmMatrix& m, i64* perm, i64* inv_perm) {
   for (;;) {
-    if (const SmStatus status = grow_workspace(m); status != SM_OK) {
-      give_back(m.pool, m.work);
-      m.work_capacity = 0;
-      return status;
-    }
+    SM_TRY(grow_workspace(m));
     const i64 half = (m.factor_block * m.work_capacity - m.rows) / 2;
     MinimumDegree graph(m, m.work, half, perm, inv_perm);
     if (!graph.enter_graph()) continue;
@@ -320,15 +299,6 @@ SmStatus order_in_workspace(SmMatrix& m, i64* perm, i64* inv_perm) {
     graph.number_from_zero();
     return SM_OK;
   }
-}
-
-Gate may_order(const SmMatrix& m) {
-  SM_STOP_IF(m.nnz < 1, SM_OK);
-  SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_symmetric_sparse(m), SM_NOT_SYMMETRIC_SPARSE);
-  SM_STOP_IF(m.state >= SM_STATE_ORDERED, SM_OK);
-  SM_STOP_IF(!is_closed(m), SM_WRONG_STATE);
-  return {};
 }
 
 }  // namespace

@@ -45,12 +45,14 @@ void solve_transposed(const Layout& layout, const double* r, double* y) {
   }
 }
 
-// y <- R^- y; components behind `last` are 0 and stay so.
+// y <- R^- y for a y whose components behind `last` are 0; they are neither read nor written.
 template <class Layout>
 void solve_upper(const Layout& layout, const double* r, double* y, i64 last) {
   constexpr bool kByColumns = std::is_same_v<Layout, PackedColumns>;
   for (i64 k = last; k >= 0; --k) {
-    kByColumns ? scatter(segment(layout, r, k), y, k) : gather(segment(layout, r, k), y, k);
+    Segment s = segment(layout, r, k);
+    if (!kByColumns) s.count = last - k;
+    kByColumns ? scatter(s, y, k) : gather(s, y, k);
   }
 }
 

@@ -2,7 +2,6 @@
 #include "cholesky/reorder.hpp"
 
 #include <algorithm>
-#include <bit>
 #include <utility>
 
 #include "cholesky/steps.hpp"
@@ -78,10 +77,20 @@ void to_offsets(i64* start, i64 buckets) {
   for (i64 k = 0; k < buckets; ++k) start[k + 1] += start[k];
 }
 
+// visit(position, smaller index, larger index) of every stored entry.
+void for_each_entry(const SmMatrix& m, auto&& visit) {
+  for (i64 i = 0; i < m.rows; ++i) {
+    for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
+      visit(p, std::min(i, m.col_index[p]), std::max(i, m.col_index[p]));
+    }
+  }
+}
+
 }  // namespace
 
 SmStatus reorder(SmMatrix& m) {
   SM_PASS(may_reorder(m));
+  give_back(m.pool, m.factor_reserved);  // the places that a refill found in an earlier order
   i64* counts = m.work;
   i64* target = m.work + m.rows;
   find_owners(m, counts, target);
@@ -92,38 +101,45 @@ SmStatus reorder(SmMatrix& m) {
   return SM_OK;
 }
 
-// Two bucket sorts, by column and then, keeping that order, by row.
+// Closing left the upper triangle row by row, columns ascending: two bucket sorts of the positions, by larger and then,
+// keeping that order, by smaller index.
+void find_closing_places(const SmMatrix& m, i64* place, i64* scratch) {
+  const i64 n = m.rows;
+  i64* start = scratch;
+  i64* by_column = scratch + n + 1;
+  i64* row = by_column + m.nnz;
+  std::fill_n(start, n + 1, 0);
+  for_each_entry(m, [&](i64, i64, i64 larger) { ++start[larger + 1]; });
+  to_offsets(start, n);
+  for_each_entry(m, [&](i64 p, i64 smaller, i64 larger) {
+    const i64 slot = start[larger]++;
+    by_column[slot] = p;
+    row[slot] = smaller;
+  });
+  std::fill_n(start, n + 1, 0);
+  for (i64 s = 0; s < m.nnz; ++s) ++start[row[s] + 1];
+  to_offsets(start, n);
+  for (i64 s = 0; s < m.nnz; ++s) place[start[row[s]]++] = by_column[s];
+}
+
 void restore_order(SmMatrix& m) {
   const i64 n = m.rows;
-  if (!m.row_start || !has_workspace(m, n + 1 + 3 * m.nnz)) return;
+  if (!m.row_start || !has_workspace(m, m.nnz + closing_places_scratch(m))) return;
   m.factor_scratch = m.factor_iju = m.factor_iu = m.factor_ju = nullptr;
   m.factor_diag = m.factor_values = nullptr;
-  i64* start = m.work;
-  i64* row = start + n + 1;
-  i64* col = row + m.nnz;
-  i64* value = col + m.nnz;  // bits of the doubles: the workspace is words
+  i64* place = m.work;
+  i64* start = place + m.nnz;
+  i64* target = start + n + 1;
+  find_closing_places(m, place, start);
+  for (i64 k = 0; k < m.nnz; ++k) target[place[k]] = k;
   std::fill_n(start, n + 1, 0);
-  for (i64 i = 0; i < n; ++i) {
-    for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) ++start[std::max(i, m.col_index[p]) + 1];
-  }
+  for_each_entry(m, [&](i64 p, i64 smaller, i64 larger) {
+    ++start[smaller + 1];
+    m.col_index[p] = larger;
+  });
   to_offsets(start, n);
-  for (i64 i = 0; i < n; ++i) {
-    for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
-      const i64 slot = start[std::max(i, m.col_index[p])]++;
-      row[slot] = std::min(i, m.col_index[p]);
-      col[slot] = std::max(i, m.col_index[p]);
-      value[slot] = std::bit_cast<i64>(m.nz_values[p]);
-    }
-  }
-  std::fill_n(m.row_start, n + 1, 0);
-  for (i64 p = 0; p < m.nnz; ++p) ++m.row_start[row[p] + 1];
-  to_offsets(m.row_start, n);
-  std::copy_n(m.row_start, n, start);
-  for (i64 p = 0; p < m.nnz; ++p) {
-    const i64 slot = start[row[p]]++;
-    m.col_index[slot] = col[p];
-    m.nz_values[slot] = std::bit_cast<double>(value[p]);
-  }
+  std::copy_n(start, n + 1, m.row_start);
+  permute_entries(m, target);
 }
 
 }  // namespace sm

@@ -85,9 +85,7 @@ SmStatus substitute_symmetric(SmMatrix& m, const double* b, double* x, std::int3
 }
 
 Gate may_substitute(const SmMatrix& m, const double* b, const double* x) {
-  SM_STOP_IF(m.nnz < 1, SM_OK);
-  SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(m), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(m));
   SM_STOP_IF(m.state != SM_STATE_FACTORED, SM_WRONG_STATE);
   SM_STOP_IF(b == x, SM_BAD_ARGUMENT);
   return {};

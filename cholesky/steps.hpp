@@ -6,9 +6,12 @@
 namespace sm {
 
 [[nodiscard]] SmStatus order(SmMatrix& m);
+[[nodiscard]] SmStatus order_as_given(SmMatrix& m, const i64* perm);
 [[nodiscard]] SmStatus reorder(SmMatrix& m);
 [[nodiscard]] SmStatus factor_symbolic(SmMatrix& m);
 [[nodiscard]] SmStatus factor_numeric(SmMatrix& m);
+
+[[nodiscard]] SmStatus refill(SmMatrix& m, const double* values);
 
 [[nodiscard]] SmStatus factor(SmMatrix& m, bool in_place);
 // The array of a packed or diagonal matrix that is to be factored or inverted: the values themselves (a separate array

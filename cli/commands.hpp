@@ -2,6 +2,7 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <string>
 
 #include "cli/progress.hpp"
@@ -9,12 +10,13 @@
 
 namespace sm::cli {
 
-// Options that every subcommand has.
+// Options that more than one subcommand has.
 struct CommonOptions {
   bool json = false;
   bool quiet = false;
   std::string memory;         // as given: "4G"
   std::uint64_t ceiling = 0;  // in bytes; what the machine has when not given
+  std::string output;         // where the result goes; empty: it is not written
 };
 
 struct InfoOptions {
@@ -28,7 +30,6 @@ struct FactorOptions {
 
 struct InvdiagOptions {
   std::string matrix;
-  std::string output;  // empty: the diagonal is not written
 };
 
 struct TraceOptions {
@@ -37,29 +38,57 @@ struct TraceOptions {
   bool inverse = false;
 };
 
+struct QuadOptions {
+  std::string matrix;
+  std::string rows;
+  bool inverse = false;
+};
+
+struct HermiteOptions {
+  std::string matrix;
+};
+
+struct EstimableOptions {
+  std::string matrix;
+  std::string rows;
+  double tolerance = 1e-6;
+};
+
 struct SolveOptions {
   std::string matrix;
   std::string right_hand_sides;  // empty: b = A * 1
-  std::string output;            // empty: the solution is not written
   std::string method = "direct";
+  std::optional<double> tolerance;  // of the conjugate gradients, as the next one
+  std::optional<std::int64_t> max_iterations;
+};
+
+struct ConvertOptions {
+  std::string matrix;
+  std::string to;
 };
 
 struct GridOptions {
   std::int64_t nx = 0;
   std::int64_t ny = 0;
   double shift = 0.0;
-  std::string output = "-";
 };
 
 // Each throws CommandError when it cannot go on; a numerical "no" is a report with another exit code.
 Report run_info(const InfoOptions& options, const CommonOptions& common, Progress& progress);
 Report run_factor(const FactorOptions& options, const CommonOptions& common, Progress& progress);
-Report run_invdiag(const InvdiagOptions& options, const CommonOptions& common, Progress& progress);
-Report run_trace(const TraceOptions& options, const CommonOptions& common, Progress& progress);
 Report run_solve(const SolveOptions& options, const CommonOptions& common, Progress& progress);
-Report run_grid(const GridOptions& options);
+Report run_invdiag(const InvdiagOptions& options, const CommonOptions& common, Progress& progress);
+Report run_quad(const QuadOptions& options, const CommonOptions& common, Progress& progress);
+Report run_trace(const TraceOptions& options, const CommonOptions& common, Progress& progress);
+Report run_hermite(const HermiteOptions& options, const CommonOptions& common, Progress& progress);
+Report run_estimable(const EstimableOptions& options, const CommonOptions& common, Progress& progress);
+Report run_convert(const ConvertOptions& options, const CommonOptions& common, Progress& progress);
+Report run_grid(const GridOptions& options, const CommonOptions& common, Progress& progress);
 
 // A b is called inconsistent with a singular A when its relative residual is above this.
 constexpr double kInconsistent = 1e-10;
+
+// A right-hand side counts as solved by conjugate gradients when its residual has come down to this part of the first.
+constexpr double kConverged = 1e-10;
 
 }  // namespace sm::cli

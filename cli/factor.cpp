@@ -1,27 +1,19 @@
 #include "cli/commands.hpp"
 #include "cli/facts.hpp"
+#include "cli/run.hpp"
 
 namespace sm::cli {
 
 Report run_factor(const FactorOptions& options, const CommonOptions& common, Progress& progress) {
-  LoadedMatrix matrix = load_matrix(options.matrix, common.ceiling, progress);
-  Report report("factor");
-  report_matrix(report, matrix);
-  require_symmetric(matrix);
-
-  ModuleSession session(pool_ceiling(common));
-  Factorization factorization(session, matrix.rows, progress);
-  factorization.analyse();
-  const bool factored = factorization.factor();
-  if (factored) {
-    report_outcome(report, factorization);
+  Run run("factor", {options.matrix}, common, progress);
+  Factorization& factorization = run.analysed();
+  if (factorization.factor()) {
+    report_outcome(run.report(), factorization);
   } else {
-    report_not_definite(report, matrix);
+    report_not_definite(run.report(), run.matrix());
   }
-  report_counts(report, factorization.counts(), factorization.order());
-  report_phases(report, matrix.seconds, factorization);
-  report_memory(report, session);
-  return report;
+  report_counts(run.report(), factorization.counts(), factorization.order());
+  return run.finish();
 }
 
 }  // namespace sm::cli

@@ -1,9 +1,6 @@
 #include "cli/factorization.hpp"
 
-#include <fmt/format.h>
-
 #include <algorithm>
-#include <chrono>
 
 #include "cli/error.hpp"
 #include "cli/module_matrix.hpp"
@@ -19,37 +16,22 @@ double FactorCounts::fill_ratio(std::int64_t n) const {
   return entries == 0 ? 1.0 : static_cast<double>(nnz_u + n) / static_cast<double>(entries);
 }
 
-template <class Work>
-auto Factorization::timed(const std::string& name, Work work, double flops) {
-  progress_.phase(flops > 0.0 ? fmt::format("{} ({:.3g} Gflop)", name, flops / 1e9) : name);
-  const auto begin = std::chrono::steady_clock::now();
-  const auto answer = work();
-  const std::chrono::duration<double> seconds = std::chrono::steady_clock::now() - begin;
-  phases_.push_back({name, seconds.count(), flops});
-  return answer;
-}
-
-Factorization::Factorization(ModuleSession& session, const CompressedRows& upper, Progress& progress)
-    : session_(session), progress_(progress), order_(upper.rows) {
-  timed("assembling", [&] { return enter(upper), 0; });
-  const SmStatus closed = timed("closing", [&] { return session_.fn().qxsmclose(matrix_, 0.0); });
-  session_.expect_ok(closed, "closing the matrix");
+Factorization::Factorization(ModuleSession& session, const LoadedMatrix& upper, PhaseClock& clock)
+    : session_(session),
+      clock_(clock),
+      order_(upper.rows.rows),
+      matrix_(module_matrix(session, upper, kSymmetricSparse, clock)) {
   counts_.entries = matrix_->nnz;
-}
-
-void Factorization::enter(const CompressedRows& upper) {
-  session_.expect_ok(session_.fn().qxsmnewss(session_.instance(), &matrix_, order_), "assembling the matrix");
-  enter_rows(session_, matrix_, upper, progress_);
 }
 
 void Factorization::analyse() {
   if (order_ == 0) return;
   const ExportedSteps& steps = session_.steps();
-  const SmStatus ordered = timed("ordering", [&] { return steps.qxsmmd(matrix_); });
+  const SmStatus ordered = clock_.timed("ordering", [&] { return steps.qxsmmd(matrix_); });
   session_.expect_ok(ordered, "ordering the matrix");
-  const SmStatus moved = timed("reordering", [&] { return steps.qxsmreorder(matrix_); });
+  const SmStatus moved = clock_.timed("reordering", [&] { return steps.qxsmreorder(matrix_); });
   session_.expect_ok(moved, "applying the order");
-  const SmStatus symbolic = timed("symbolic", [&] { return steps.qxsmsymbfact(matrix_); });
+  const SmStatus symbolic = clock_.timed("symbolic", [&] { return steps.qxsmsymbfact(matrix_); });
   session_.expect_ok(symbolic, "finding the structure of the factor");
   count();
 }
@@ -65,7 +47,7 @@ void Factorization::count() {
 
 bool Factorization::factor() {
   if (order_ == 0) return true;
-  const SmStatus status = timed(
+  const SmStatus status = clock_.timed(
       "numeric", [&] { return session_.steps().qxsmnumfact(matrix_); }, counts_.flops);
   if (status == SM_NOT_DEFINITE) return false;
   session_.expect_ok(status, "factoring the matrix");
@@ -83,23 +65,20 @@ void Factorization::solve(const double* b, double* x, std::int64_t count) {
     for (std::int64_t done = 0; done < count; done += kSolvesPerCall) {
       const std::int64_t now = std::min(kSolvesPerCall, count - done);
       session_.expect_ok(session_.steps().qxsminvmultv(matrix_, b + done * order_, x + done * order_, now), "solving");
-      progress_.update(static_cast<double>(done + now) / static_cast<double>(count));
+      clock_.progress().update(static_cast<double>(done + now) / static_cast<double>(count));
     }
     return 0;
   };
-  timed("solving", all, flops);
+  clock_.timed("solving", all, flops);
 }
 
 std::vector<double> Factorization::inverse_diagonal() {
   std::vector<double> diagonal(static_cast<std::size_t>(order_));
   if (order_ == 0) return diagonal;
-  const SmStatus status = timed("inverting", [&] { return session_.fn().qxsminvdiag(matrix_, diagonal.data()); });
+  const SmStatus status =
+      clock_.timed("inverting", [&] { return session_.fn().qxsminvdiag(matrix_, diagonal.data()); });
   session_.expect_ok(status, "computing the diagonal of the inverse");
   return diagonal;
-}
-
-SmStatus Factorization::inverse_trace(SmMatrix* other, double& trace) {
-  return timed("tracing", [&] { return session_.steps().qxsmtraceinvAB(matrix_, other, 0, &trace); });
 }
 
 std::vector<std::int64_t> Factorization::dropped_rows() const {

@@ -2,22 +2,13 @@
 #pragma once
 
 #include <cstdint>
-#include <string>
 #include <vector>
 
+#include "cli/loading.hpp"
 #include "cli/module_session.hpp"
-#include "cli/progress.hpp"
-#include "cli/sparse.hpp"
+#include "cli/phases.hpp"
 
 namespace sm::cli {
-
-struct Phase {
-  std::string name;
-  double seconds = 0.0;
-  double flops = 0.0;  // 0: not counted
-
-  double gflops() const { return flops > 0.0 && seconds > 0.0 ? flops / seconds / 1e9 : 0.0; }
-};
 
 // What the structure of U costs.
 struct FactorCounts {
@@ -33,9 +24,9 @@ struct FactorCounts {
 
 class Factorization {
  public:
-  // Enters the upper triangle element by element (qxsmnewss, qxsmassign in add mode) and closes it, with tolerance 0:
-  // zeros off the diagonal are not kept, as they would only add fill. Throws CommandError.
-  Factorization(ModuleSession& session, const CompressedRows& upper, Progress& progress);
+  // Makes the matrix from its upper triangle. Zeros off the diagonal are not kept, as they would only add fill. Throws
+  // CommandError.
+  Factorization(ModuleSession& session, const LoadedMatrix& upper, PhaseClock& clock);
 
   void analyse();  // qxsmmd, qxsmreorder, qxsmsymbfact
   bool factor();   // qxsmnumfact; false when the matrix is not positive semidefinite
@@ -46,30 +37,23 @@ class Factorization {
   // The diagonal of the inverse, or of the generalized inverse that dropped pivots leave. After factor().
   std::vector<double> inverse_diagonal();
 
-  // The trace of the inverse times a closed matrix of that order; the module's own answer. After factor().
-  SmStatus inverse_trace(SmMatrix* other, double& trace);
-
   std::int64_t order() const { return order_; }
   const FactorCounts& counts() const { return counts_; }
   std::int64_t rank() const { return rank_; }
   double log_determinant() const { return log_determinant_; }
   std::vector<std::int64_t> dropped_rows() const;  // from 1, ascending
-  const std::vector<Phase>& phases() const { return phases_; }
+  SmMatrix* matrix() { return matrix_; }           // for operations of the module that need no more than the factor
 
  private:
-  template <class Work>
-  auto timed(const std::string& name, Work work, double flops = 0.0);
-  void enter(const CompressedRows& upper);
   void count();
 
   ModuleSession& session_;
-  Progress& progress_;
+  PhaseClock& clock_;
   std::int64_t order_;
-  SmMatrix* matrix_ = nullptr;  // goes back with the instance
+  SmMatrix* matrix_;  // goes back with the instance
   FactorCounts counts_;
   std::int64_t rank_ = 0;
   double log_determinant_ = 0.0;
-  std::vector<Phase> phases_;
 };
 
 }  // namespace sm::cli

@@ -8,6 +8,11 @@
 #include "cli/structure.hpp"
 
 namespace sm::cli {
+namespace {
+
+constexpr std::size_t kShown = 10;  // values listed in the text
+
+}  // namespace
 
 std::uint64_t pool_ceiling(const CommonOptions& common) {
   if (!common.memory.empty()) return common.ceiling;
@@ -51,7 +56,7 @@ void report_counts(Report& report, const FactorCounts& counts, std::int64_t orde
              fmt::format("{:.0f} (sum of L(L+2) over the rows of U, L entries off the diagonal)", counts.flops));
 }
 
-void report_phases(Report& report, double reading, const Factorization& factorization) {
+void report_phases(Report& report, const PhaseClock& clock) {
   Json phases = Json::array();
   const auto add = [&](const Phase& phase) {
     Json json{{"name", phase.name}, {"seconds", phase.seconds}};
@@ -60,8 +65,7 @@ void report_phases(Report& report, double reading, const Factorization& factoriz
     report.add_text(phase.name, fmt::format("{} s{}", seconds_text(phase.seconds),
                                             phase.flops > 0.0 ? fmt::format(", {:.3f} GFLOP/s", phase.gflops()) : ""));
   };
-  add({.name = "reading", .seconds = reading});
-  for (const Phase& phase : factorization.phases()) add(phase);
+  for (const Phase& phase : clock.phases()) add(phase);
   report.add_json("phases", std::move(phases));
 }
 
@@ -72,6 +76,24 @@ void report_memory(Report& report, const ModuleSession& session) {
              fmt::format("{} in pools, {} resident", bytes_text(static_cast<double>(pools)),
                          bytes_text(static_cast<double>(resident))));
   report.add_json("peak_resident_bytes", resident);
+}
+
+void report_first_values(Report& report, const char* label, std::span<const double> values) {
+  const std::size_t shown = std::min(kShown, values.size());
+  for (std::size_t i = 0; i < shown; ++i) report.add_text(fmt::format("{} {}", label, i + 1), number_text(values[i]));
+  if (values.size() > shown) report.add_text("...", fmt::format("{} more", values.size() - shown));
+  report.add_json("first_values",
+                  std::vector<double>(values.begin(), values.begin() + static_cast<std::ptrdiff_t>(shown)));
+}
+
+void report_written(Report& report, const OutputFile* output, const char* label, const std::string& shape) {
+  report.add("output", output ? Json(output->path()) : Json(), label,
+             output ? fmt::format("{}, in {}", shape, output->path()) : "to no file (see -o)");
+}
+
+std::string matrix_text(const LoadedMatrix& matrix) {
+  const Header& header = matrix.header;
+  return fmt::format("{} ({}), {} x {}", matrix.name, kind_text(header), header.rows, header.cols);
 }
 
 void report_not_definite(Report& report, const LoadedMatrix& matrix) {

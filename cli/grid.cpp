@@ -26,7 +26,7 @@ void write_points(OutputFile& out, const GridOptions& grid) {
 
 }  // namespace
 
-Report run_grid(const GridOptions& options) {
+Report run_grid(const GridOptions& options, const CommonOptions& common, Progress&) {
   std::int64_t order = 0;
   std::int64_t entries = 0;
   if (__builtin_mul_overflow(options.nx, options.ny, &order) || __builtin_mul_overflow(order, 3, &entries)) {
@@ -34,7 +34,7 @@ Report run_grid(const GridOptions& options) {
                         .advice = "give smaller numbers"});
   }
   entries -= options.nx + options.ny;
-  OutputFile out(options.output, {});
+  OutputFile out(common.output, {});
   fmt::format_to(std::back_inserter(out.buffer()),
                  "%%MatrixMarket matrix coordinate real symmetric\n"
                  "% five-point stencil on a {} x {} grid: {} on the diagonal, -1 for each neighbour\n{} {} {}\n",
@@ -43,7 +43,7 @@ Report run_grid(const GridOptions& options) {
   out.finish();
 
   Report report("grid");
-  report.add("output", options.output, "grid", fmt::format("{} x {}, in {}", options.nx, options.ny, options.output));
+  report.add("output", common.output, "grid", fmt::format("{} x {}, in {}", options.nx, options.ny, common.output));
   report.add("rows", order, "order", fmt::format("{}", order));
   report.add("stored_entries", entries, "stored entries", fmt::format("{}", entries));
   return report;

@@ -6,8 +6,9 @@ const char* const kMain =
     R"(qxsm - inspect, factor and solve with sparse symmetric matrices
 
 Reads Matrix Market files and works on them through the qxesm module: a fill-reducing order, the factorization
-A = U'DU with rank and log-determinant, and solutions of A x = b. Singular matrices are welcome: a pivot that is zero
-to tolerance is dropped, and what is solved with is then a generalized inverse.
+A = U'DU with rank and log-determinant, solutions of A x = b, and what else is made of a matrix and its inverse.
+Singular matrices are welcome: a pivot that is zero to tolerance is dropped, and what is solved with is then a
+generalized inverse.
 
 Example: solve A x = b for a stiffness matrix, with b = A * 1.
 
@@ -78,6 +79,10 @@ infinity norm, from the entries of the file. When A is singular, each b is teste
 1e-10 is called inconsistent (A x = b has no solution), and the exit code is 1. A matrix that is not positive
 semidefinite is refused, with exit code 1.
 
+With --method cg nothing is factored: conjugate gradients, preconditioned by the diagonal, take one right-hand side
+after the other. On a terminal the residual is shown as it comes down; --json has its history. Where they do not
+converge the exit code is 1, and x is what they had reached.
+
 Example: two right-hand sides, one in each column of an array file.
 
   $ qxsm solve data/bcsstk01.mtx -b data/bcsstk01_b.mtx -o x.mtx
@@ -86,6 +91,12 @@ Example: two right-hand sides, one in each column of an array file.
   relative residual 1  1.338e-16
   relative residual 2  1.424e-19
   solution             48 x 2, in x.mtx
+  ...
+  $ qxsm solve data/gr_30_30.mtx --method cg --tolerance 1e-8 --max-iterations 200
+  tolerance          1e-08
+  max iterations     200
+  iterations         41 (the most for one right-hand side)
+  relative residual  1.460e-09 after 41 iterations
   ...
 )";
 
@@ -108,6 +119,27 @@ Example: which joints of a structure give way most, and how far.
   ...
 )";
 
+const char* const kQuad =
+    R"(Compute the form X A X' or X A^- X'
+
+A is symmetric, and X any real matrix with as many columns. With --inverse A is factored as 'qxsm factor' does: with
+the normal equations of a model in A and functions of its parameters in the rows of X, the form holds the variances and
+covariances of the estimates, up to the error variance. When A is singular, the inverse is the generalized inverse that
+dropped pivots leave, and the form is the same for every generalized inverse as far as the rows of X are estimable (see
+'qxsm estimable'). A matrix that is not positive semidefinite is then refused, with exit code 1.
+
+Example: variances of three group means, of two, three and one observation.
+
+  $ qxsm quad data/oneway.mtx data/oneway_means.mtx --inverse -o f.mtx
+  rows of X        data/oneway_means.mtx (array real general), 3 x 4
+  rank             3 of 4
+  form             3 x 3, 6 values in its lower triangle
+  diagonal 1       0.5
+  diagonal 3       1
+  written          3 x 3 (array real symmetric), in f.mtx
+  ...
+)";
+
 const char* const kTrace =
     R"(Compute the trace of A, A B, A^- or A^- B
 
@@ -123,6 +155,67 @@ Example: the inverse of A times A itself has the rank of A as its trace.
   rank             48 of 48
   rows dropped     none
   tr(A^- B)        47.99999999999997
+  ...
+)";
+
+const char* const kHermite =
+    R"(Compute the Hermite form A^- A of a symmetric matrix
+
+Factors A as 'qxsm factor' does and computes H = A^- A, column by column. H is the identity when A is regular. Else it
+has a row of zeros for each dropped pivot, and its other rows tell how each parameter of a model is confounded with
+those that were dropped: a row l is estimable when l H = l. Elements of magnitude 1.11e-12 or less are left out. A
+matrix that is not positive semidefinite is refused, with exit code 1.
+
+Example: a mean and three groups, where the mean is the sum of what the groups say.
+
+  $ qxsm hermite data/oneway.mtx -o h.mtx
+  rank             3 of 4
+  tr(H)            3
+  Hermite form     6 entries
+  written          4 x 4, in h.mtx
+  ...
+)";
+
+const char* const kEstimable =
+    R"(Tell which rows of L are estimable with the normal equations A
+
+A row l is estimable when it is a combination of rows of A: l b is then the same for every solution b of the normal
+equations, whatever generalized inverse they were solved with. Three things are asked for each row:
+
+  pivots        no pivot was dropped (yes), l is nothing but dropped places (no), or neither (open)
+  Hermite form  l H = l, with H = A^- A
+  check         A A^- l = l
+
+A row that passes the last two is estimable. When one does not, it is named, and the exit code is 1. So it is for a
+matrix that is not positive semidefinite.
+
+Example: with a mean beside three groups, a group's mean and a difference of groups are estimable; a group's effect
+alone and the mean alone are not.
+
+  $ qxsm estimable data/oneway.mtx data/oneway_l.mtx     # exit code 1
+  rows of L        data/oneway_l.mtx (coordinate real general), 4 x 4
+  rank             3 of 4
+  row 1            estimable (pivots open, Hermite form yes, check yes)
+  not estimable    2 of 4: 3, 4
+  ...
+)";
+
+const char* const kConvert =
+    R"(Write a matrix in another form: sparse, dense or packed
+
+Reads any file that the other subcommands read and writes it as coordinates, as an array of the whole matrix, or as an
+array of its lower triangle. Entries at one position are added together, and sparse files have no zeros. A matrix that
+is symmetric only in value, and not by the word of its file, can be packed too.
+
+Example: a stiffness matrix as a packed triangle, and back.
+
+  $ qxsm convert data/bcsstk01.mtx p.mtx.gz --to packed
+  to              packed (array real symmetric)
+  values          1176
+  ...
+  $ qxsm convert p.mtx.gz s.mtx --to sparse
+  to              sparse (coordinate real symmetric)
+  values          224
   ...
 )";
 
@@ -144,7 +237,8 @@ Example: a problem with a million unknowns.
 const char* const kExitCodes =
     R"(Exit codes:
   0  done
-  1  a numerical "no": not positive semidefinite, an inconsistent right-hand side, or a result that overflows
+  1  a numerical "no": not positive semidefinite, an inconsistent right-hand side, not converged, a row that is not
+     estimable, or a result that overflows
   2  wrong usage, or a file that cannot be read, understood or written
   3  out of memory (see --memory), or the module cannot be loaded)";
 

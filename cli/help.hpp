@@ -8,7 +8,11 @@ extern const char* const kInfo;
 extern const char* const kFactor;
 extern const char* const kSolve;
 extern const char* const kInvdiag;
+extern const char* const kQuad;
 extern const char* const kTrace;
+extern const char* const kHermite;
+extern const char* const kEstimable;
+extern const char* const kConvert;
 extern const char* const kGrid;
 extern const char* const kExitCodes;
 

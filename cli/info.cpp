@@ -1,8 +1,11 @@
 #include <fmt/format.h>
 
+#include <utility>
+
 #include "cli/commands.hpp"
 #include "cli/facts.hpp"
 #include "cli/format.hpp"
+#include "cli/run.hpp"
 #include "cli/structure.hpp"
 
 namespace sm::cli {
@@ -10,7 +13,7 @@ namespace {
 
 // Entries of the whole matrix, both triangles of a symmetric one.
 std::int64_t full_entries(const LoadedMatrix& matrix, const Diagonal& diagonal) {
-  return matrix.upper_only() ? 2 * matrix.rows.size() - diagonal.present : matrix.rows.size();
+  return matrix.upper_only ? 2 * matrix.rows.size() - diagonal.present : matrix.rows.size();
 }
 
 void report_density(Report& report, const LoadedMatrix& matrix, const Diagonal& diagonal) {
@@ -29,7 +32,7 @@ bool report_symmetry(Report& report, const LoadedMatrix& matrix) {
   if (matrix.header.rows != matrix.header.cols) {
     check.pattern = check.values = false;
     text = "not square";
-  } else if (!matrix.upper_only()) {
+  } else if (!matrix.upper_only) {
     check = check_symmetry(matrix.rows);
     text = check.values    ? check.pattern ? "symmetric in pattern and value" : "symmetric in value, not in pattern"
            : check.pattern ? "symmetric in pattern, not in value"
@@ -72,22 +75,21 @@ void report_need(Report& report, std::int64_t order, std::int64_t upper) {
 
 // Orders the matrix and finds the structure of its factor. The numeric factorization takes no further memory, so the
 // peak so far is the peak of factoring.
-void report_fill(Report& report, const LoadedMatrix& matrix, const CommonOptions& common, Progress& progress) {
-  ModuleSession session(pool_ceiling(common));
-  Factorization factorization(session, matrix.rows, progress);
-  factorization.analyse();
-  report_counts(report, factorization.counts(), factorization.order());
-  const auto bytes = static_cast<double>(session.peak_bytes());
-  report.add("factoring_bytes", session.peak_bytes(), "to factor", bytes_text(bytes) + " (measured in pools)");
+void report_fill(Run& run) {
+  const Factorization& factorization = run.analysed();
+  report_counts(run.report(), factorization.counts(), factorization.order());
+  const std::uint64_t bytes = run.session().peak_bytes();
+  run.report().add("factoring_bytes", bytes, "to factor",
+                   bytes_text(static_cast<double>(bytes)) + " (measured in pools)");
 }
 
 }  // namespace
 
 Report run_info(const InfoOptions& options, const CommonOptions& common, Progress& progress) {
-  LoadedMatrix matrix = load_matrix(options.matrix, common.ceiling, progress);
-  Report report("info");
+  Run run("info", {options.matrix}, common, progress);
+  LoadedMatrix& matrix = run.matrix();
+  Report& report = run.report();
   const Diagonal diagonal = inspect_diagonal(matrix.rows);
-  report_matrix(report, matrix);
   report_density(report, matrix, diagonal);
   const bool symmetric = report_symmetry(report, matrix);
   report_diagonal(report, diagonal);
@@ -99,8 +101,8 @@ Report run_info(const InfoOptions& options, const CommonOptions& common, Progres
     report.add("assembling_bytes", Json(), "memory needed", "none, as only symmetric matrices are factored");
     report.add_json("ordering_bytes", Json());
   }
-  if (options.fill) report_fill(report, matrix, common, progress);
-  return report;
+  if (options.fill) report_fill(run);
+  return std::move(report);
 }
 
 }  // namespace sm::cli

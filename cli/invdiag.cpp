@@ -2,17 +2,13 @@
 
 #include <algorithm>
 #include <cmath>
-#include <optional>
 
 #include "cli/commands.hpp"
 #include "cli/facts.hpp"
-#include "cli/format.hpp"
-#include "cli/output_file.hpp"
+#include "cli/run.hpp"
 
 namespace sm::cli {
 namespace {
-
-constexpr std::size_t kShown = 10;  // elements listed when they go to no file
 
 void report_range(Report& report, const std::string& name, const std::vector<double>& diagonal) {
   const bool finite = std::all_of(diagonal.begin(), diagonal.end(), [](double d) { return std::isfinite(d); });
@@ -34,47 +30,23 @@ void report_range(Report& report, const std::string& name, const std::vector<dou
                .advice = "scale the matrix"});
 }
 
-void report_values(Report& report, std::optional<OutputFile>& output, const std::vector<double>& diagonal,
-                   const std::string& name) {
-  const auto n = static_cast<std::int64_t>(diagonal.size());
-  if (output) write_array(*output, n, 1, diagonal.data(), comment_text("diagonal of the inverse of " + name));
-  const std::size_t shown = std::min(kShown, diagonal.size());
-  if (!output) {
-    for (std::size_t i = 0; i < shown; ++i) {
-      report.add_text(fmt::format("row {}", i + 1), number_text(diagonal[i]));
-    }
-    if (diagonal.size() > shown) report.add_text("...", fmt::format("{} more", diagonal.size() - shown));
-  }
-  report.add_json("first_values",
-                  std::vector<double>(diagonal.begin(), diagonal.begin() + static_cast<std::ptrdiff_t>(shown)));
-  report.add("output", output ? Json(output->path()) : Json(), "written",
-             output ? fmt::format("{} x 1, in {}", n, output->path()) : "to no file (see -o)");
-}
-
 }  // namespace
 
 Report run_invdiag(const InvdiagOptions& options, const CommonOptions& common, Progress& progress) {
-  LoadedMatrix matrix = load_matrix(options.matrix, common.ceiling, progress);
-  Report report("invdiag");
-  report_matrix(report, matrix);
-  require_symmetric(matrix);
-  std::optional<OutputFile> output;
-  if (!options.output.empty()) output.emplace(options.output, std::vector{options.matrix});
-
-  ModuleSession session(pool_ceiling(common));
-  Factorization factorization(session, matrix.rows, progress);
-  factorization.analyse();
-  if (!factorization.factor()) {
-    report_not_definite(report, matrix);
-    return report;
-  }
-  const std::vector<double> diagonal = factorization.inverse_diagonal();
-  report_outcome(report, factorization);
-  report_range(report, matrix.name, diagonal);
-  report_values(report, output, diagonal, matrix.name);
-  report_phases(report, matrix.seconds, factorization);
-  report_memory(report, session);
-  return report;
+  Run run("invdiag", {options.matrix}, common, progress);
+  require_symmetric(run.matrix());
+  const auto output = run.open_output();
+  Factorization* const factor = run.factored();
+  if (!factor) return run.finish();
+  const std::vector<double> diagonal = factor->inverse_diagonal();
+  const std::string& name = run.matrix().name;
+  report_outcome(run.report(), *factor);
+  report_range(run.report(), name, diagonal);
+  report_first_values(run.report(), "row", diagonal);
+  const auto n = static_cast<std::int64_t>(diagonal.size());
+  if (output) write_array(*output, n, 1, diagonal.data(), comment_text("diagonal of the inverse of " + name));
+  report_written(run.report(), output.get(), "written", fmt::format("{} x 1", n));
+  return run.finish();
 }
 
 }  // namespace sm::cli

@@ -87,31 +87,57 @@ LoadedMatrix load_matrix(const std::string& path, std::uint64_t limit, Progress&
   matrix.header = read_file(path, store, progress);
   matrix.file_entries = store.size();
   matrix.rows = store.compress(matrix.name, limit);
+  matrix.upper_only = matrix.header.symmetry == Symmetry::symmetric;
   matrix.seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - begin).count();
   return matrix;
 }
 
-void require_symmetric(LoadedMatrix& matrix) {
+void require_symmetric(LoadedMatrix& matrix, const char* why) {
   const Header& header = matrix.header;
   if (header.rows != header.cols) {
-    throw CommandError(
-        {.file = matrix.name,
-         .line = header.size_line,
-         .what = fmt::format("found {} rows and {} columns", header.rows, header.cols),
-         .expected = "a square matrix",
-         .advice = "only symmetric matrices are factored; for least squares give the normal equations X'X"});
+    throw CommandError({.file = matrix.name,
+                        .line = header.size_line,
+                        .what = fmt::format("found {} rows and {} columns", header.rows, header.cols),
+                        .expected = "a square matrix",
+                        .advice = std::string(why) + "; for least squares give the normal equations X'X"});
   }
-  if (matrix.upper_only()) return;
+  if (matrix.upper_only) return;
   const SymmetryCheck check = check_symmetry(matrix.rows);
   if (!check.values) {
-    throw CommandError({.file = matrix.name,
-                        .what = fmt::format("found {} at ({}, {}) and {} at ({}, {})", check.below, check.row + 1,
-                                            check.col + 1, check.above, check.col + 1, check.row + 1),
-                        .expected = "a symmetric matrix",
-                        .advice = "only symmetric matrices are factored; make the two equal, or write one triangle and "
-                                  "symmetric in line 1"});
+    throw CommandError(
+        {.file = matrix.name,
+         .what = fmt::format("found {} at ({}, {}) and {} at ({}, {})", check.below, check.row + 1, check.col + 1,
+                             check.above, check.col + 1, check.row + 1),
+         .expected = "a symmetric matrix",
+         .advice = std::string(why) + "; make the two equal, or write one triangle and symmetric in line 1"});
   }
   keep_upper_triangle(matrix.rows);
+  matrix.upper_only = true;
+}
+
+void require_columns(const LoadedMatrix& matrix, std::int64_t order) {
+  if (matrix.header.cols == order) return;
+  throw CommandError({.file = matrix.name,
+                      .line = matrix.header.size_line,
+                      .what = fmt::format("found {} columns", matrix.header.cols),
+                      .expected = fmt::format("{}, the order of the matrix", order),
+                      .advice = "give a file with one column for each row of the matrix"});
+}
+
+std::vector<double> dense_rows(const LoadedMatrix& matrix, std::uint64_t limit) {
+  const CompressedRows& rows = matrix.rows;
+  require_memory(8.0 * static_cast<double>(rows.rows) * static_cast<double>(rows.cols), limit,
+                 fmt::format("{} vectors of {} elements", rows.rows, rows.cols));
+  std::vector<double> dense(static_cast<std::size_t>(rows.rows * rows.cols), 0.0);
+  for (std::int64_t i = 0; i < rows.rows; ++i) {
+    for (auto p = rows.start[static_cast<std::size_t>(i)]; p < rows.start[static_cast<std::size_t>(i + 1)]; ++p) {
+      const std::int64_t j = rows.col[static_cast<std::size_t>(p)];
+      const double value = rows.value[static_cast<std::size_t>(p)];
+      dense[static_cast<std::size_t>(i * rows.cols + j)] = value;
+      if (matrix.upper_only) dense[static_cast<std::size_t>(j * rows.cols + i)] = value;
+    }
+  }
+  return dense;
 }
 
 Columns load_columns(const std::string& path, std::int64_t order, std::uint64_t limit, Progress& progress) {

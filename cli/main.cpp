@@ -1,4 +1,4 @@
-// qxsm: information about, factorization of and solutions with sparse symmetric matrices, by way of the module.
+// qxsm: the operations of the module on matrices in files.
 #include <fmt/format.h>
 #include <unistd.h>
 
@@ -11,41 +11,18 @@
 namespace sm::cli {
 namespace {
 
-// Whether the result itself goes to standard output, so that the report has to go elsewhere.
-bool output_is_taken(const Options& options) {
-  return (options.command == Command::solve && options.solve.output == "-") ||
-         (options.command == Command::invdiag && options.invdiag.output == "-") ||
-         (options.command == Command::grid && options.grid.output == "-");
-}
-
 Report run_command(const Options& options) {
   // On a terminal, a result that goes there and a progress line would run into each other.
-  const bool shown = !options.common.quiet && !output_is_taken(options) && is_capable_terminal(STDERR_FILENO);
+  const bool shown = !options.common.quiet && !options.output_is_taken() && is_capable_terminal(STDERR_FILENO);
   Progress progress(STDERR_FILENO, shown);
-  switch (options.command) {
-    case Command::info:
-      return run_info(options.info, options.common, progress);
-    case Command::factor:
-      return run_factor(options.factor, options.common, progress);
-    case Command::solve:
-      return run_solve(options.solve, options.common, progress);
-    case Command::invdiag:
-      return run_invdiag(options.invdiag, options.common, progress);
-    case Command::trace:
-      return run_trace(options.trace, options.common, progress);
-    case Command::grid:
-      return run_grid(options.grid);
-    case Command::none:
-      break;
-  }
-  throw CommandError({.what = "no subcommand was given", .advice = "see qxsm --help"});
+  return options.run(options, progress);
 }
 
 ExitCode print(const Options& options, const Report& report) {
-  const bool taken = output_is_taken(options);
-  if (taken && options.command == Command::grid) return report.code();  // there is nothing to say beside the grid
+  const bool taken = options.output_is_taken();
   const int file = taken ? STDERR_FILENO : STDOUT_FILENO;
-  const std::string text = options.common.json ? report.json() : options.common.quiet ? "" : report.text();
+  const bool silent = options.common.quiet || (taken && options.filter);
+  const std::string text = options.common.json ? report.json() : silent ? "" : report.text();
   write_all(file, text, taken ? "standard error" : "standard output");
   if (!report.failure().empty()) write_all(STDERR_FILENO, "qxsm: " + report.failure() + "\n", "standard error");
   return report.code();
@@ -57,8 +34,9 @@ ExitCode run(int argc, const char* const* argv) {
     write_all(STDOUT_FILENO, options.answer, "standard output");
     return ExitCode::fine;
   }
-  if (options.common.json && output_is_taken(options)) {
-    throw CommandError({.what = "--json and -o - both want standard output", .advice = "give -o a file"});
+  if (options.common.json && options.output_is_taken()) {
+    throw CommandError(
+        {.what = "--json and the result both want standard output", .advice = "send the result to a file"});
   }
   return print(options, run_command(options));
 }

@@ -46,9 +46,9 @@ class EntrySink {
 };
 
 // Reads one matrix to the end of the source. Throws CommandError, naming `name` and the line, at the first thing that
-// is not as it must be: a header of another kind, a wrong number of fields, an index outside the matrix, a value that is
-// no finite number, entries on both sides of the diagonal of a symmetric file, too few or too many entries, a line that
-// fills the buffer.
+// is not as it must be: a header of another kind, a wrong number of fields, an index outside the matrix, a value that
+// is no finite number, entries on both sides of the diagonal of a symmetric file, too few or too many entries, a line
+// that fills the buffer.
 Header read_matrix_market(ByteSource& source, const std::string& name, EntrySink& sink,
                           std::size_t buffer = kReadBuffer);
 

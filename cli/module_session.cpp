@@ -66,6 +66,8 @@ void ModuleSession::find_steps() {
   find(steps_.qxsmnumfact, "qxsmnumfact");
   find(steps_.qxsminvmultv, "qxsminvmultv");
   find(steps_.qxsmtraceinvAB, "qxsmtraceinvAB");
+  find(steps_.qxsmcopyv, "qxsmcopyv");
+  find(steps_.qxsmsetprogress, "qxsmsetprogress");
 }
 
 void ModuleSession::expect_ok(SmStatus status, const std::string& doing) const {

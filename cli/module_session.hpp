@@ -17,6 +17,9 @@ struct ExportedSteps {
   SmStatus (*qxsmnumfact)(SmMatrix* matrix) = nullptr;
   SmStatus (*qxsminvmultv)(SmMatrix* matrix, const double* b, double* x, int64_t count) = nullptr;
   SmStatus (*qxsmtraceinvAB)(SmMatrix* a, SmMatrix* b, int64_t start, double* result) = nullptr;
+  SmStatus (*qxsmcopyv)(const double* values, SmMatrix* matrix, int64_t rows, int64_t cols, int32_t kind,
+                        int32_t format) = nullptr;
+  SmStatus (*qxsmsetprogress)(SmInstance* instance, SmProgress callback, void* context) = nullptr;
 };
 
 class ModuleSession {

@@ -4,7 +4,10 @@
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
+#include <limits>
+#include <memory>
 #include <string_view>
+#include <vector>
 
 #include "cli/error.hpp"
 #include "cli/fields.hpp"
@@ -16,154 +19,262 @@ namespace {
 
 constexpr const char* kMatrixHelp = "Matrix Market file, plain or gzip;\n- is standard input";
 
-std::string check_memory(const std::string& text) {
-  if (parse_memory(text)) return {};
-  return fmt::format("found {}, expected a number of bytes above 0 with an optional suffix K, M, G or T (4G)",
-                     quote(text));
+// "info, factor or solve"
+std::string alternatives(const std::vector<std::string>& names) {
+  std::string text;
+  for (std::size_t i = 0; i < names.size(); ++i) {
+    text += (i == 0 ? "" : i + 1 == names.size() ? " or " : ", ") + names[i];
+  }
+  return text;
 }
 
-std::string check_method(const std::string& text) {
-  if (text == "direct") return {};
-  return fmt::format("found {}, expected direct", quote(text));
+CLI::Validator one_of(const std::vector<std::string>& names) {
+  const auto check = [names](const std::string& text) -> std::string {
+    if (std::find(names.begin(), names.end(), text) != names.end()) return {};
+    return fmt::format("found {}, expected {}", quote(text), alternatives(names));
+  };
+  return {check, ""};
 }
 
-std::string check_count(const std::string& text) {
-  std::int64_t value = 0;
-  if (parse_index(text, value) && value > 0) return {};
-  return fmt::format("found {}, expected a whole number above 0", quote(text));
+CLI::Validator memory_size() {
+  const auto check = [](const std::string& text) -> std::string {
+    if (parse_memory(text)) return {};
+    return fmt::format("found {}, expected a number of bytes above 0 with an optional suffix K, M, G or T (4G)",
+                       quote(text));
+  };
+  return {check, ""};
 }
 
-std::string check_finite(const std::string& text) {
-  double value = 0.0;
-  if (parse_real(text, value)) return {};
-  return fmt::format("found {}, expected a finite number", quote(text));
+CLI::Validator count() {
+  const auto check = [](const std::string& text) -> std::string {
+    std::int64_t value = 0;
+    if (parse_index(text, value) && value > 0) return {};
+    return fmt::format("found {}, expected a whole number above 0", quote(text));
+  };
+  return {check, ""};
 }
 
-void add_common(CLI::App& command, CommonOptions& common) {
-  command.add_flag("--json", common.json,
-                   "Print one JSON object on standard output,\n"
-                   "with the same facts; for errors too");
-  command.add_flag("--quiet", common.quiet,
-                   "Print nothing but errors, no progress either;\n"
-                   "with --json, the object only");
+CLI::Validator finite_number(const char* expected, double smallest) {
+  const auto check = [expected, smallest](const std::string& text) -> std::string {
+    double value = 0.0;
+    if (parse_real(text, value) && value >= smallest) return {};
+    return fmt::format("found {}, expected {}", quote(text), expected);
+  };
+  return {check, ""};
 }
 
-void add_memory(CLI::App& command, CommonOptions& common) {
-  command
-      .add_option("--memory", common.memory,
-                  "Ceiling for the memory pools of the computation,\n"
-                  "and for what is kept of a file: 512M, 4G (K, M,\n"
-                  "G, T are powers of 1024). Past it the run ends\n"
-                  "with exit code 3. Default: what this machine has")
-      ->check(CLI::Validator(check_memory, ""))
-      ->type_name("SIZE");
-}
+CLI::Validator tolerance() { return finite_number("a finite number, 0 or above", 0.0); }
 
 // In the list of subcommands, the first line of a description stands for it.
 class HelpFormatter : public CLI::Formatter {
  public:
   std::string make_subcommand(const CLI::App* command) const override {
     const std::string description = command->get_description();
-    return fmt::format("  {:<10}{}\n", command->get_name(), description.substr(0, description.find('\n')));
+    return fmt::format("  {:<11}{}\n", command->get_name(), description.substr(0, description.find('\n')));
   }
 };
 
-CLI::App* add_command(CLI::App& app, const char* name, const char* description) {
+// A subcommand, which calls run(its options, ...), without options as yet.
+template <auto run, auto its_options>
+CLI::App* add_command(CLI::App& app, Options& options, const char* name, const char* description) {
   CLI::App* command = app.add_subcommand(name, description);
   command->footer(help::kExitCodes);
   command->set_help_flag("-h,--help", "Print this help and exit");
+  command->callback([&options] {
+    options.run = [](const Options& given, Progress& progress) {
+      return run(given.*its_options, given.common, progress);
+    };
+  });
   return command;
 }
 
+void add_file(CLI::App& command, std::string& path, const char* name = "A.mtx", const char* text = kMatrixHelp) {
+  command.add_option(name, path, text)->required()->type_name("");
+}
+
+void add_output(CLI::App& command, Options& options, const char* name, const std::string& what) {
+  command
+      .add_option("-o,--output", options.common.output,
+                  what +
+                      "\nwith 17 digits; gzip when the name ends in .gz.\n"
+                      "- is standard output; the report then goes to\n"
+                      "standard error")
+      ->type_name(name);
+}
+
+void add_reports(CLI::App& command, Options& options) {
+  command.add_flag("--json", options.common.json,
+                   "Print one JSON object on standard output,\n"
+                   "with the same facts; for errors too");
+  command.add_flag("--quiet", options.common.quiet,
+                   "Print nothing but errors, no progress either;\n"
+                   "with --json, the object only");
+}
+
+// What every subcommand with a matrix ends with.
+void add_common(CLI::App& command, Options& options) {
+  add_reports(command, options);
+  command
+      .add_option("--memory", options.common.memory,
+                  "Ceiling for the memory pools of the computation,\n"
+                  "and for what is kept of a file: 512M, 4G (K, M,\n"
+                  "G, T are powers of 1024). Past it the run ends\n"
+                  "with exit code 3. Default: what this machine has")
+      ->check(memory_size())
+      ->type_name("SIZE");
+}
+
 void add_info(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, "info", help::kInfo);
-  command->add_option("A.mtx", options.info.matrix, kMatrixHelp)->required()->type_name("");
+  CLI::App* command = add_command<run_info, &Options::info>(app, options, "info", help::kInfo);
+  add_file(*command, options.info.matrix);
   command->add_flag("--fill", options.info.fill,
                     "Also order the matrix and count the entries of\n"
                     "its factor, the operations and the memory that\n"
                     "factoring takes (symmetric matrices only)");
-  add_common(*command, options.common);
-  add_memory(*command, options.common);
-  command->callback([&] { options.command = Command::info; });
+  add_common(*command, options);
 }
 
 void add_factor(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, "factor", help::kFactor);
-  command->add_option("A.mtx", options.factor.matrix, kMatrixHelp)->required()->type_name("");
-  add_common(*command, options.common);
-  add_memory(*command, options.common);
-  command->callback([&] { options.command = Command::factor; });
+  CLI::App* command = add_command<run_factor, &Options::factor>(app, options, "factor", help::kFactor);
+  add_file(*command, options.factor.matrix);
+  add_common(*command, options);
 }
 
 void add_solve(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, "solve", help::kSolve);
-  command->add_option("A.mtx", options.solve.matrix, kMatrixHelp)->required()->type_name("");
+  CLI::App* command = add_command<run_solve, &Options::solve>(app, options, "solve", help::kSolve);
+  add_file(*command, options.solve.matrix);
   command
       ->add_option("-b,--rhs", options.solve.right_hand_sides,
                    "Right-hand sides, one in each column, as array\n"
                    "or coordinate. Default: b = A * 1, whose\n"
                    "solution is x = 1 for a regular A")
       ->type_name("B.mtx");
-  command
-      ->add_option("-o,--output", options.solve.output,
-                   "Write x as a Matrix Market array with 17\n"
-                   "digits. - is standard output; the report then\n"
-                   "goes to standard error")
-      ->type_name("X.mtx");
+  add_output(*command, options, "X.mtx", "Write x as a Matrix Market array");
   command
       ->add_option("--method", options.solve.method,
-                   "direct: by factorization (the default, and the\n"
-                   "only one)")
-      ->check(CLI::Validator(check_method, ""))
+                   "direct: by factorization (the default)\n"
+                   "cg: by conjugate gradients with a diagonal\n"
+                   "preconditioner, without factoring")
+      ->check(one_of({"direct", "cg"}))
       ->type_name("NAME");
-  add_common(*command, options.common);
-  add_memory(*command, options.common);
-  command->callback([&] { options.command = Command::solve; });
+  command
+      ->add_option("--tolerance", options.solve.tolerance,
+                   "cg: a right-hand side is solved when its\n"
+                   "preconditioned residual is at most T times what\n"
+                   "it was at the start. Default: 1e-10")
+      ->check(tolerance())
+      ->type_name("T");
+  command
+      ->add_option("--max-iterations", options.solve.max_iterations,
+                   "cg: steps for each right-hand side; when they\n"
+                   "are not enough, the exit code is 1. Default: the\n"
+                   "order of A, plus 2")
+      ->check(count())
+      ->type_name("K");
+  add_common(*command, options);
 }
 
 void add_invdiag(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, "invdiag", help::kInvdiag);
-  command->add_option("A.mtx", options.invdiag.matrix, kMatrixHelp)->required()->type_name("");
-  command
-      ->add_option("-o,--output", options.invdiag.output,
-                   "Write the diagonal as a Matrix Market array of\n"
-                   "one column with 17 digits. - is standard\n"
-                   "output; the report then goes to standard error")
-      ->type_name("D.mtx");
-  add_common(*command, options.common);
-  add_memory(*command, options.common);
-  command->callback([&] { options.command = Command::invdiag; });
+  CLI::App* command = add_command<run_invdiag, &Options::invdiag>(app, options, "invdiag", help::kInvdiag);
+  add_file(*command, options.invdiag.matrix);
+  add_output(*command, options, "D.mtx", "Write the diagonal as a Matrix Market array of\none column");
+  add_common(*command, options);
+}
+
+void add_quad(CLI::App& app, Options& options) {
+  CLI::App* command = add_command<run_quad, &Options::quad>(app, options, "quad", help::kQuad);
+  add_file(*command, options.quad.matrix);
+  add_file(*command, options.quad.rows, "X.mtx", "The rows of the form; as many columns as A");
+  command->add_flag("--inverse", options.quad.inverse, "X A^- X' instead of X A X'; A is factored");
+  add_output(*command, options, "F.mtx",
+             "Write the form as a symmetric Matrix Market\n"
+             "file: an array with --inverse or for a general\n"
+             "array X, else coordinates;");
+  add_common(*command, options);
 }
 
 void add_trace(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, "trace", help::kTrace);
-  command->add_option("A.mtx", options.trace.matrix, kMatrixHelp)->required()->type_name("");
+  CLI::App* command = add_command<run_trace, &Options::trace>(app, options, "trace", help::kTrace);
+  add_file(*command, options.trace.matrix);
   command->add_option("B.mtx", options.trace.other, "The second matrix of a product, if any")->type_name("");
   command->add_flag("--inverse", options.trace.inverse,
                     "tr(A^-) or tr(A^- B), with A symmetric; A is\n"
                     "factored");
-  add_common(*command, options.common);
-  add_memory(*command, options.common);
-  command->callback([&] { options.command = Command::trace; });
+  add_common(*command, options);
+}
+
+void add_hermite(CLI::App& app, Options& options) {
+  CLI::App* command = add_command<run_hermite, &Options::hermite>(app, options, "hermite", help::kHermite);
+  add_file(*command, options.hermite.matrix);
+  add_output(*command, options, "H.mtx", "Write H as Matrix Market coordinates");
+  add_common(*command, options);
+}
+
+void add_estimable(CLI::App& app, Options& options) {
+  CLI::App* command = add_command<run_estimable, &Options::estimable>(app, options, "estimable", help::kEstimable);
+  add_file(*command, options.estimable.matrix);
+  add_file(*command, options.estimable.rows, "L.mtx", "The rows to be tested; as many columns as A");
+  command
+      ->add_option("--tolerance", options.estimable.tolerance,
+                   "What an element of l H or A A^- l may differ\n"
+                   "from that of l, as a part of the largest element\n"
+                   "of l. Default: 1e-6")
+      ->check(tolerance())
+      ->type_name("T");
+  add_common(*command, options);
+}
+
+void add_convert(CLI::App& app, Options& options) {
+  CLI::App* command = add_command<run_convert, &Options::convert>(app, options, "convert", help::kConvert);
+  add_file(*command, options.convert.matrix, "IN.mtx");
+  add_file(*command, options.common.output, "OUT.mtx",
+           "Where to write it, with 17 digits; gzip when the\n"
+           "name ends in .gz. - is standard output, without\n"
+           "a report");
+  command
+      ->add_option("--to", options.convert.to,
+                   "sparse: coordinates\n"
+                   "dense: an array of the whole matrix\n"
+                   "packed: an array of the lower triangle, by\n"
+                   "columns; the matrix must be symmetric")
+      ->required()
+      ->check(one_of({"sparse", "dense", "packed"}))
+      ->type_name("FORM");
+  add_common(*command, options);
 }
 
 void add_grid(CLI::App& app, Options& options) {
-  CLI::App* command = add_command(app, "grid", help::kGrid);
+  CLI::App* command = add_command<run_grid, &Options::grid>(app, options, "grid", help::kGrid);
   command->add_option("NX", options.grid.nx, "Points in the first direction")
       ->required()
-      ->check(CLI::Validator(check_count, ""))
+      ->check(count())
       ->type_name("");
   command->add_option("NY", options.grid.ny, "Points in the second direction")
       ->required()
-      ->check(CLI::Validator(check_count, ""))
+      ->check(count())
       ->type_name("");
   command->add_option("--shift", options.grid.shift, "Added to every diagonal entry. Default: 0")
-      ->check(CLI::Validator(check_finite, ""))
+      ->check(finite_number("a finite number", std::numeric_limits<double>::lowest()))
       ->type_name("S");
-  command->add_option("-o,--output", options.grid.output, "Where to write it. Default: standard output")
+  command
+      ->add_option("-o,--output", options.common.output,
+                   "Where to write it; gzip when the name ends in\n"
+                   ".gz. Default: standard output, without a report")
       ->type_name("OUT.mtx");
-  add_common(*command, options.common);
-  command->callback([&] { options.command = Command::grid; });
+  add_reports(*command, options);
+}
+
+void add_subcommands(CLI::App& app, Options& options) {
+  add_info(app, options);
+  add_factor(app, options);
+  add_solve(app, options);
+  add_invdiag(app, options);
+  add_quad(app, options);
+  add_trace(app, options);
+  add_hermite(app, options);
+  add_estimable(app, options);
+  add_convert(app, options);
+  add_grid(app, options);
 }
 
 // Where to look for help on what was typed.
@@ -176,9 +287,10 @@ std::string help_command(const CLI::App& app) {
 [[noreturn]] void refuse(const CLI::App& app, const CLI::ParseError& error, int argc, const char* const* argv) {
   const auto word = std::find_if(argv + 1, argv + argc, [](const char* argument) { return argument[0] != '-'; });
   if (app.get_subcommands().empty() && word != argv + argc) {
-    throw CommandError({.what = "found the subcommand " + quote(*word),
-                        .expected = "info, factor, solve, invdiag, trace or grid",
-                        .advice = "see qxsm --help"});
+    std::vector<std::string> names;
+    for (const CLI::App* command : app.get_subcommands({})) names.push_back(command->get_name());
+    throw CommandError(
+        {.what = "found the subcommand " + quote(*word), .expected = alternatives(names), .advice = "see qxsm --help"});
   }
   throw CommandError({.what = error.what(), .advice = "see " + help_command(app)});
 }
@@ -186,6 +298,20 @@ std::string help_command(const CLI::App& app) {
 std::string help_text(const CLI::App& app) {
   const auto chosen = app.get_subcommands();
   return chosen.empty() ? app.help() : chosen.front()->help("qxsm");
+}
+
+// What the options say together.
+void settle(const CLI::App& app, Options& options) {
+  const SolveOptions& solve = options.solve;
+  if (solve.method == "direct" && (solve.tolerance || solve.max_iterations)) {
+    throw CommandError({.what = std::string(solve.tolerance ? "--tolerance" : "--max-iterations") + " is given",
+                        .expected = "--method cg with it",
+                        .advice = "see " + help_command(app)});
+  }
+  options.filter = app.got_subcommand("convert") || app.got_subcommand("grid");
+  if (app.got_subcommand("grid") && options.common.output.empty()) options.common.output = "-";
+  options.common.ceiling =
+      options.common.memory.empty() ? machine_memory() : parse_memory(options.common.memory).value_or(0);
 }
 
 }  // namespace
@@ -198,12 +324,7 @@ Options parse_options(int argc, const char* const* argv) {
   app.set_version_flag("--version", "qxsm " QXSM_VERSION, "Print the version and exit");
   app.require_subcommand(1);
   app.formatter(std::make_shared<HelpFormatter>());
-  add_info(app, options);
-  add_factor(app, options);
-  add_solve(app, options);
-  add_invdiag(app, options);
-  add_trace(app, options);
-  add_grid(app, options);
+  add_subcommands(app, options);
   try {
     app.parse(argc, argv);
   } catch (const CLI::CallForHelp&) {
@@ -213,8 +334,7 @@ Options parse_options(int argc, const char* const* argv) {
   } catch (const CLI::ParseError& error) {
     refuse(app, error, argc, argv);
   }
-  options.common.ceiling =
-      options.common.memory.empty() ? machine_memory() : parse_memory(options.common.memory).value_or(0);
+  if (options.answer.empty()) settle(app, options);
   return options;
 }
 

@@ -1,30 +1,30 @@
 // The command line: which subcommand with which options, and the help that goes with them.
 #pragma once
 
-#include <memory>
 #include <string>
-#include <vector>
 
 #include "cli/commands.hpp"
 
-namespace CLI {
-class App;
-}
-
 namespace sm::cli {
 
-enum class Command { none, info, factor, solve, invdiag, trace, grid };
-
 struct Options {
-  Command command = Command::none;
+  Report (*run)(const Options& options, Progress& progress) = nullptr;  // the subcommand
+  bool filter = false;  // nothing is said beside an output that goes to standard output
   CommonOptions common;
   InfoOptions info;
   FactorOptions factor;
   SolveOptions solve;
   InvdiagOptions invdiag;
+  QuadOptions quad;
   TraceOptions trace;
+  HermiteOptions hermite;
+  EstimableOptions estimable;
+  ConvertOptions convert;
   GridOptions grid;
   std::string answer;  // help or version that was asked for: to be printed instead of a run
+
+  // Whether the result itself goes to standard output, so that the report has to go elsewhere.
+  bool output_is_taken() const { return common.output == "-"; }
 };
 
 // Throws CommandError for anything that the command does not take.

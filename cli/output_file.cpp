@@ -3,10 +3,14 @@
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
+#include <zlib.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <iterator>
+#include <new>
+#include <utility>
 
 #include "cli/error.hpp"
 #include "cli/report.hpp"
@@ -25,7 +29,40 @@ constexpr int kMode = 0666;
 
 }  // namespace
 
+// Text on its way to a gzip file.
+class OutputFile::Gzip {
+ public:
+  Gzip() {
+    constexpr int kGzipWindow = 15 + 16;  // the largest window, with a gzip header
+    constexpr int kMemory = 8;
+    if (deflateInit2(&stream_, Z_DEFAULT_COMPRESSION, Z_DEFLATED, kGzipWindow, kMemory, Z_DEFAULT_STRATEGY) != Z_OK) {
+      throw std::bad_alloc();
+    }
+  }
+  ~Gzip() { deflateEnd(&stream_); }
+  Gzip(const Gzip&) = delete;
+  Gzip& operator=(const Gzip&) = delete;
+
+  // Hands out(bytes) what the text becomes; with `last` all that is still held back too.
+  template <class Out>
+  void take(const fmt::memory_buffer& text, bool last, Out out) {
+    std::array<char, 65'536> packed;
+    stream_.next_in = reinterpret_cast<Bytef*>(const_cast<char*>(text.data()));
+    stream_.avail_in = static_cast<uInt>(text.size());
+    do {
+      stream_.next_out = reinterpret_cast<Bytef*>(packed.data());
+      stream_.avail_out = static_cast<uInt>(packed.size());
+      deflate(&stream_, last ? Z_FINISH : Z_NO_FLUSH);
+      out(std::string_view(packed.data(), packed.size() - stream_.avail_out));
+    } while (stream_.avail_out == 0);
+  }
+
+ private:
+  z_stream stream_{};
+};
+
 OutputFile::OutputFile(std::string path, const std::vector<std::string>& inputs) : path_(std::move(path)) {
+  if (path_.ends_with(".gz")) gzip_ = std::make_unique<Gzip>();
   if (is_standard_output()) {
     file_ = STDOUT_FILENO;
     return;
@@ -55,17 +92,25 @@ void OutputFile::refuse_inputs(const std::vector<std::string>& inputs) const {
   }
 }
 
-void OutputFile::flush() {
-  write_all(file_, {buffer_.data(), buffer_.size()}, is_standard_output() ? "standard output" : path_);
+void OutputFile::write(std::string_view bytes) {
+  write_all(file_, bytes, is_standard_output() ? "standard output" : path_);
+}
+
+void OutputFile::flush(bool last) {
+  if (gzip_) {
+    gzip_->take(buffer_, last, [this](std::string_view bytes) { write(bytes); });
+  } else {
+    write({buffer_.data(), buffer_.size()});
+  }
   buffer_.clear();
 }
 
 void OutputFile::flush_if_full() {
-  if (buffer_.size() >= kFull) flush();
+  if (buffer_.size() >= kFull) flush(false);
 }
 
 void OutputFile::finish() {
-  flush();
+  flush(true);
   if (!is_standard_output()) {
     // What an earlier, longer file left behind. Not every file can be cut (a pipe, a device); those have no rest.
     const off_t end = ::lseek(file_, 0, SEEK_CUR);

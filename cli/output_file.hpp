@@ -1,11 +1,13 @@
-// A file that results are written to. It is opened before the work begins, so that a bad path does not cost a long run,
-// and changed only when there is something to write.
+// A file that results are written to, as gzip when its name ends in .gz. It is opened before the work begins, so that a
+// bad path does not cost a long run, and changed only when there is something to write.
 #pragma once
 
 #include <fmt/format.h>
 
 #include <cstdint>
+#include <memory>
 #include <string>
+#include <string_view>
 #include <vector>
 
 namespace sm::cli {
@@ -28,9 +30,12 @@ class OutputFile {
 
  private:
   void refuse_inputs(const std::vector<std::string>& inputs) const;
-  void flush();
+  void write(std::string_view bytes);
+  void flush(bool last);
 
+  class Gzip;
   std::string path_;
+  std::unique_ptr<Gzip> gzip_;  // null: the text goes out as it is
   int file_ = -1;
   bool created_ = false;
   bool finished_ = false;

@@ -47,6 +47,7 @@ void Progress::phase(std::string name) {
   phase_ = std::move(name);
   phase_start_ = std::chrono::steady_clock::now();
   update(-1.0);
+  iteration(0, 0.0);
 }
 
 std::string Progress::line(const std::string& phase, double fraction, double seconds) {
@@ -54,6 +55,10 @@ std::string Progress::line(const std::string& phase, double fraction, double sec
   const double share = std::min(fraction, 1.0);
   const int full = static_cast<int>(share * kBarWidth);
   return fmt::format("{} [{:#>{}}{:.>{}}] {:3.0f} %", phase, "", full, "", kBarWidth - full, 100.0 * share);
+}
+
+std::string Progress::iteration_text(std::int64_t step, double residual) {
+  return step > 0 ? fmt::format(", step {}, residual {:.2e}", step, residual) : "";
 }
 
 void Progress::run() {
@@ -68,7 +73,8 @@ void Progress::run() {
 void Progress::draw() {
   if (phase_.empty()) return;
   const std::chrono::duration<double> seconds = std::chrono::steady_clock::now() - phase_start_;
-  put(file_, std::string(kEraseLine) + line(phase_, fraction_.load(std::memory_order_relaxed), seconds.count()));
+  put(file_, std::string(kEraseLine) + line(phase_, fraction_.load(std::memory_order_relaxed), seconds.count()) +
+                 iteration_text(step_.load(std::memory_order_relaxed), residual_.load(std::memory_order_relaxed)));
   drawn_ = true;
 }
 

@@ -5,6 +5,7 @@
 #include <atomic>
 #include <chrono>
 #include <condition_variable>
+#include <cstdint>
 #include <mutex>
 #include <string>
 #include <thread>
@@ -27,9 +28,16 @@ class Progress {
   void phase(std::string name);
   // How much of the phase is done, from 0 to 1. Cheap.
   void update(double fraction) { fraction_.store(fraction, std::memory_order_relaxed); }
+  // How far an iteration of unknown length has come. Cheap; a line may show a step with the residual of the next.
+  void iteration(std::int64_t step, double residual) {
+    residual_.store(residual, std::memory_order_relaxed);
+    step_.store(step, std::memory_order_relaxed);
+  }
 
   // The line itself: a bar, or the time so far where the share is unknown (negative).
   static std::string line(const std::string& phase, double fraction, double seconds);
+  // What is added to it once an iteration runs.
+  static std::string iteration_text(std::int64_t step, double residual);
 
  private:
   void run();
@@ -39,7 +47,9 @@ class Progress {
   Milliseconds quiet_;
   Milliseconds interval_;
   std::atomic<double> fraction_{-1.0};
-  std::mutex mutex_;  // guards the rest
+  std::atomic<double> residual_{0.0};
+  std::atomic<std::int64_t> step_{0};  // 0: no iteration runs
+  std::mutex mutex_;                   // guards the rest
   std::condition_variable wake_;
   std::string phase_;
   std::chrono::steady_clock::time_point phase_start_;

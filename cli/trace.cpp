@@ -9,25 +9,22 @@
 #include "cli/facts.hpp"
 #include "cli/format.hpp"
 #include "cli/module_matrix.hpp"
+#include "cli/run.hpp"
 
 namespace sm::cli {
 namespace {
 
-struct Operands {
-  LoadedMatrix a;
-  std::optional<LoadedMatrix> b;
-};
+using Other = std::optional<LoadedMatrix>;
 
 // A product has a trace when it is square.
-void require_square_product(const Operands& operands) {
-  const Header& a = operands.a.header;
-  const bool alone = !operands.b;
-  const Header& b = alone ? a : operands.b->header;
-  if (alone ? a.rows == a.cols : a.cols == b.rows && a.rows == b.cols) return;
-  throw CommandError({.file = alone ? operands.a.name : operands.b->name,
+void require_square_product(const LoadedMatrix& matrix, const Other& other) {
+  const Header& a = matrix.header;
+  const Header& b = other ? other->header : a;
+  if (other ? a.cols == b.rows && a.rows == b.cols : a.rows == a.cols) return;
+  throw CommandError({.file = other ? other->name : matrix.name,
                       .line = b.size_line,
                       .what = fmt::format("found {} rows and {} columns", b.rows, b.cols),
-                      .expected = alone ? "a square matrix" : fmt::format("{} rows and {} columns", a.cols, a.rows),
+                      .expected = other ? fmt::format("{} rows and {} columns", a.cols, a.rows) : "a square matrix",
                       .advice = "only square matrices and products have a trace"});
 }
 
@@ -40,88 +37,62 @@ double checked(const ModuleSession& session, SmStatus status, double trace) {
   return trace;
 }
 
-double plain_trace(ModuleSession& session, const Operands& operands, Progress& progress) {
-  const LoadedMatrix& a = operands.a;
-  if (a.rows.size() == 0 || (operands.b && operands.b->rows.size() == 0)) return 0.0;
-  SmMatrix* first = module_matrix(session, a.rows, a.upper_only(), progress);
-  double trace = 0.0;
-  if (!operands.b) {
-    const SmStatus status = session.fn().qxsmtrace(first, &trace);
-    return checked(session, status, trace);
-  }
-  const LoadedMatrix& b = *operands.b;
-  SmMatrix* second = module_matrix(session, b.rows, b.upper_only(), progress);
-  progress.phase("multiplying");
+double plain_trace(Run& run, const Other& other) {
+  const LoadedMatrix& a = run.matrix();
+  if (a.rows.size() == 0 || (other && other->rows.size() == 0)) return 0.0;
+  ModuleSession& session = run.session();
+  SmMatrix* first = sparse_matrix(session, a, run.clock());
+  SmMatrix* second = other ? sparse_matrix(session, *other, run.clock()) : nullptr;
   // A general matrix is not served with a symmetric one behind it, but tr(A B) = tr(B A).
-  if (!a.upper_only() && b.upper_only()) std::swap(first, second);
-  const SmStatus status = session.fn().qxsmtraceAB(first, second, &trace);
+  if (other && !a.upper_only && other->upper_only) std::swap(first, second);
+  double trace = 0.0;
+  const SmStatus status = run.clock().timed("tracing", [&] {
+    return second ? session.fn().qxsmtraceAB(first, second, &trace) : session.fn().qxsmtrace(first, &trace);
+  });
   return checked(session, status, trace);
 }
 
-double inverse_trace(ModuleSession& session, Factorization& factorization, const Operands& operands,
-                     Progress& progress) {
-  if (!operands.b) {
+double inverse_trace(Run& run, Factorization& factorization, const Other& other) {
+  if (!other) {
     const std::vector<double> diagonal = factorization.inverse_diagonal();
     return std::accumulate(diagonal.begin(), diagonal.end(), 0.0);
   }
-  const LoadedMatrix& b = *operands.b;
-  if (b.rows.size() == 0) return 0.0;
+  if (other->rows.size() == 0) return 0.0;
+  SmMatrix* const b = sparse_matrix(run.session(), *other, run.clock());
   double trace = 0.0;
-  const SmStatus status = factorization.inverse_trace(module_matrix(session, b.rows, b.upper_only(), progress), trace);
-  return checked(session, status, trace);
+  const SmStatus status = run.clock().timed(
+      "tracing", [&] { return run.session().steps().qxsmtraceinvAB(factorization.matrix(), b, 0, &trace); });
+  return checked(run.session(), status, trace);
 }
 
-void report_trace(Report& report, double trace, const Operands& operands, bool inverse) {
-  const std::string of = std::string(inverse ? "A^-" : "A") + (operands.b ? " B" : "");
+void report_trace(Run& run, double trace, const std::string& of) {
   const bool finite = std::isfinite(trace);
-  report.add_json("of", of);
-  report.add("trace", finite ? Json(trace) : Json(), fmt::format("tr({})", of),
-             finite ? number_text(trace) : "not finite");
+  run.report().add_json("of", of);
+  run.report().add("trace", finite ? Json(trace) : Json(), fmt::format("tr({})", of),
+                   finite ? number_text(trace) : "not finite");
   if (finite) return;
-  report.fail(
-      {.code = ExitCode::no, .file = operands.a.name, .what = "the trace overflows", .advice = "scale the matrices"});
-}
-
-Operands load_operands(const TraceOptions& options, const CommonOptions& common, Progress& progress) {
-  if (options.matrix == "-" && options.other == "-") {
-    throw CommandError(
-        {.what = "both matrices are to come from standard input", .advice = "give one of them as a file"});
-  }
-  Operands operands{.a = load_matrix(options.matrix, common.ceiling, progress), .b = {}};
-  if (!options.other.empty()) operands.b = load_matrix(options.other, common.ceiling, progress);
-  return operands;
+  run.report().fail(
+      {.code = ExitCode::no, .file = run.matrix().name, .what = "the trace overflows", .advice = "scale the matrices"});
 }
 
 }  // namespace
 
 Report run_trace(const TraceOptions& options, const CommonOptions& common, Progress& progress) {
-  Operands operands = load_operands(options, common, progress);
-  Report report("trace");
-  report_matrix(report, operands.a);
-  const std::optional<LoadedMatrix>& b = operands.b;
-  if (options.inverse) require_symmetric(operands.a);
-  require_square_product(operands);
-  report.add(
-      "other_file", b ? Json(b->name) : Json(), "second matrix",
-      b ? fmt::format("{} ({}), {} x {}", b->name, kind_text(b->header), b->header.rows, b->header.cols) : "none");
-
-  ModuleSession session(pool_ceiling(common));
+  Run run("trace", {options.matrix, options.other}, common, progress);
+  Other b;
+  if (!options.other.empty()) b = run.load(options.other);
+  if (options.inverse) require_symmetric(run.matrix());
+  require_square_product(run.matrix(), b);
+  run.report().add("other_file", b ? Json(b->name) : Json(), "second matrix", b ? matrix_text(*b) : "none");
+  const std::string of = std::string(options.inverse ? "A^-" : "A") + (b ? " B" : "");
   if (!options.inverse) {
-    report_trace(report, plain_trace(session, operands, progress), operands, false);
-  } else {
-    Factorization factorization(session, operands.a.rows, progress);
-    factorization.analyse();
-    if (!factorization.factor()) {
-      report_not_definite(report, operands.a);
-      return report;
-    }
-    const double trace = inverse_trace(session, factorization, operands, progress);
-    report_outcome(report, factorization);
-    report_trace(report, trace, operands, true);
-    report_phases(report, operands.a.seconds, factorization);
+    report_trace(run, plain_trace(run, b), of);
+  } else if (Factorization* const factor = run.factored()) {
+    const double trace = inverse_trace(run, *factor, b);
+    report_outcome(run.report(), *factor);
+    report_trace(run, trace, of);
   }
-  report_memory(report, session);
-  return report;
+  return run.finish();
 }
 
 }  // namespace sm::cli

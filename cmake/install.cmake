@@ -1,5 +1,5 @@
-# What `cmake --install` leaves behind: headers, libraries, the command, and the two ways in which other builds find
-# them. Nothing in it names the prefix, so the tree can be moved.
+# What `cmake --install` leaves behind: headers, libraries, the command with its manual page, and the two ways in which
+# other builds find them. Nothing in it names the prefix, so the tree can be moved.
 include(CMakePackageConfigHelpers)
 
 install(TARGETS qxesm qxhost EXPORT qxesmTargets
@@ -10,6 +10,7 @@ install(TARGETS qxeavl LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})
 if(TARGET qxsm)
   set_target_properties(qxsm PROPERTIES INSTALL_RPATH "$ORIGIN/../${CMAKE_INSTALL_LIBDIR}")
   install(TARGETS qxsm RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
+  install(FILES ${PROJECT_SOURCE_DIR}/docs/qxsm.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
 endif()
 install(FILES ${PROJECT_SOURCE_DIR}/LICENSE DESTINATION ${CMAKE_INSTALL_DOCDIR})
 

@@ -18,9 +18,11 @@ add_library(qxesm_objects OBJECT
   cholesky/dense.cpp
   cholesky/factor.cpp
   cholesky/ginverse2.cpp
+  cholesky/given_order.cpp
   cholesky/inverse_diagonal.cpp
   cholesky/numeric.cpp
   cholesky/ordering.cpp
+  cholesky/refill.cpp
   cholesky/reorder.cpp
   cholesky/solve.cpp
   cholesky/symbolic.cpp

@@ -18,10 +18,13 @@ bool is_invertible_kind(const SmMatrix& a) { return a.kind == SM_KIND_SYMMETRIC 
 // A factor or inverse in place of the values leaves no separate array, and the solves ask for one.
 bool lacks_factor(const SmMatrix& a) { return a.state >= SM_STATE_FACTORED && !a.row_start; }
 
+// A factored sparse matrix without rows is told by the missing factor, not as an open one.
+bool is_open(const SmMatrix& a) { return !is_closed(a) && !lacks_factor(a); }
+
 Gate may_form_vectors(const SmMatrix& a, const double* x, const double* r) {
   SM_STOP_IF(a.nnz < 1, SM_OK);
   SM_STOP_IF(x == r, SM_BAD_ARGUMENT);
-  SM_STOP_IF(!is_closed(a), SM_NOT_CLOSED);
+  SM_STOP_IF(is_open(a), SM_NOT_CLOSED);
   SM_STOP_IF(lacks_factor(a), SM_NO_FACTOR);
   SM_STOP_IF(!is_invertible_kind(a), SM_UNAVAILABLE);
   return {};
@@ -30,7 +33,7 @@ Gate may_form_vectors(const SmMatrix& a, const double* x, const double* r) {
 Gate may_form_matrix(const SmMatrix& a, const SmMatrix& x, const SmMatrix& r) {
   SM_STOP_IF(a.nnz < 1 || x.nnz < 1, SM_OK);
   SM_STOP_IF(a.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(a) || !is_closed(x), SM_NOT_CLOSED);
+  SM_STOP_IF(is_open(a) || !is_closed(x), SM_NOT_CLOSED);
   SM_STOP_IF(lacks_factor(a), SM_NO_FACTOR);
   SM_STOP_IF(&r == &a || &r == &x, SM_BAD_ARGUMENT);
   SM_STOP_IF(a.rows != a.cols, SM_NOT_SQUARE);
@@ -42,7 +45,7 @@ Gate may_form_matrix(const SmMatrix& a, const SmMatrix& x, const SmMatrix& r) {
 Gate may_form_bilinear(const SmMatrix& a, const double* x, const double* y, const double* r) {
   SM_STOP_IF(a.nnz < 1, SM_OK);
   SM_STOP_IF(a.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(a), SM_NOT_CLOSED);
+  SM_STOP_IF(is_open(a), SM_NOT_CLOSED);
   SM_STOP_IF(lacks_factor(a), SM_NO_FACTOR);
   SM_STOP_IF(x == r || y == r, SM_BAD_ARGUMENT);
   SM_STOP_IF(a.rows != a.cols, SM_NOT_SQUARE);

@@ -1,5 +1,6 @@
 #include "forms/kernels.hpp"
 
+#include <algorithm>
 #include <climits>
 #include <cmath>
 
@@ -16,7 +17,13 @@ namespace {
 
 constexpr std::int32_t kLongSum = 250;
 constexpr i64 kLongDot = 500;
+constexpr i64 kLongestDot = INT_MAX;  // what a BLAS counts
 constexpr int kUnit = 1;
+
+double blas_dot(const double* x, const double* y, i64 n) {
+  const int length = static_cast<int>(std::min(n, kLongestDot));
+  return ddot_(&length, x, &kUnit, y, &kUnit);
+}
 
 }  // namespace
 
@@ -29,9 +36,10 @@ void hzvaxpy(double* z, const double* x, const double* y, std::int32_t n, double
 }
 
 double hzvdot11(const double* x, const double* y, i64 n) {
-  if (n < kLongDot || n > INT_MAX) return lane_dot(x, y, n);  // a longer vector than the BLAS can count
-  const int length = static_cast<int>(n);
-  return ddot_(&length, x, &kUnit, y, &kUnit);
+  if (n < kLongDot) return lane_dot(x, y, n);
+  double sum = blas_dot(x, y, n);
+  for (i64 done = kLongestDot; done < n; done += kLongestDot) sum += blas_dot(x + done, y + done, n - done);
+  return sum;
 }
 
 double zvamx(const double* x, i64 n) {

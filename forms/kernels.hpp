@@ -10,7 +10,7 @@ namespace sm {
 // updates in place only, so a third array stays in the loop here, however long it is.
 void hzvaxpy(double* z, const double* x, const double* y, std::int32_t n, double a);
 
-// Sum of x[i] y[i]; from 500 elements on, ddot.
+// Sum of x[i] y[i]; from 500 elements on, ddot, in pieces when there are more than it can count.
 double hzvdot11(const double* x, const double* y, i64 n);
 
 // Largest |x[i]|; 0.0 when n < 1. Whatever is not smaller than the largest so far takes its place, a NaN included, and

@@ -79,12 +79,9 @@ void for_line(const TreeRows& a, i64 o, Range range, F&& f) {
   NonzeroNode* node = first_from(first_node(a.m, o), range.first);
   for (; node && node->key <= range.last; node = sm_node_next(node)) f(node->key, node->value);
 }
-// Reordered rows are not ascending, so every entry is looked at.
 template <class F>
 void for_line(const UpperRows& a, i64 o, Range range, F&& f) {
-  a.row(o, [&](i64 k, double v) {
-    if (range.has(k)) f(k, v);
-  });
+  a.row_between(o, range.first, range.last, f);
 }
 
 // Entries of a line times components of x. A triangle keeps its diagonal entry apart, because the others count twice.

@@ -82,8 +82,8 @@ SmStatus enter_rows(A& a, B& b, i64 rows, i64 cols, MemoryPool* pool, Sink& sink
   double* sum = work.data();
   for (i64 i = 0; i < rows && sink.status() == SM_OK; ++i) {
     bool any = false;
-    std::fill_n(sum, cols, 0.0);
     a.row(i, [&](i64 k, double v) {
+      if (!any) std::fill_n(sum, cols, 0.0);
       any = true;
       b.row(k, [&](i64 j, double w) { sum[j] += v * w; });
     });

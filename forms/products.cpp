@@ -16,9 +16,7 @@ namespace sm {
 namespace {
 
 Gate may_multiply(const SmMatrix& a, const Block& block) {
-  SM_STOP_IF(a.nnz < 1, SM_OK);
-  SM_STOP_IF(a.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(a), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(a));
   SM_STOP_IF(block.x == block.y, SM_BAD_ARGUMENT);
   return {};
 }
@@ -91,6 +89,7 @@ SmStatus multiply(SmMatrix& a, const Block& block, Range rows, Range cols) {
 SmStatus multiply_transposed(SmMatrix& a, const Block& block) {
   SM_PASS(may_multiply(a, block));
   clear(block, a.cols);
+  if (block.count < 1) return SM_OK;
   const auto add = [&](const auto& view) {
     add_each(view, {0, a.cols - 1}, {0, a.rows - 1}, block, true);
     return SM_OK;

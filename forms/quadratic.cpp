@@ -14,9 +14,8 @@ namespace sm {
 namespace {
 
 Gate may_form(const SmMatrix& a, const SmMatrix& x, const SmMatrix& r) {
-  SM_STOP_IF(a.nnz < 1, SM_OK);
-  SM_STOP_IF(a.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(a) || !is_closed_or_empty(x), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(a));
+  SM_STOP_IF(!is_closed_or_empty(x), SM_NOT_CLOSED);
   SM_STOP_IF(&r == &a || &r == &x, SM_BAD_ARGUMENT);
   SM_STOP_IF(x.cols != a.rows, SM_DIMENSION_MISMATCH);
   SM_STOP_IF(r.kind != SM_KIND_SYMMETRIC, SM_KIND_MISMATCH);

@@ -9,13 +9,6 @@ namespace sm {
 
 namespace {
 
-Gate may_scale(const SmMatrix& a) {
-  SM_STOP_IF(a.nnz < 1, SM_OK);
-  SM_STOP_IF(a.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(a), SM_NOT_CLOSED);
-  return {};
-}
-
 // Reciprocal pivots of s U'DU. A dropped pivot stays dropped. The sign of s is not looked at: what a factor of a matrix
 // that is no longer definite means is up to the caller.
 void scale_sparse_factor(SmMatrix& a, double s) {
@@ -38,7 +31,7 @@ void scale_separate_array(SmMatrix& a, double s) {
 }  // namespace
 
 SmStatus scale(SmMatrix& a, double s) {
-  SM_PASS(may_scale(a));
+  SM_PASS(may_read(a));
   SM_TRY(visit(a, [&](const auto& view) {
     view.entries([&](i64, i64, double& v) { v *= s; });
     return SM_OK;

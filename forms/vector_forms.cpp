@@ -67,9 +67,7 @@ void add_form(const View& view, Range range, const double* x, const double* y, c
 }
 
 Gate may_form(const SmMatrix& a) {
-  SM_STOP_IF(a.nnz < 1, SM_OK);
-  SM_STOP_IF(a.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(a), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(a));
   SM_STOP_IF(a.rows != a.cols, SM_NOT_SQUARE);
   return {};
 }

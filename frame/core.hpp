@@ -25,6 +25,10 @@ struct Gate {
   do {                                          \
     if (bad) return ::sm::Gate{(answer), true}; \
   } while (0)
+#define SM_STOP_WITH(gate)                                \
+  do {                                                    \
+    if (const ::sm::Gate g_ = (gate); g_.stop) return g_; \
+  } while (0)
 #define SM_PASS(gate)                                            \
   do {                                                           \
     if (const ::sm::Gate g_ = (gate); g_.stop) return g_.status; \

@@ -1,29 +1,18 @@
 // A <- A + s B.
 #include <algorithm>
 
+#include "ginv/entering.hpp"
 #include "ginv/operations.hpp"
 #include "store/checks.hpp"
-#include "store/operations.hpp"
 #include "store/views.hpp"
 
 namespace sm {
 
 namespace {
 
-// A scale of exactly 1 costs no rounding and lets a NaN keep its bits.
-double scaled(double s, double b) { return s == 1.0 ? b : s * b; }
-
 SmStatus accumulate_general(SmMatrix& a, SmMatrix& b, double s) {
   if (!is_general_sparse(a) || !is_general_sparse(b)) return SM_KIND_MISMATCH;
-  const TreeRows source(b);
-  SmStatus status = SM_OK;
-  // Adding a matrix to itself meets keys that are there already, so the walk is not disturbed.
-  for (i64 i = 0; i < source.rows && status == SM_OK; ++i) {
-    source.row(i, [&](i64 j, double v) {
-      if (status == SM_OK) status = assign(a, i, j, true, scaled(s, v));
-    });
-  }
-  return status;
+  return enter_scaled(a, TreeRows(b), 0, s);
 }
 
 // In storage order, never re-mapped: with the packing by columns that is the leading block of a larger A.

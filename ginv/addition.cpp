@@ -1,10 +1,9 @@
 // Adding s B into the trailing block of G that starts at (off, off).
-#include <algorithm>
 #include <cmath>
 
+#include "ginv/entering.hpp"
 #include "ginv/operations.hpp"
 #include "store/checks.hpp"
-#include "store/operations.hpp"
 #include "store/views.hpp"
 
 namespace sm {
@@ -27,11 +26,18 @@ void for_each_in_block(SmMatrix& g, i64 off, F&& f) {
   }
 }
 
+// A change like any other, and the only one when B has nothing to add.
 void drop_small(SmMatrix& g, i64 off, double tolerance) {
   if (!(tolerance > 0.0)) return;
+  bool changed = false;
   for_each_in_block(g, off, [&](i64, i64, double& v) {
-    if (std::fabs(v) <= tolerance) v = 0.0;
+    if (!(std::fabs(v) <= tolerance)) return;
+    changed = changed || v != 0.0;
+    v = 0.0;
   });
+  if (!changed) return;
+  drop_separate_factor(g);
+  void_results(g);
 }
 
 // The block as it was, into P at the block's own numbering.
@@ -46,18 +52,7 @@ SmStatus save_block(SmMatrix& g, SmMatrix& p, i64 off) {
 SmStatus add_general(SmMatrix& g, SmMatrix& b, i64 off, double s) {
   if (!is_general_sparse(g) || !is_general_sparse(b)) return SM_UNAVAILABLE;
   if (off < 0) return SM_BAD_ARGUMENT;
-  const TreeRows source(b);
-  SmStatus status = SM_OK;
-  for (i64 i = 0; i < source.rows && status == SM_OK; ++i) {
-    source.row(i, [&](i64 j, double v) {
-      i64 row = 0;
-      i64 col = 0;
-      if (status != SM_OK) return;
-      const bool countable = !__builtin_add_overflow(off, i, &row) && !__builtin_add_overflow(off, j, &col);
-      status = countable ? assign(g, row, col, true, s * v) : SM_TOO_LARGE;
-    });
-  }
-  return status;
+  return enter_scaled(g, TreeRows(b), off, s);
 }
 
 SmStatus add_diagonal(SmMatrix& g, SmMatrix& b, SmMatrix* p, i64 off, double s) {
@@ -71,16 +66,9 @@ SmStatus add_diagonal(SmMatrix& g, SmMatrix& b, SmMatrix* p, i64 off, double s) 
   return SM_OK;
 }
 
-// Every stored pair of B, added through the target's own road.
 SmStatus add_symmetric(SmMatrix& g, SmMatrix& b, i64 off, double s) {
   if (b.nnz < 1) return SM_OK;
-  return visit(b, [&](auto view) {
-    SmStatus status = SM_OK;
-    view.entries([&](i64 i, i64 j, double v) {
-      if (status == SM_OK) status = assign(g, off + std::min(i, j), off + std::max(i, j), true, s * v);
-    });
-    return status;
-  });
+  return visit(b, [&](const auto& view) { return enter_scaled(g, view, off, s); });
 }
 
 Gate may_add_symmetric(const SmMatrix& g, const SmMatrix& b, i64 off) {
@@ -88,7 +76,7 @@ Gate may_add_symmetric(const SmMatrix& g, const SmMatrix& b, i64 off) {
   SM_STOP_IF(b.rows != g.rows - off, SM_DIMENSION_MISMATCH);
   SM_STOP_IF(b.kind != SM_KIND_SYMMETRIC && b.kind != SM_KIND_DIAGONAL, SM_UNAVAILABLE);
   SM_STOP_IF(is_symmetric_sparse(g) && g.state > SM_STATE_OPEN, SM_ALREADY_CLOSED);
-  SM_STOP_IF(b.nnz > 0 && !is_closed(b), SM_NOT_CLOSED);
+  SM_STOP_IF(!is_closed_or_empty(b), SM_NOT_CLOSED);
   return {};
 }
 

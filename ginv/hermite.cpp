@@ -38,6 +38,12 @@ SmStatus packed_hermite(SmMatrix& a, SmMatrix& h) {
   return qxsmmultm(inverse.get(), &a, &h, 0);
 }
 
+// Whether an element found its place is not asked, but an H that lacks some for want of memory is not passed off as one.
+SmStatus wants_memory(SmStatus status) {
+  return status == SM_NO_MEMORY || status == SM_TOO_LARGE ? status : SmStatus{SM_OK};
+}
+SmStatus enter(SmMatrix& h, i64 i, i64 j, double value) { return wants_memory(assign(h, i, j, false, value)); }
+
 // Column j of a symmetric matrix, whichever way round its pairs are stored.
 void column(const UpperRows& rows, i64 j, double* x) {
   std::fill_n(x, rows.rows, 0.0);
@@ -58,7 +64,7 @@ SmStatus sparse_hermite(SmMatrix& a, SmMatrix& h) {
     column(rows, j, x.data());
     SM_TRY(substitute(a, x.data(), y.data(), 1));
     for (i64 i = 0; i < a.rows; ++i) {
-      if (std::fabs(y.data()[i]) > kHermiteDrop) SM_TRY(assign(h, i, j, false, y.data()[i]));
+      if (std::fabs(y.data()[i]) > kHermiteDrop) SM_TRY(enter(h, i, j, y.data()[i]));
     }
   }
   return SM_OK;
@@ -66,14 +72,12 @@ SmStatus sparse_hermite(SmMatrix& a, SmMatrix& h) {
 
 SmStatus diagonal_hermite(SmMatrix& a, SmMatrix& h) {
   if (invert(a, false, missing()) != SM_OK) return SM_NO_ELEMENT;
-  for (i64 i = 0; i < a.rows; ++i) SM_TRY(assign(h, i, i, false, a.dense_factor[i] * a.values[i]));
+  for (i64 i = 0; i < a.rows; ++i) SM_TRY(enter(h, i, i, a.dense_factor[i] * a.values[i]));
   return SM_OK;
 }
 
 Gate may_form(const SmMatrix& a, const SmMatrix& h) {
-  SM_STOP_IF(a.nnz < 1, SM_OK);
-  SM_STOP_IF(a.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(a), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(a));
   SM_STOP_IF(&a == &h, SM_BAD_ARGUMENT);
   SM_STOP_IF(a.rows != a.cols, SM_NOT_SQUARE);
   return {};
@@ -83,13 +87,16 @@ Gate may_form(const SmMatrix& a, const SmMatrix& h) {
 
 SmStatus hermite(SmMatrix& a, SmMatrix& h) {
   SM_PASS(may_form(a, h));
-  (void)resize(h, a.rows, a.rows);  // an H of the wrong kind is answered below
+  const SmStatus sized = resize(h, a.rows, a.rows);  // an H of the wrong kind is answered below
   if (a.kind == SM_KIND_SYMMETRIC) {
     if (h.kind != SM_KIND_GENERAL) return SM_KIND_MISMATCH;
-    return is_dense_format(a.format) ? packed_hermite(a, h) : sparse_hermite(a, h);
+    if (is_dense_format(a.format)) return packed_hermite(a, h);  // which sizes H again
+    SM_TRY(wants_memory(sized));
+    return sparse_hermite(a, h);
   }
   if (a.kind != SM_KIND_DIAGONAL) return SM_UNAVAILABLE;
   if (h.kind != SM_KIND_GENERAL && h.kind != SM_KIND_DIAGONAL) return SM_KIND_MISMATCH;
+  SM_TRY(wants_memory(sized));
   return diagonal_hermite(a, h);
 }
 

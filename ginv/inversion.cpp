@@ -75,17 +75,10 @@ SmStatus invert_diagonal_values(SmMatrix& a, bool in_place, double tolerance) {
   return SM_OK;
 }
 
-Gate may_invert(const SmMatrix& a) {
-  SM_STOP_IF(a.nnz < 1, SM_OK);
-  SM_STOP_IF(a.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(a), SM_NOT_CLOSED);
-  return {};
-}
-
 }  // namespace
 
 SmStatus invert(SmMatrix& a, bool in_place, double tolerance) {
-  SM_PASS(may_invert(a));
+  SM_PASS(may_read(a));
   if (a.state == SM_STATE_INVERTED) return keep_inverse(a, in_place);
   if (a.rows != a.cols) return SM_NOT_SQUARE;
   if (std::isnan(tolerance)) tolerance = singularity_tolerance(a);

@@ -34,6 +34,7 @@ SmStatus sweep_row(SmMatrix& a, i64 i, std::int16_t* active, double tolerance, d
   SM_TRY(row(a, i, u, 0));
   const double s = hzvdot11(u, u, a.cols);
   if (!(s > tolerance)) return SM_OK;
+  // Row i stays and is not empty, or there would be no component of it: the matrix always has rows to give.
   for (i64 k = 0; k < a.rows; ++k) {
     if (!active[k]) continue;
     SM_TRY(row(a, k, v, 0));
@@ -41,15 +42,12 @@ SmStatus sweep_row(SmMatrix& a, i64 i, std::int16_t* active, double tolerance, d
     if (!(std::fabs(c) > tolerance)) continue;
     hzvaxpy(v, v, u, static_cast<std::int32_t>(a.cols), -c);
     SM_TRY(rewrite_row(a, k, v, a.instance->tolerances[0]));
-    if (a.nnz < 1) return SM_OK;  // nothing is left to sweep, and an empty matrix gives no rows
   }
   return SM_OK;
 }
 
 Gate may_orthogonalise(const SmMatrix& a) {
-  SM_STOP_IF(a.nnz < 1, SM_OK);
-  SM_STOP_IF(a.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(a), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(a));
   SM_STOP_IF(a.rows != a.cols, SM_NOT_SQUARE);
   SM_STOP_IF(!is_general_sparse(a), SM_UNAVAILABLE);
   return {};
@@ -61,8 +59,8 @@ SmStatus orthogonalise(SmMatrix& a, std::int16_t* active, i64 lo, i64 hi, double
   SM_PASS(may_orthogonalise(a));
   Scratch<double> u;
   Scratch<double> v;
-  SM_TRY(u.take(a.pool, a.rows, Fill::zero));
-  SM_TRY(v.take(a.pool, a.rows, Fill::zero));
+  SM_TRY(u.take(a.pool, a.rows));
+  SM_TRY(v.take(a.pool, a.rows));
   for (i64 i = 0; i < a.rows; ++i) {
     if (active[i] && (i < lo || i >= hi)) SM_TRY(sweep_row(a, i, active, tolerance, u.data(), v.data()));
   }

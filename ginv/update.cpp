@@ -54,7 +54,7 @@ class PackedUpdate {
  public:
   PackedUpdate(SmMatrix& g, SmMatrix& a, SmMatrix& b, i64 r, i64 c, double s)
       : g_(g.values, g.rows),
-        b_(b.values, b.rows),
+        b_(b.values, b.values ? b.rows : 0),  // values that could not be had leave the order behind
         next_(a.values),
         end_(a.values + static_cast<i64>(a.value_count)),
         r_(r),

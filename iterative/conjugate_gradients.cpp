@@ -60,16 +60,6 @@ class Preconditioner {
   void apply(const double* r, double* z) {
     for (i64 i = 0; i < m_.rows; ++i) z[i] = table_.data()[i]->inverse * r[i];
   }
-  // z <- M r + beta z.
-  void apply(const double* r, double beta, double* z) {
-    for (i64 i = 0; i < m_.rows; ++i) z[i] = table_.data()[i]->inverse * r[i] + beta * z[i];
-  }
-  // r' M r.
-  double measure(const double* r) {
-    double sum = 0.0;
-    for (i64 i = 0; i < m_.rows; ++i) sum += r[i] * (table_.data()[i]->inverse * r[i]);
-    return sum;
-  }
 
  private:
   double diagonal(i64 i) const {
@@ -93,7 +83,7 @@ class Preconditioner {
 
 class ConjugateGradients {
  public:
-  ConjugateGradients(SmMatrix& m, IterativeTask& task) : m_(m), task_(task), preconditioner_(m) {}
+  ConjugateGradients(SmMatrix& m, const IterativeTask& task) : m_(m), task_(task), preconditioner_(m) {}
 
   [[nodiscard]] SmStatus prepare() {
     SM_TRY(need_pool(m_));
@@ -121,12 +111,13 @@ class ConjugateGradients {
   }
 
   SmMatrix& m_;
-  IterativeTask& task_;
+  const IterativeTask& task_;
   Preconditioner preconditioner_;
   Scratch<double> r_, p_, q_;
 };
 
-// The recomputed residual needs q for A x, so the direction's product is used up before.
+// q serves three times: for the direction's product, for A x when the residual is recomputed, and for the
+// preconditioned residual; each is used up before the next.
 SmStatus ConjugateGradients::step(const double* b, double* x, i64 k, double& rho) {
   double* r = r_.data();
   double* p = p_.data();
@@ -140,8 +131,11 @@ SmStatus ConjugateGradients::step(const double* b, double* x, i64 k, double& rho
   } else {
     hzvaxpy(r, r, q, n, -alpha);
   }
-  const double next = preconditioner_.measure(r);
-  preconditioner_.apply(r, next / rho, p);
+  double* z = q;
+  preconditioner_.apply(r, z);
+  const double next = hzvdot11(r, z, m_.rows);
+  const double beta = next / rho;
+  for (i64 i = 0; i < m_.rows; ++i) p[i] = z[i] + beta * p[i];
   rho = next;
   return SM_OK;
 }
@@ -173,17 +167,17 @@ void solve_diagonal(const SmMatrix& m, const IterativeTask& task) {
 }
 
 Gate may_iterate(const SmMatrix& m, const IterativeTask& task) {
-  SM_STOP_IF(m.nnz < 1, SM_OK);
-  SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(m), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(m));
   SM_STOP_IF(task.b == task.x, SM_BAD_ARGUMENT);
   return {};
 }
 
 }  // namespace
 
-SmStatus solve_iterative(SmMatrix& m, IterativeTask& task) {
-  SM_PASS(may_iterate(m, task));
+SmStatus solve_iterative(SmMatrix& m, IterativeTask task) {
+  SM_PASS(may_iterate(m, task));  // these refusals leave the two results alone
+  task.iterations = 0;
+  task.residual = 0.0;
   if (m.kind != SM_KIND_SYMMETRIC && m.kind != SM_KIND_DIAGONAL) return SM_UNAVAILABLE;
   if (task.count < 1) return SM_OK;
   if (m.kind == SM_KIND_DIAGONAL) {

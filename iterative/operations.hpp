@@ -5,18 +5,18 @@
 
 namespace sm {
 
-// What a solve is asked for, and what it reports.
+// What a solve is asked for, and where it reports.
 struct IterativeTask {
   const double* b;
   double* x;
   i64 count;
   i64 max_iterations;
   double tolerance;
-  i64 iterations = 0;
-  double residual = 0.0;
+  i64& iterations;
+  double& residual;
 };
 
-[[nodiscard]] SmStatus solve_iterative(SmMatrix& m, IterativeTask& task);
+[[nodiscard]] SmStatus solve_iterative(SmMatrix& m, IterativeTask task);
 void set_progress(SmInstance& instance, SmProgress callback, void* context);
 
 }  // namespace sm

@@ -11,6 +11,15 @@ inline bool is_closed(const SmMatrix& m) {
   return m.state >= SM_STATE_CLOSED && !(is_symmetric_sparse(m) && !m.row_start);
 }
 
+// What most operations ask first of the matrix they read, in this order: nothing stored is nothing to do, a record of
+// kind none answers 1, an open matrix 113.
+inline Gate may_read(const SmMatrix& m) {
+  SM_STOP_IF(m.nnz < 1, SM_OK);
+  SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
+  SM_STOP_IF(!is_closed(m), SM_NOT_CLOSED);
+  return {};
+}
+
 // What was computed from the entries is no longer known.
 inline void void_results(SmMatrix& m) {
   m.rank = 0;

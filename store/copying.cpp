@@ -6,6 +6,7 @@
 //   symmetric           mirrored  yes         124
 //   diagonal            yes       yes         yes
 #include <algorithm>
+#include <cstring>
 #include <type_traits>
 #include <utility>
 
@@ -116,6 +117,22 @@ SmStatus clone_rows(const SmMatrix& source, SmMatrix& target) {
   return SM_OK;
 }
 
+// Whether `p` points into a block of `count` words.
+bool is_inside(const double* p, const void* block, i64 count) {
+  const auto behind = reinterpret_cast<std::uintptr_t>(p) - reinterpret_cast<std::uintptr_t>(block);
+  return block && behind / sizeof(double) < static_cast<std::uintptr_t>(count);
+}
+
+// Whether `values` lies in an array that goes back when the matrix is built anew.
+bool is_own_array(const SmMatrix& m, const double* values) {
+  if (is_symmetric_sparse(m)) {
+    return is_inside(values, m.nz_values, m.nnz) || is_inside(values, m.work, m.work_capacity);
+  }
+  if (!has_value_array(m)) return false;
+  const i64 count = static_cast<i64>(m.value_count);
+  return (m.owns_values && is_inside(values, m.values, count)) || is_inside(values, m.dense_factor, count);
+}
+
 SmStatus rebuild(SmMatrix& m, i64 rows, i64 cols, std::int32_t kind, std::int32_t format) {
   SM_TRY(resize(m, 0, 0));
   reset(m);  // gives the pools back, which typing a record anew would forget
@@ -159,11 +176,11 @@ SmStatus load(const double* values, SmMatrix& m, i64 rows, i64 cols, std::int32_
   const bool has_shape = m.kind == kind && m.format == format && m.rows == rows && m.cols == cols;
   const bool has_no_values = rows > 0 && !m.values;  // a sizing failed
   if (!has_shape || has_no_values) {
-    if (values == m.values && m.owns_values) return SM_BAD_ARGUMENT;  // they would be given back before they are read
+    if (is_own_array(m, values)) return SM_BAD_ARGUMENT;  // it would be given back before it is read
     SM_TRY(rebuild(m, rows, cols, kind, format));
   }
   if (m.value_count < 1.0) return SM_OK;
-  std::copy_n(values, static_cast<i64>(m.value_count), m.values);
+  std::memmove(m.values, values, static_cast<std::size_t>(m.value_count) * sizeof(double));
   void_results(m);
   return SM_OK;
 }

@@ -19,13 +19,6 @@ namespace sm {
 
 namespace {
 
-Gate may_read(const SmMatrix& m) {
-  SM_STOP_IF(m.nnz < 1, SM_OK);
-  SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(m), SM_NOT_CLOSED);
-  return {};
-}
-
 // From state 3 on the stored rows are the factor's, and a row of the caller's is not to be had from them.
 bool is_reordered(const SmMatrix& m) { return is_symmetric_sparse(m) && m.state > SM_STATE_ORDERED; }
 
@@ -99,8 +92,7 @@ void fill_upper_block(const UpperRows& view, double* out, i64 r0, i64 r1, i64 c0
   const i64 width = extent(c0, c1);
   const i64 size = block_size(r0, r1, c0, c1);
   for (i64 i = r0; i <= r1; ++i) {
-    view.row(i, [&](i64 j, double v) {
-      if (j < c0 || j > c1) return;
+    view.row_between(i, c0, c1, [&](i64 j, double v) {
       out[(i - r0) * width + (j - c0)] = v;
       const i64 mirrored = (j - c0) * width + (i - r0);
       if (i >= c0 && j > i && mirrored < size) out[mirrored] = v;

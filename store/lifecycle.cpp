@@ -45,7 +45,7 @@ NonzeroTree* create_tree(SmInstance& instance) {
 
 SmStatus check_type(std::int32_t kind, std::int32_t format) {
   const bool sparse = format == SM_FORMAT_SPARSE;
-  const bool dense = (format & ~1) == SM_FORMAT_COLUMNS;
+  const bool dense = is_dense_format(format);
   switch (kind) {
     case SM_KIND_GENERAL:
     case SM_KIND_SYMMETRIC:

@@ -76,7 +76,8 @@ void drop_symmetric_storage(SmMatrix& m) {
   give_back(m.pool, m.perm);
   give_back(m.pool, m.inv_perm);
   give_back(m.pool, m.work);
-  m.factor_scratch = m.factor_iju = m.factor_iu = m.factor_ju = m.factor_reserved = nullptr;
+  give_back(m.pool, m.factor_reserved);
+  m.factor_scratch = m.factor_iju = m.factor_iu = m.factor_ju = nullptr;
   m.factor_diag = m.factor_values = nullptr;
   m.work_capacity = 0;
   m.sym_roots = nullptr;

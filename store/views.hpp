@@ -4,10 +4,10 @@
 //   view          serves                        one_triangle  a stored row holds
 //   TreeRows      general, 21                   no            its nodes, columns ascending
 //   FullArray     general, 22 and 23            no            every column
-//   UpperRows     symmetric, 21                 yes           columns ascending from the diagonal on; once reordered,
-//                 the
-//                                                             diagonal first and then the others in no order, (i, j)
-//                                                             standing for the pair whichever index is larger
+//   UpperRows     symmetric, 21                 yes           columns ascending from the diagonal on; once reordered
+//                                                             (not is_ascending) the diagonal first, then the others
+//                                                             in no order, (i, j) standing for the pair whichever
+//                                                             index is larger
 //   Packed<L>     symmetric, 22 and 23          yes           columns i .. n-1
 //   DiagonalArray diagonal                      no            column i
 //
@@ -104,13 +104,33 @@ struct UpperRows : StoredLines<UpperRows> {
   const i64* col_index;
   double* values;
   i64 rows, cols;
+  bool is_ascending;
 
   explicit UpperRows(SmMatrix& m)
-      : row_start(m.row_start), col_index(m.col_index), values(m.nz_values), rows(m.rows), cols(m.cols) {}
+      : row_start(m.row_start),
+        col_index(m.col_index),
+        values(m.nz_values),
+        rows(m.rows),
+        cols(m.cols),
+        is_ascending(m.state < SM_STATE_REORDERED) {}
 
   template <class F>
   void row(i64 i, F&& f) const {
     for (i64 p = row_start[i]; p < row_start[i + 1]; ++p) f(col_index[p], values[p]);
+  }
+  // f(j, value) for the stored entries of row i with first <= j <= last. Columns that ascend are searched for the first
+  // one and left behind the last; in a reordered row every one is looked at.
+  template <class F>
+  void row_between(i64 i, i64 first, i64 last, F&& f) const {
+    if (is_ascending) {
+      const i64 end = row_start[i + 1];
+      i64 p = std::lower_bound(col_index + row_start[i], col_index + end, first) - col_index;
+      for (; p < end && col_index[p] <= last; ++p) f(col_index[p], values[p]);
+    } else {
+      row(i, [&](i64 j, double& v) {
+        if (first <= j && j <= last) f(j, v);
+      });
+    }
   }
   i64 lines() const { return rows; }
   template <class F>

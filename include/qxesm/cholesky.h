@@ -14,6 +14,14 @@
  * 105 (workspace); 101 (the state stays 1); 0. */
 QXESM_API SmStatus qxsmmd(SmMatrix* matrix);
 
+/* An ordering of the caller's in place of qxsmmd: fills perm and inv_perm, sizes work; state 2.
+ *   perm  in  n words: perm[k] is the row placed k-th, 0-based; copied
+ * Any fill-reducing ordering serves; nested dissection often halves the work on three-dimensional grids.
+ * Answers: 0 with nothing done (empty); 1; 112 (not symmetric sparse); 0 (ordered already); 102 (not closed);
+ * 104 (perm is null or no permutation; the state stays 1); 101; 105 (workspace); 0. A repeated row is found only once
+ * there is memory to look. Cost: O(n). */
+QXESM_API SmStatus qxsmorder(SmMatrix* matrix, const int64_t* perm);
+
 /* Applies the ordering to the stored rows in place: entry (i, j) moves to the row of whichever index comes first in the
  * new order, the diagonal first in its row; state 3. qxsmget serves the diagonal only afterwards.
  * Answers: 0 with nothing done (empty); 0 (applied already); 1; 102 (state other than 2, or not symmetric sparse);
@@ -29,6 +37,15 @@ QXESM_API SmStatus qxsmsymbfact(SmMatrix* matrix);
  * Answers: 0 with nothing done (empty); 0 (state 5); 1; 113; 0 (state above 5); 102 (state other than 4, or not
  * symmetric sparse); 101 (the room is too small); 103 (definite 0, the state stays 4); 0. */
 QXESM_API SmStatus qxsmnumfact(SmMatrix* matrix);
+
+/* New values for the pattern that is there, for repeated fits; ordering and structure stay. State 5 becomes 4, the
+ * others stay; rank and log-determinant are void, definite unknown.
+ *   values  in  nnz values in closing order: the upper triangle row by row, columns ascending, the diagonal first (the
+ *               order of nz_values as closing left them, whatever happened to the matrix since)
+ * Answers: 0 with nothing done (empty); 1; 112 (not symmetric sparse); 113; 104 (values is null or the matrix's own
+ * array); 101 (nothing is changed); 0. Cost: O(nnz). The first call on a reordered matrix finds where the values go,
+ * keeps that (nnz words) and needs 2 nnz + n words more while it does; later calls allocate nothing. */
+QXESM_API SmStatus qxsmrefill(SmMatrix* matrix, const double* values);
 
 /* Factors whatever has a factor; state 5.
  *   symmetric sparse      the four steps above, from where the matrix stands

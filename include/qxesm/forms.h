@@ -58,9 +58,9 @@ QXESM_API SmStatus qxsmbilin(SmMatrix* a, const double* x, const double* y, doub
  * log-determinant.
  * Answers: 0 with R untouched (empty A); 1 (A); 113 (A or X); 104 (R is A or X); 121 (X's columns are not A's rows);
  * 110 (R not symmetric); then, R having been sized, 124 (pair not served); 118 (X symmetric sparse past state 2); 105;
- * 101; 121 (written as a whole: R is not of the order of X's rows, or has no array); the answer of qxsmassign that
- * ended it; that of qxsmclose; 0. The answer of sizing R is passed over, except that a result that has no array for
- * want of memory is told by 101 or 105.
+ * 101; 111 (A, with X in format 22 or 23); 121 (written as a whole: R is not of the order of X's rows or has no array);
+ * the answer of qxsmassign that ended it; that of qxsmclose; 0. The answer of sizing R is passed over, except that a
+ * result that has no array for want of memory is told by 101 or 105.
  * Work: by vectors a packed form and the copy of X; by rows 2n doubles, and an index of a symmetric sparse X.
  * Cost: by vectors that of qxsmquadv; by rows a pass over A for each row of X, and each row once for each before it. */
 QXESM_API SmStatus qxsmquad(SmMatrix* a, SmMatrix* x, SmMatrix* r, int32_t keep);
@@ -125,9 +125,10 @@ QXESM_API SmStatus qxsmmults(SmMatrix* a, double s);
  *   symmetric 22          no        yes         yes
  *   diagonal              yes       yes         yes
  * Elements are added by qxsmassign, in sparse rows of B product by product, else row by row. Elements for which C has
- * no place are passed over: a symmetric C takes the upper triangle, a diagonal C the diagonal. Of two diagonal matrices
+ * no place are passed over: a symmetric C takes the upper triangle, a diagonal C the diagonal. Of a general C in format
+ * 22 or 23 the position counts, as in qxsmassign: a kept one should have the product's size. Of two diagonal matrices
  * the product's diagonal is written into a diagonal C, which loses its factor, rank and log-determinant; any other C
- * gets it by qxsmassign and is, with keep 0, closed, dropping zeros.
+ * gets it by qxsmassign, zeros included, and is closed with keep 0.
  * Answers: 0 with nothing done (A and B empty); 1 (A); 113 (A or B); 104 (C is A or B); 121 (A's columns are not B's
  * rows; C diagonal and neither A nor B); then, C having been sized, 124 (pair not served); 0 (A or B empty); 101; 121
  * (diagonal times diagonal into a diagonal C of another order); the answer of qxsmassign that ended it, 104 and 117

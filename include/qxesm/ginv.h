@@ -57,9 +57,12 @@ QXESM_API SmStatus qxsmUpdateGinv(SmMatrix* g, SmMatrix* a, SmMatrix* b, int64_t
  *   p          out  a matrix, or null
  *   tolerance  above 0: stored entries of the block at or below it become 0 at the end; NaN: setting 3
  * A changed packed or diagonal G loses its separate factor array (state 1), rank and log-determinant.
- * Answers: 0 with nothing done (G empty); 104 (two of the handles are the same); 124 (kinds that do not pair); 104 (off
- * negative; a diagonal block outside G); 121 (B's order); 119 (G sparse and closed); 113 (B); the first answer of
- * qxsmresize or qxsmassign that is not 0; 0. */
+ * Answers: 0 with nothing done (G empty); 104 (two of the handles are the same); 124 (kind of G); then
+ *   general    124 (G or B not general sparse); 104 (off negative)
+ *   diagonal   124 (kind of B); 104 (off negative, or the block outside G)
+ *   symmetric  104 (off negative); 121 (B's order is not that of the block); 124 (kind of B); 119 (G sparse, closed);
+ *              113 (B), all before p is touched
+ * the first answer of qxsmresize or qxsmassign that is not 0; 0. */
 QXESM_API SmStatus qxsmAddGinv(SmMatrix* g, SmMatrix* b, SmMatrix* p, int64_t off, double s, double tolerance);
 
 /* Replaces a packed or diagonal matrix by its generalized inverse (in_place 1), or keeps the inverse beside the values
@@ -77,7 +80,8 @@ QXESM_API SmStatus qxsminv(SmMatrix* a, int16_t in_place, double tolerance);
  *   A symmetric sparse  H general; A is factored; elements of magnitude 1.11e-12 or less are not stored
  *   A diagonal          H general or diagonal; A is inverted beside its values
  * Answers: 0 with nothing done (empty); 1; 113; 104 (H is A); 111; 110 (kind of H); 124 (kind of A); 123 (a diagonal A
- * could not be inverted); 101; those of qxsminv, qxsmmultm, qxsmfact, qxsmsubst, qxsmassign; 0.
+ * could not be inverted); 101 and 105 (H lacks elements for want of memory); those of qxsminv, qxsmmultm, qxsmfact,
+ * qxsmsubst; 0. Other answers of sizing H and of entering its elements are passed over.
  * Cost, sparse: a solve and a pass over A for each column. */
 QXESM_API SmStatus qxsmhermite(SmMatrix* a, SmMatrix* h);
 

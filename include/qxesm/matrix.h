@@ -47,19 +47,19 @@ struct SmMatrix {
     int64_t* col_index;  /* symmetric sparse, closed: column of each stored entry */
     uint8_t owns_values; /* dense and diagonal: 1 when `values` was allocated by the matrix, 0 when tied */
   };
-  int64_t* perm;           /* n words: perm[k] is the row placed k-th */
-  int64_t* inv_perm;       /* n words: inv_perm[i] is the place of row i */
-  int64_t factor_block;    /* index words in a value word: 1 */
-  double* nz_values;       /* symmetric sparse, closed: value of each stored entry */
-  int64_t* work;           /* work_capacity 8-byte words: the factor workspace; the next six point into it */
-  int64_t* factor_scratch; /* n words, free for reuse once factored */
-  double* factor_diag;     /* n reciprocal pivots, 0 for a dropped one */
-  double* factor_values;   /* off-diagonal entries of U, row by row, negated */
-  int64_t* factor_iju;     /* n words: where row k's subscripts start in factor_ju */
-  int64_t* factor_iu;      /* n + 1 words: row k of U is at factor_iu[k] .. factor_iu[k+1] - 1 */
-  int64_t* factor_ju;      /* compressed column subscripts of U, in the new order */
-  int64_t* factor_reserved;
-  uint64_t* sym_roots; /* symmetric sparse while open: the root array, row_capacity words */
+  int64_t* perm;            /* n words: perm[k] is the row placed k-th */
+  int64_t* inv_perm;        /* n words: inv_perm[i] is the place of row i */
+  int64_t factor_block;     /* index words in a value word: 1 */
+  double* nz_values;        /* symmetric sparse, closed: value of each stored entry */
+  int64_t* work;            /* work_capacity 8-byte words: the factor workspace; the next six point into it */
+  int64_t* factor_scratch;  /* n words, free for reuse once factored */
+  double* factor_diag;      /* n reciprocal pivots, 0 for a dropped one */
+  double* factor_values;    /* off-diagonal entries of U, row by row, negated */
+  int64_t* factor_iju;      /* n words: where row k's subscripts start in factor_ju */
+  int64_t* factor_iu;       /* n + 1 words: row k of U is at factor_iu[k] .. factor_iu[k+1] - 1 */
+  int64_t* factor_ju;       /* compressed column subscripts of U, in the new order */
+  int64_t* factor_reserved; /* null, or nnz words of its own: where qxsmrefill puts the values of a reordered matrix */
+  uint64_t* sym_roots;      /* symmetric sparse while open: the root array, row_capacity words */
 };
 
 SM_STATIC_ASSERT(offsetof(SmMatrix, rows) == 48, "record layout");

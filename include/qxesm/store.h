@@ -28,7 +28,7 @@ QXESM_API SmStatus qxsmnewsd(SmInstance* instance, SmMatrix** matrix, int64_t n)
  *   symmetric sparse    a zero on every diagonal position (nnz = n), state 0: open for qxsmassign
  * 0 x 0 is a size. Answers: 1; 122 (negative, or exactly one dimension zero); 111 (symmetric or diagonal and
  * rows != cols; the state is 1 afterwards, and while a symmetric sparse matrix has no compressed rows its readers
- * answer 113); 105 (more than 2^53 values, roots or nodes); 101; 124.
+ * answer 113); 105 (more than 2^53 values, roots or nodes, but a diagonal matrix answers 101); 101; 124.
  * After 105 or 101 a dense or diagonal matrix has no values (nnz 0) and keeps rows and cols as asked; a sparse one
  * keeps its size and refuses entries with 101. 111 takes a matrix that was factored or inverted in place to state 1 as
  * well, with that factor or inverse as its values. Cost: the size of the storage; a symmetric sparse matrix pays n
@@ -75,8 +75,10 @@ QXESM_API SmStatus qxsmassign(SmMatrix* matrix, int64_t row, int64_t col, int32_
 /* Reads one element of a closed matrix into *value.
  *   symmetric sparse  col >= row only; once ordering has been applied or begun (state > 1) the diagonal only
  *   diagonal          the diagonal value of the row, whatever the column
- * Answers, with *value 0: 123 (empty); with *value missing: 110 (kind none); 113; 117 (outside); 123 (below the
- * diagonal, or off it past state 1; another kind); 116 (format); else 0, an absent entry reading as 0.
+ *   symmetric 22, 23  below the diagonal the position of the format leads to another element, which is what is read
+ * Answers, with *value 0: 123 (empty); with *value missing: 110 (kind none); 113; 117 (outside); 123 (symmetric sparse,
+ * below the diagonal, or off it past state 1; another kind); 116 (general, in a format that it does not know); else 0,
+ * an absent entry reading as 0.
  * Cost: one search in the row. */
 QXESM_API SmStatus qxsmget(SmMatrix* matrix, int64_t row, int64_t col, double* value);
 
@@ -104,8 +106,8 @@ QXESM_API SmStatus qxsmclose(SmMatrix* matrix, double tolerance);
 
 /* out <- row `row` of A from column `start` on (a negative start is 0).
  *   out  out  cols doubles, cleared first; absent entries are 0
- *   symmetric   the part right of the diagonal is written whatever the start is; what lies left of it, columns start ..
- *               row-1, is read from the earlier rows
+ *   symmetric   what lies left of the diagonal, columns start .. row-1, is read from the earlier rows; what lies right
+ *               of it is written whatever the start is, and so is the diagonal, but in format 22 from start <= row only
  *   diagonal    the diagonal element is written whatever the start is
  * A start > 0 moves the block of columns start .. cols-1 (general, format 23) or start .. row (symmetric, format 22) to
  * the beginning of out: column c is at out[c - start]. Every other layout keeps column c at out[c].
@@ -178,10 +180,12 @@ QXESM_API SmStatus qxsmconvert(SmMatrix* source, SmMatrix* target, int32_t flag)
  * record stays) and sized: state 1.
  *   values  in   rows*cols (general), n(n+1)/2 (symmetric) or n (diagonal) doubles in the layout of the format
  * Without that, the state stays and rank and log-determinant are voided: a separate factor or inverse array that is
- * there stays too and belongs to the old values.
- * Answers: 0 with nothing done (values null); 124 (format 21); 104 (values is the matrix's own array and would be given
- * back); then, unless the shape fits: 1 (the matrix is of kind none), those of qxsmnew (101, 116, 124: the record is
- * left with kind none), those of qxsmresize (the matrix is left with what that leaves); 0. Cost: one copy. */
+ * there stays too and belongs to the old values. The values may then lie in the matrix's own arrays, and overlap those
+ * that they replace.
+ * Answers: 0 with nothing done (values null); 124 (format 21); 104 (values begins in an array of the matrix, be it the
+ * values, a factor or an inverse, that would be given back); then, unless the shape fits: 1 (the matrix is of kind
+ * none), those of qxsmnew (101, 116, 124: the record is left with kind none), those of qxsmresize (the matrix is left
+ * with what that leaves); 0. Cost: one copy. */
 QXESM_API SmStatus qxsmcopyv(const double* values, SmMatrix* matrix, int64_t rows, int64_t cols, int32_t kind,
                              int32_t format);
 

@@ -1,57 +1,36 @@
 #include "cholesky/cholesky_support.hpp"
 
 #include <cmath>
-#include <cstring>
 
 namespace sm::test {
 
+namespace {
+
+Nonzeros elements_of(const Problem& problem) {
+  Nonzeros elements;
+  for (const Entry& e : problem.upper) elements[{e.row, e.col}] = e.value;
+  return elements;
+}
+
+}  // namespace
+
 SmMatrix* new_sparse(Session& session, const Problem& problem, bool close) {
-  SmMatrix* matrix = nullptr;
-  EXPECT_EQ(session.fn().qxsmnewss(session.instance(), &matrix, problem.n), SM_OK);
-  for (const Entry& e : problem.upper) EXPECT_EQ(session.fn().qxsmassign(matrix, e.row, e.col, 0, e.value), SM_OK);
-  if (close) {
-    EXPECT_EQ(session.fn().qxsmclose(matrix, std::nan("")), SM_OK);
-  }
-  return matrix;
+  return (close ? new_closed : new_entered)(session, kSymmetricSparse, problem.n, problem.n, elements_of(problem));
 }
 
 SmMatrix* new_packed(Session& session, const Problem& problem, std::int32_t format) {
-  SmMatrix* matrix = nullptr;
-  EXPECT_EQ(session.fn().qxsmnew(session.instance(), &matrix, SM_KIND_SYMMETRIC, format), SM_OK);
-  EXPECT_EQ(session.fn().qxsmresize(matrix, problem.n, problem.n), SM_OK);
-  for (const Entry& e : problem.upper) EXPECT_EQ(session.fn().qxsmassign(matrix, e.row, e.col, 0, e.value), SM_OK);
-  return matrix;
+  return new_entered(session, {SM_KIND_SYMMETRIC, format}, problem.n, problem.n, elements_of(problem));
 }
 
 SmMatrix* new_diagonal(Session& session, const std::vector<double>& d, std::int32_t format) {
   const auto n = static_cast<std::int64_t>(d.size());
-  SmMatrix* matrix = nullptr;
-  EXPECT_EQ(session.fn().qxsmnew(session.instance(), &matrix, SM_KIND_DIAGONAL, format), SM_OK);
-  EXPECT_EQ(session.fn().qxsmresize(matrix, n, n), SM_OK);
-  for (std::int64_t i = 0; i < n; ++i) EXPECT_EQ(session.fn().qxsmassign(matrix, i, i, 0, d[at(i)]), SM_OK);
-  return matrix;
-}
-
-SmMatrix* new_untyped(Session& session) {
-  SmMatrix* matrix = nullptr;
-  EXPECT_EQ(session.fn().qxsmnew(session.instance(), &matrix, SM_KIND_DIAGONAL, SM_FORMAT_ROWS), SM_OK);
-  EXPECT_EQ(session.fn().qxsmdelete(matrix), SM_OK);
-  return matrix;
+  Nonzeros elements;
+  for (std::int64_t i = 0; i < n; ++i) elements[{i, i}] = d[at(i)];
+  return new_entered(session, {SM_KIND_DIAGONAL, format}, n, n, elements);
 }
 
 SmMatrix* new_general(Session& session, std::int64_t rows, std::int64_t cols) {
-  SmMatrix* matrix = nullptr;
-  EXPECT_EQ(session.fn().qxsmnew(session.instance(), &matrix, SM_KIND_GENERAL, SM_FORMAT_COLUMNS), SM_OK);
-  EXPECT_EQ(session.fn().qxsmresize(matrix, rows, cols), SM_OK);
-  return matrix;
-}
-
-SmMatrix* new_open_tied(Session& session, std::vector<double>& data, std::int64_t rows, std::int64_t cols,
-                        std::int32_t kind, std::int32_t format) {
-  SmMatrix* matrix = new_untyped(session);
-  EXPECT_EQ(qxsmtie(matrix, data.data(), rows, cols, kind, format), SM_OK);
-  EXPECT_EQ(matrix->state, SM_STATE_OPEN);
-  return matrix;
+  return new_sized(session, kGeneralColumns, rows, cols);
 }
 
 Problem problem_of(const std::vector<std::vector<double>>& rows) {
@@ -60,10 +39,6 @@ Problem problem_of(const std::vector<std::vector<double>>& rows) {
     for (std::int64_t j = i; j < p.n; ++j)
       if (i == j || rows[at(i)][at(j)] != 0.0) p.upper.push_back({i, j, rows[at(i)][at(j)]});
   return p;
-}
-
-std::int64_t packed_position(std::int64_t n, std::int32_t format, std::int64_t r, std::int64_t c) {
-  return format == SM_FORMAT_COLUMNS ? r + c * (c + 1) / 2 : r * n - r * (r - 1) / 2 + (c - r);
 }
 
 std::vector<double> packed(const Problem& problem, std::int32_t format) {
@@ -84,20 +59,6 @@ Dense dense_of_packed(const double* values, std::int64_t n, std::int32_t format)
   for (std::int64_t r = 0; r < n; ++r)
     for (std::int64_t c = 0; c < r; ++c) a(r, c) = a(c, r);
   return a;
-}
-
-Indices words(const std::int64_t* array, std::int64_t count) { return {array, array + count}; }
-
-std::vector<double> doubles(const double* array, std::int64_t count) { return {array, array + count}; }
-
-std::vector<std::uint64_t> bits(const double* array, std::int64_t count) {
-  std::vector<std::uint64_t> b(at(count));
-  if (count > 0) std::memcpy(b.data(), array, at(count) * sizeof(double));
-  return b;
-}
-
-std::vector<std::uint64_t> bits(const std::vector<double>& v) {
-  return bits(v.data(), static_cast<std::int64_t>(v.size()));
 }
 
 StoredRows rows_of(const SmMatrix* matrix) {
@@ -184,7 +145,7 @@ std::int64_t owned_blocks(const SmMatrix* matrix) {
   const auto one = [](const void* p) { return static_cast<std::int64_t>(p != nullptr); };
   if (matrix->kind == SM_KIND_SYMMETRIC && matrix->format == SM_FORMAT_SPARSE) {
     return one(matrix->row_start) + one(matrix->col_index) + one(matrix->nz_values) + one(matrix->perm) +
-           one(matrix->inv_perm) + one(matrix->work);
+           one(matrix->inv_perm) + one(matrix->work) + one(matrix->factor_reserved);
   }
   return one(matrix->dense_factor) + (matrix->owns_values ? one(matrix->values) : 0);
 }

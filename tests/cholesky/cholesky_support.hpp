@@ -4,33 +4,22 @@
 #include <string>
 #include <vector>
 
-#include "support/module_test.hpp"
+#include "support/matrices.hpp"
 #include "support/random_matrices.hpp"
 
 namespace sm::test {
-
-using Indices = std::vector<std::int64_t>;
-
-inline std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
 // Symmetric sparse, assembled; closed with nothing dropped unless asked otherwise.
 SmMatrix* new_sparse(Session& session, const Problem& problem, bool close = true);
 // Symmetric, packed in format 22 or 23.
 SmMatrix* new_packed(Session& session, const Problem& problem, std::int32_t format);
 SmMatrix* new_diagonal(Session& session, const std::vector<double>& d, std::int32_t format = SM_FORMAT_ROWS);
-// An untyped record: created and reset.
-SmMatrix* new_untyped(Session& session);
 // A general dense matrix of the size, closed.
 SmMatrix* new_general(Session& session, std::int64_t rows, std::int64_t cols);
-// Still in state 0: a reset record with `data` tied to it.
-SmMatrix* new_open_tied(Session& session, std::vector<double>& data, std::int64_t rows, std::int64_t cols,
-                        std::int32_t kind, std::int32_t format);
 
 // A symmetric sparse problem from a dense matrix: the diagonal and everything that is not 0.
 Problem problem_of(const std::vector<std::vector<double>>& rows);
 
-// Element (r, c), r <= c, of a packed triangle.
-std::int64_t packed_position(std::int64_t n, std::int32_t format, std::int64_t r, std::int64_t c);
 std::vector<double> packed(const Problem& problem, std::int32_t format);
 Dense dense_of_packed(const double* values, std::int64_t n, std::int32_t format);  // both triangles
 Dense triangle_of_packed(const double* values, std::int64_t n, std::int32_t format);
@@ -44,11 +33,6 @@ struct StoredRows {
 };
 StoredRows rows_of(const SmMatrix* matrix);
 Dense dense_of_rows(const SmMatrix* matrix);  // whatever order the rows are in
-
-Indices words(const std::int64_t* array, std::int64_t count);
-std::vector<double> doubles(const double* array, std::int64_t count);
-std::vector<std::uint64_t> bits(const double* array, std::int64_t count);
-std::vector<std::uint64_t> bits(const std::vector<double>& v);
 
 // The four steps as far as the state; answers the first status that is not 0.
 SmStatus bring_to(SmMatrix* matrix, std::int32_t state);

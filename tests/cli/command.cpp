@@ -97,6 +97,22 @@ std::string CommandTest::matrix(const std::string& name, const std::string& kind
   return file(name, "%%MatrixMarket matrix " + kind + "\n" + rest);
 }
 
+std::string CommandTest::scattered(const std::string& name, int rows, int cols, bool lower, std::uint64_t seed) const {
+  std::string text;
+  int count = 0;
+  for (int i = 1; i <= rows; ++i) {
+    for (int j = 1; j <= (lower ? i : cols); ++j) {
+      seed = seed * 6364136223846793005u + 1442695040888963407u;
+      if (seed >> 62 == 0) continue;
+      text += std::to_string(i) + " " + std::to_string(j) + " " +
+              std::to_string((static_cast<double>(seed >> 54) - 512.0) / 64.0) + "\n";
+      ++count;
+    }
+  }
+  return matrix(name, std::string("coordinate real ") + (lower ? "symmetric" : "general"),
+                std::to_string(rows) + " " + std::to_string(cols) + " " + std::to_string(count) + "\n" + text);
+}
+
 std::string CommandTest::read(const std::string& path) {
   std::ifstream file(path, std::ios::binary);
   return {std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>()};

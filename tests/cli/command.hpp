@@ -45,6 +45,9 @@ class CommandTest : public ::testing::Test {
   std::string file(const std::string& name, const std::string& content) const;
   // The same, with "%%MatrixMarket matrix <kind>\n" in front.
   std::string matrix(const std::string& name, const std::string& kind, const std::string& rest) const;
+  // A coordinate file, of a lower triangle or the whole, with entries in three of four positions: multiples of 1/64, so
+  // that sums of products are exact.
+  std::string scattered(const std::string& name, int rows, int cols, bool lower, std::uint64_t seed) const;
   static std::string read(const std::string& path);
   static std::string shipped(const std::string& name) { return std::string(QXSM_SOURCE) + "/data/" + name; }
 

@@ -1,6 +1,7 @@
 #include "cli/dense.hpp"
 
 #include <cmath>
+#include <sstream>
 
 #include "cli/command.hpp"
 
@@ -15,6 +16,53 @@ DenseMatrix dense_of(const std::string& text, std::size_t rows, std::size_t cols
     if (mirrored && i != j) a.at(j).at(i) += value;
   }
   return a;
+}
+
+DenseMatrix dense_file(const std::string& text) {
+  std::istringstream lines(text);
+  std::string banner;
+  std::getline(lines, banner);
+  std::string line;
+  while (std::getline(lines, line) && line[0] == '%') {
+  }
+  std::size_t rows = 0;
+  std::size_t cols = 0;
+  std::istringstream(line) >> rows >> cols;
+  const bool symmetric = banner.find(" symmetric") != std::string::npos;
+  if (banner.find(" coordinate ") != std::string::npos) return dense_of(text, rows, cols, symmetric);
+  DenseMatrix a(rows, std::vector<long double>(cols, 0.0L));
+  for (std::size_t j = 0; j < cols; ++j) {
+    for (std::size_t i = symmetric ? j : 0; i < rows; ++i) {
+      double value = 0.0;
+      EXPECT_TRUE(lines >> value) << "the array ends early";
+      a[i][j] = value;
+      if (symmetric) a[j][i] = value;
+    }
+  }
+  EXPECT_FALSE(lines >> line) << "the array has more than its size says";
+  return a;
+}
+
+DenseMatrix dense_form(const DenseMatrix& x, const DenseMatrix& a) {
+  const DenseMatrix product = dense_product(x, a);
+  DenseMatrix form(x.size(), std::vector<long double>(x.size(), 0.0L));
+  for (std::size_t i = 0; i < x.size(); ++i) {
+    for (std::size_t j = 0; j < x.size(); ++j) {
+      for (std::size_t k = 0; k < a.size(); ++k) form[i][j] += product[i][k] * x[j][k];
+    }
+  }
+  return form;
+}
+
+void expect_near(const DenseMatrix& got, const DenseMatrix& want, double tolerance) {
+  ASSERT_EQ(got.size(), want.size());
+  for (std::size_t i = 0; i < got.size(); ++i) {
+    ASSERT_EQ(got[i].size(), want[i].size());
+    for (std::size_t j = 0; j < got[i].size(); ++j) {
+      EXPECT_TRUE(std::fabs(got[i][j] - want[i][j]) <= tolerance)
+          << i << ", " << j << ": " << got[i][j] << " for " << want[i][j];
+    }
+  }
 }
 
 DenseMatrix dense_inverse(DenseMatrix a) {

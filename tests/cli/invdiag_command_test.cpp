@@ -78,7 +78,7 @@ TEST_F(InvdiagCommand, the_diagonal_can_go_to_standard_output) {
   EXPECT_EQ(run.out, "%%MatrixMarket matrix array real general\n% diagonal of the inverse of " + a +
                          "\n2 1\n2.5000000000000000e-01\n2.0000000000000000e+00\n");
   EXPECT_NE(run.err.find("2 of 2"), std::string::npos) << run.err;
-  expect_message(qxsm({"invdiag", a, "-o", "-", "--json"}), 2, {"standard output", "; give -o a file"});
+  expect_message(qxsm({"invdiag", a, "-o", "-", "--json"}), 2, {"standard output", "; send the result to a file"});
 }
 
 TEST_F(InvdiagCommand, a_matrix_without_rows_has_no_diagonal) {

@@ -41,6 +41,35 @@ TEST_F(Memory, every_ceiling_ends_with_3_or_0) {
   EXPECT_LE(refused, 21);
 }
 
+// The same for what works on more than a factor.
+TEST_F(Memory, every_subcommand_ends_with_3_under_some_ceilings_and_never_badly) {
+  const std::string a = shipped("bcsstk01.mtx");
+  const std::string x = scattered("x.mtx", 6, 48, false, 3);
+  const std::vector<std::vector<std::string>> commands{{"quad", a, x},
+                                                       {"quad", a, x, "--inverse"},
+                                                       {"hermite", a},
+                                                       {"estimable", a, x},
+                                                       {"trace", a, "--inverse"},
+                                                       {"solve", a, "--method", "cg", "--max-iterations", "500"},
+                                                       {"convert", a, path("o.mtx"), "--to", "dense"}};
+  for (const auto& command : commands) {
+    std::vector<std::string> arguments = command;
+    arguments.emplace_back("--json");
+    const Outcome free = qxsm(arguments);
+    ASSERT_EQ(free.code, 0) << command[0] << free.err;
+    const auto peak = free.json().at("peak_pool_bytes").get<std::uint64_t>();
+    int refused = 0;
+    for (std::uint64_t step = 1; step <= 9; ++step) {
+      std::vector<std::string> limited = command;
+      limited.insert(limited.end(), {"--memory", std::to_string(peak * step / 8), "--quiet"});
+      const Outcome run = qxsm(limited);
+      EXPECT_TRUE(run.code == 3 || run.code == 0) << command[0] << step << run.err;
+      refused += run.code == 3 ? 1 : 0;
+    }
+    EXPECT_GE(refused, 3) << command[0];
+  }
+}
+
 TEST_F(Memory, a_ceiling_that_does_not_let_the_module_in_ends_with_3) {
   expect_message(qxsm({"factor", shipped("bcsstk01.mtx"), "--memory", "100"}), 3, {"out of memory", "--memory", "; "});
 }

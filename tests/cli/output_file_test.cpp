@@ -41,6 +41,21 @@ TEST(OutputFile, an_array_reads_back_to_the_bit) {
   std::filesystem::remove(path);
 }
 
+TEST(OutputFile, a_name_in_gz_is_written_as_gzip_and_reads_back_to_the_bit) {
+  const std::string path = fresh("array.mtx.gz");
+  // More than what is formatted at a time.
+  std::vector<double> values;
+  for (int i = 0; i < 200'000; ++i) values.push_back(1.0 / (i + 3.0));
+  OutputFile out(path, {});
+  write_array(out, 200'000, 1, values.data(), "packed");
+  const std::string bytes = content(path);
+  EXPECT_EQ(bytes.substr(0, 2), "\x1f\x8b");
+  const auto read = read_text(bytes);
+  ASSERT_EQ(read.entries().size(), values.size());
+  for (std::size_t i = 0; i < values.size(); ++i) EXPECT_EQ(std::get<2>(read.entries()[i]), values[i]);
+  std::filesystem::remove(path);
+}
+
 TEST(OutputFile, a_shorter_result_leaves_nothing_of_an_older_file) {
   const std::string path = fresh("older.mtx");
   std::ofstream(path) << std::string(5000, 'x');

@@ -53,6 +53,20 @@ TEST(Progress, a_known_share_is_a_bar_and_an_unknown_one_a_clock) {
   EXPECT_EQ(Progress::line("ordering", -1.0, 12.3), "ordering ... 12 s");
 }
 
+TEST(Progress, an_iteration_shows_its_step_and_its_residual_until_the_phase_ends) {
+  EXPECT_EQ(Progress::iteration_text(0, 0.5), "");
+  EXPECT_EQ(Progress::iteration_text(57, 3.25e-5), ", step 57, residual 3.25e-05");
+  Screen screen;
+  {
+    Progress progress(screen.file(), true, Milliseconds(1), Milliseconds(1));
+    progress.phase("conjugate gradients");
+    progress.iteration(3, 0.25);
+    EXPECT_TRUE(screen.shows("\r\x1b[Kconjugate gradients ... 0 s, step 3, residual 2.50e-01"));
+    progress.phase("writing");
+    EXPECT_TRUE(screen.shows("\r\x1b[Kwriting ... 0 s\r"));
+  }
+}
+
 TEST(Progress, a_long_phase_is_drawn_and_the_line_is_taken_away_at_the_end) {
   Screen screen;
   {

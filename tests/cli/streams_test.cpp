@@ -1,9 +1,11 @@
 // Standard input, output and error: what goes where, and what happens when nobody listens.
 #include <fcntl.h>
+#include <poll.h>
 #include <pty.h>
 #include <unistd.h>
 
 #include <array>
+#include <atomic>
 #include <filesystem>
 #include <thread>
 
@@ -100,6 +102,51 @@ TEST_F(StandardStreams, a_long_run_shows_its_phase_on_a_terminal_and_takes_it_aw
   EXPECT_EQ(screen.substr(screen.size() - 4), "\r\x1b[K");
   EXPECT_EQ(run.out.find('\x1b'), std::string::npos);
   for (const int file : {terminal, program_side, input[0]}) close(file);
+}
+
+// What a run shows on a terminal, which is read all the while.
+std::string screen_of(const std::vector<std::string>& arguments, Outcome& run) {
+  int terminal = -1;
+  int program_side = -1;
+  EXPECT_EQ(openpty(&terminal, &program_side, nullptr, nullptr, nullptr), 0);
+  std::string screen;
+  std::atomic<bool> ended{false};
+  std::thread user([&] {
+    std::array<char, 4096> buffer{};
+    pollfd ready{.fd = terminal, .events = POLLIN, .revents = 0};
+    for (bool last = false; !last;) {
+      last = ended;
+      while (poll(&ready, 1, 20) > 0) {
+        const ssize_t got = ::read(terminal, buffer.data(), buffer.size());
+        if (got <= 0) break;
+        screen.append(buffer.data(), static_cast<std::size_t>(got));
+      }
+    }
+  });
+  run = qxsm(arguments, {.err_file = program_side, .terminal = "xterm"});
+  ended = true;
+  user.join();
+  for (const int file : {terminal, program_side}) close(file);
+  return screen;
+}
+
+// The line appears after half a second. How many steps that takes depends on the machine; a tolerance of 0 is not met.
+TEST_F(StandardStreams, conjugate_gradients_show_their_residual_on_a_terminal) {
+  std::string screen;
+  for (long steps = 4000; steps < 4'000'000 && screen.find(" s, step ") == std::string::npos; steps *= 4) {
+    Outcome run;
+    screen = screen_of({"solve", shipped("bcsstk13.mtx"), "--method", "cg", "--tolerance", "0", "--json",
+                        "--max-iterations", std::to_string(steps)},
+                       run);
+    ASSERT_EQ(run.code, 1);
+    EXPECT_EQ(run.json().at("iterations"), steps);
+    EXPECT_EQ(run.out.find('\x1b'), std::string::npos);
+  }
+  const std::size_t line = screen.find("conjugate gradients ... ");
+  ASSERT_NE(line, std::string::npos) << screen;
+  const std::size_t step = screen.find(" s, step ", line);
+  ASSERT_NE(step, std::string::npos) << screen;
+  EXPECT_EQ(screen.find(", residual ", step), screen.find_first_not_of("0123456789", step + 9)) << screen;
 }
 
 TEST_F(StandardStreams, nothing_but_messages_goes_to_a_standard_error_that_is_no_terminal) {

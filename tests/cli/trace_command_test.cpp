@@ -8,23 +8,6 @@ namespace {
 
 class TraceCommand : public CommandTest {
  protected:
-  // Entries in every third position or so, multiples of 1/64, so that sums of products are exact.
-  std::string scattered(const std::string& name, int rows, int cols, bool lower, std::uint64_t seed) const {
-    std::string text;
-    int count = 0;
-    for (int i = 1; i <= rows; ++i) {
-      for (int j = 1; j <= (lower ? i : cols); ++j) {
-        seed = seed * 6364136223846793005u + 1442695040888963407u;
-        if (seed >> 62 == 0) continue;
-        text += std::to_string(i) + " " + std::to_string(j) + " " +
-                std::to_string((static_cast<double>(seed >> 54) - 512.0) / 64.0) + "\n";
-        ++count;
-      }
-    }
-    return matrix(name, std::string("coordinate real ") + (lower ? "symmetric" : "general"),
-                  std::to_string(rows) + " " + std::to_string(cols) + " " + std::to_string(count) + "\n" + text);
-  }
-
   static double trace_of(const std::vector<std::string>& arguments) {
     std::vector<std::string> all{"trace", "--json"};
     all.insert(all.end(), arguments.begin(), arguments.end());

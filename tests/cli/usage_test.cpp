@@ -7,7 +7,9 @@ TEST(Usage, wrong_usage_ends_with_2_and_says_where_help_is) {
   expect_message(qxsm({}), 2, {"subcommand is required", "; see qxsm --help"});
   expect_message(
       qxsm({"invert", "a.mtx"}), 2,
-      {"found the subcommand \"invert\", expected info, factor, solve, invdiag, trace or grid", "; see qxsm --help"});
+      {"found the subcommand \"invert\", expected info, factor, solve, invdiag, quad, trace, hermite, estimable, "
+       "convert or grid",
+       "; see qxsm --help"});
   expect_message(qxsm({"solve"}), 2, {"A.mtx is required", "; see qxsm solve --help"});
   expect_message(qxsm({"solve", "a.mtx", "--frobnicate"}), 2, {"--frobnicate", "; see qxsm solve --help"});
   expect_message(qxsm({"factor", "a.mtx", "b.mtx"}), 2, {"b.mtx", "; see qxsm factor --help"});
@@ -19,7 +21,8 @@ TEST(Usage, bad_values_of_options_end_with_2_and_say_what_is_good) {
     expect_message(qxsm({"info", "a.mtx", "--memory", bad}), 2,
                    {"--memory: found \"", "(4G)", "; see qxsm info --help"});
   }
-  expect_message(qxsm({"solve", "a.mtx", "--method", "magic"}), 2, {"found \"magic\", expected direct", "; see qxsm"});
+  expect_message(qxsm({"solve", "a.mtx", "--method", "magic"}), 2,
+                 {"found \"magic\", expected direct or cg", "; see qxsm"});
   expect_message(qxsm({"grid", "0", "5"}), 2, {"NX: found \"0\", expected a whole number above 0", "; see qxsm grid"});
   expect_message(qxsm({"grid", "5", "2.5"}), 2, {"NY: found \"2.5\"", "; see qxsm grid"});
   expect_message(qxsm({"grid", "5", "5", "--shift", "nan"}), 2, {"--shift: found \"nan\"", "; see qxsm grid"});
@@ -33,7 +36,7 @@ TEST(Usage, wrong_usage_is_an_object_too_when_json_is_asked_for) {
 }
 
 TEST(Usage, standard_output_is_not_promised_twice) {
-  expect_message(qxsm({"solve", "a.mtx", "--json", "-o", "-"}), 2, {"standard output", "; give -o a file"});
+  expect_message(qxsm({"solve", "a.mtx", "--json", "-o", "-"}), 2, {"standard output", "; send the result to a file"});
   expect_message(qxsm({"solve", "-", "-b", "-"}), 2, {"standard input", "; give one of them as a file"});
 }
 

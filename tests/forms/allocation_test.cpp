@@ -25,7 +25,6 @@ std::vector<double> last_of(const Matrices& m) { return read(m.back()).by_rows()
 
 // Factored where it can be, so that a refused request leaves it as it is.
 Operand ready(Shape shape) { return {shape, shape.kind == SM_KIND_GENERAL ? SM_STATE_CLOSED : SM_STATE_FACTORED}; }
-constexpr Shape kInvertible[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalColumns, kDiagonalRows};
 
 std::string name_of_three(Shape a, Shape x, Shape r) {
   return name_of(a) + " between " + name_of(x) + " into " + name_of(r);

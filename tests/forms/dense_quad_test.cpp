@@ -11,13 +11,7 @@ class DenseQuadTest : public FormsTest {
   SmStatus form_of(SmMatrix* g, const std::vector<double>& s, SmMatrix* r, std::int32_t keep) {
     return fn().qxsmDenseQuad(g, s.data(), r, keep);
   }
-  SmMatrix* of(Operand operand, std::int64_t rows, std::int64_t cols) {
-    Random random(1);
-    return build(operand, random_known(random, operand.shape, rows, cols));
-  }
   SmMatrix* result() { return build(kSymmetricSparse, kBefore); }
-  static bool as_before(SmMatrix* r) { return r->rows == 2 && same(read(r), kBefore); }
-  static inline const Known kBefore = Known::full({{5.0, 6.0}, {6.0, 8.0}});
 };
 INSTANTIATE_BOTH_HOSTS(DenseQuadTest);
 

@@ -6,14 +6,7 @@ namespace {
 
 class InverseQuadRefusalsTest : public FormsTest {
  protected:
-  SmMatrix* of(Operand operand, std::int64_t rows, std::int64_t cols) {
-    Random random(1);
-    return build(operand, random_known(random, operand.shape, rows, cols));
-  }
-  SmMatrix* result(Shape shape = kSymmetricRows) { return build(shape, kBefore); }
-  static bool as_before(SmMatrix* r) { return r->rows == 2 && same(read(r), kBefore); }
   SmStatus form_of(SmMatrix* a, SmMatrix* x, SmMatrix* r) { return fn().qxsminvquad(a, x, r); }
-  static inline const Known kBefore = Known::full({{5.0, 6.0}, {6.0, 8.0}});
 };
 INSTANTIATE_BOTH_HOSTS(InverseQuadRefusalsTest);
 
@@ -34,7 +27,6 @@ TEST_P(InverseQuadRefusalsTest, an_empty_operand_answers_0_before_everything) {
       EXPECT_EQ(form_of(m, m, m), SM_OK);
       EXPECT_TRUE(as_before(r));
     }
-  harmless(none);
 }
 
 TEST_P(InverseQuadRefusalsTest, kind_none_then_open_operands) {
@@ -44,7 +36,6 @@ TEST_P(InverseQuadRefusalsTest, kind_none_then_open_operands) {
   EXPECT_EQ(form_of(none, open, none), SM_UNTYPED);
   none->state = SM_STATE_FACTORED;
   EXPECT_EQ(form_of(none, open, general), SM_UNTYPED);
-  harmless(none);
   Random random(2);
   SmMatrix* without_array =
       build_in_place(session(), {kSymmetricRows, SM_STATE_FACTORED}, random_known(random, kSymmetricRows, 4, 4));
@@ -72,6 +63,10 @@ TEST_P(InverseQuadRefusalsTest, a_missing_separate_array_comes_before_the_result
       EXPECT_EQ(form_of(a, fitting, r), SM_NO_FACTOR) << name_of(shape);
       EXPECT_TRUE(as_before(r));
     }
+  SmMatrix* sparse = of({kSymmetricSparse, SM_STATE_FACTORED}, 4, 4);
+  sparse->row_start = nullptr;  // no call leaves that; the rows go with their pool
+  EXPECT_EQ(form_of(sparse, wide, sparse), SM_NO_FACTOR);
+  EXPECT_EQ(form_of(sparse, sized(kSymmetricSparse, 7), wide), SM_NOT_CLOSED) << "an open operand comes before it";
   SmMatrix* general = of({kGeneralRows}, 4, 4);
   general->state = SM_STATE_FACTORED;  // no call brings a general matrix there
   EXPECT_EQ(form_of(general, wide, wide), SM_NO_FACTOR);

@@ -1,7 +1,7 @@
 // qxsminvquad: X A^- X' for every served pair and every result.
 #include <cmath>
 
-#include "forms/forms_support.hpp"
+#include "forms/inverses.hpp"
 
 namespace sm::test {
 namespace {
@@ -16,10 +16,6 @@ class InverseQuadTest : public FormsTest {
   }
 };
 INSTANTIATE_BOTH_HOSTS(InverseQuadTest);
-
-bool solvable(Operand operand) { return !(operand.shape == kSymmetricColumns && operand.state == SM_STATE_INVERTED); }
-inline constexpr Shape kInvertible[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalColumns,
-                                        kDiagonalRows};
 
 TEST_P(InverseQuadTest, is_the_form_of_the_inverse_for_every_pair_and_result) {
   Random random(1);

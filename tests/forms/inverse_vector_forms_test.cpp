@@ -1,7 +1,7 @@
 // qxsminvquadv and qxsminvbilin: forms of vectors around the inverse.
 #include <cmath>
 
-#include "forms/forms_support.hpp"
+#include "forms/inverses.hpp"
 
 namespace sm::test {
 namespace {
@@ -17,9 +17,6 @@ class InverseVectorFormsTest : public FormsTest {
   }
 };
 INSTANTIATE_BOTH_HOSTS(InverseVectorFormsTest);
-
-// What cannot be solved with: an inverse in format 22.
-bool solvable(Operand operand) { return !(operand.shape == kSymmetricColumns && operand.state == SM_STATE_INVERTED); }
 
 // X' G Y.
 Dense form_in(const Dense& g, const std::vector<double>& x, const std::vector<double>& y) {

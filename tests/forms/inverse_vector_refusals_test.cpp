@@ -8,10 +8,6 @@ constexpr std::int64_t kTooMany = SM_MAX_ELEMENTS;  // vectors of more than one 
 
 class InverseVectorRefusalsTest : public FormsTest {
  protected:
-  SmMatrix* of(Operand operand, std::int64_t rows = 4, std::int64_t cols = 4) {
-    Random random(1);
-    return build(operand, random_known(random, operand.shape, rows, cols));
-  }
   SmMatrix* in_place(Operand operand) {
     Random random(1);
     return build_in_place(session(), operand, random_known(random, operand.shape, 4, 4));
@@ -42,6 +38,8 @@ std::vector<SmMatrix*> InverseVectorRefusalsTest::without_array() {
     all.push_back(of({shape}, 3, 5));
     all.back()->state = SM_STATE_FACTORED;  // no call brings a general matrix there
   }
+  all.push_back(of({kSymmetricSparse, SM_STATE_FACTORED}));
+  all.back()->row_start = nullptr;  // nor takes the rows from under a sparse factor; they go with their pool
   return all;
 }
 
@@ -72,7 +70,6 @@ TEST_P(InverseVectorRefusalsTest, an_alias_comes_first_for_a_quadratic_form) {
   }
   for (const Operand& operand : all_operands()) EXPECT_EQ(aliased_quadratic(of(operand)), SM_BAD_ARGUMENT);
   EXPECT_TRUE(r_.untouched());
-  harmless(none);
 }
 
 TEST_P(InverseVectorRefusalsTest, kind_none_comes_first_for_a_bilinear_form_and_is_one_of_many_for_a_quadratic_one) {
@@ -85,7 +82,6 @@ TEST_P(InverseVectorRefusalsTest, kind_none_comes_first_for_a_bilinear_form_and_
                                                                     : SM_NO_FACTOR);
   }
   EXPECT_TRUE(r_.untouched());
-  harmless(none);
 }
 
 TEST_P(InverseVectorRefusalsTest, an_open_matrix_comes_next) {

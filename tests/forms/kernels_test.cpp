@@ -4,6 +4,7 @@
 #include <dlfcn.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cmath>
 #include <cstdint>
 #include <cstring>
@@ -23,6 +24,14 @@ struct Called {
 };
 Called daxpy_called;
 Called ddot_called;
+
+// A piece of a dot product that is only counted, because no machine of ours holds vectors of that length.
+struct Piece {
+  const double* x;
+  const double* y;
+  std::int64_t n;
+};
+std::vector<Piece>* counted_pieces = nullptr;
 
 template <class Function>
 Function real(const char* name) {
@@ -46,6 +55,10 @@ void daxpy_(const int* n, const double* a, const double* x, const int* incx, dou
 
 double ddot_(const int* n, const double* x, const int* incx, const double* y, const int* incy) {
   ddot_called = {ddot_called.times + 1, *n, *incx * 100 + *incy, 0.0};
+  if (counted_pieces) {
+    counted_pieces->push_back({x, y, *n});
+    return *n;
+  }
   return real<decltype(&ddot_)>("ddot_")(n, x, incx, y, incy);
 }
 }
@@ -209,6 +222,30 @@ TEST(DotProduct, the_blas_takes_vectors_of_500_and_more) {
     if (n < 500) continue;
     EXPECT_EQ(ddot_called.n, n);
     EXPECT_EQ(ddot_called.strides, 101);
+  }
+}
+
+TEST(DotProduct, a_vector_that_is_longer_than_the_blas_can_count_is_handed_over_in_pieces) {
+  constexpr std::int64_t most = std::numeric_limits<std::int32_t>::max();
+  const double x = 1.0;
+  const double y = 1.0;
+  const auto address = [](const double* first, std::int64_t i) {
+    return reinterpret_cast<std::uintptr_t>(first) + static_cast<std::uintptr_t>(i) * sizeof(double);
+  };
+  for (const std::int64_t n : {most - 1, most, most + 1, most + 500, 2 * most, 2 * most + 7, std::int64_t{1} << 34}) {
+    std::vector<Piece> pieces;
+    counted_pieces = &pieces;
+    const double sum = hzvdot11(&x, &y, n);
+    counted_pieces = nullptr;
+    EXPECT_EQ(sum, static_cast<double>(n));
+    std::int64_t done = 0;
+    for (const Piece& piece : pieces) {
+      EXPECT_EQ(reinterpret_cast<std::uintptr_t>(piece.x), address(&x, done)) << n;
+      EXPECT_EQ(reinterpret_cast<std::uintptr_t>(piece.y), address(&y, done)) << n;
+      EXPECT_EQ(piece.n, std::min(most, n - done)) << n;
+      done += piece.n;
+    }
+    EXPECT_EQ(done, n);
   }
 }
 

@@ -6,13 +6,7 @@ namespace {
 
 class ProductRefusalsTest : public FormsTest {
  protected:
-  SmMatrix* of(Operand operand, std::int64_t rows, std::int64_t cols) {
-    Random random(1);
-    return build(operand, random_known(random, operand.shape, rows, cols));
-  }
   SmMatrix* result(Shape shape = kGeneralRows) { return build(shape, kBefore); }
-  static bool as_before(SmMatrix* r) { return r->rows == 2 && same(read(r), kBefore); }
-  static inline const Known kBefore = Known::full({{5.0, 6.0}, {6.0, 8.0}});
 };
 INSTANTIATE_BOTH_HOSTS(ProductRefusalsTest);
 

@@ -1,4 +1,6 @@
 // qxsmmultm: what becomes of its result matrix.
+#include <cmath>
+
 #include "forms/product_support.hpp"
 
 namespace sm::test {
@@ -40,6 +42,9 @@ TEST_P(ProductResultTest, of_two_diagonal_matrices_is_closed_unless_it_is_kept) 
     ASSERT_EQ(qxsmmultm(a, b, c, 0), SM_OK);
     EXPECT_EQ(c->state, SM_STATE_CLOSED);
     EXPECT_TRUE(same(read(c), want));
+    if (is_sparse(into)) {
+      EXPECT_TRUE(same_entries(read(c), want)) << "a zero is entered too";
+    }
   }
   SmMatrix* kept = sized(kSymmetricSparse, 3);
   ASSERT_EQ(qxsmmultm(a, b, kept, 1), SM_OK);
@@ -116,6 +121,22 @@ TEST_P(ProductResultTest, elements_outside_a_packed_result_are_passed_over) {
     SmMatrix* c = diagonal_of({100.0, 200.0}, {shape});
     ASSERT_EQ(qxsmmultm(diagonal_of({1.0, 2.0, 3.0}), a, c, 1), SM_OK);
     EXPECT_TRUE(same(read(c), diagonal_known({101.0, 208.0}))) << name_of(shape);
+  }
+}
+
+TEST_P(ProductResultTest, elements_past_a_general_array_that_is_kept_go_where_their_position_is) {
+  SmMatrix* a = of(kGeneralRows, {{1.0, 2.0, 4.0}, {8.0, 16.0, 32.0}, {64.0, 128.0, 256.0}});
+  SmMatrix* one = diagonal_of({1.0, 1.0, 1.0});
+  for (const Shape shape : {kGeneralColumns, kGeneralRows}) {
+    SmMatrix* c = sized(shape, 2, 2);
+    ASSERT_EQ(qxsmmultm(a, one, c, 1), SM_OK);
+    std::vector<double> want(4);
+    for (std::int64_t i = 0; i < 3; ++i)
+      for (std::int64_t j = 0; j < 3; ++j) {
+        const std::int64_t position = shape == kGeneralRows ? i * 2 + j : j * 2 + i;
+        if (position < 4) want[at(position)] += std::ldexp(1.0, static_cast<int>(3 * i + j));
+      }
+    EXPECT_TRUE(same(doubles(c->values, 4), want)) << name_of(shape);
   }
 }
 

@@ -19,15 +19,4 @@ inline Known taken(Shape c, const Known& product) {
   return product;
 }
 
-// Sized and entered, but not closed.
-inline SmMatrix* entered_open(Session& session, Shape shape, const Known& known) {
-  SmMatrix* m = new_sized(session, shape, known.rows(), known.cols());
-  for (std::int64_t r = 0; r < known.rows(); ++r)
-    for (std::int64_t c = 0; c < known.cols(); ++c) {
-      if (!known.has(r, c) || (shape.kind == SM_KIND_SYMMETRIC && c < r)) continue;
-      EXPECT_EQ(session.fn().qxsmassign(m, r, c, 0, known(r, c)), SM_OK);
-    }
-  return m;
-}
-
 }  // namespace sm::test

@@ -28,7 +28,7 @@ void ProductTest::expect_product(SmMatrix* a, SmMatrix* b, const Known& want, Sh
   destroy(c);
 
   const Known before = random_known(random, into, want.rows(), want.cols());
-  SmMatrix* kept = entered_open(session(), into, before);
+  SmMatrix* kept = new_entered(session(), into, before.rows(), before.cols(), before.elements(into));
   ASSERT_EQ(qxsmmultm(a, b, kept, 0x10000), SM_OK);
   EXPECT_EQ(kept->state, into == kSymmetricSparse ? SM_STATE_OPEN : SM_STATE_CLOSED);
   const bool written = both_diagonal && diagonal(into);

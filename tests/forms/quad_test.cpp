@@ -10,6 +10,8 @@ class QuadTest : public FormsTest {
  protected:
   // The form of both into every result, sized first and added to what is there.
   void expect_form(SmMatrix* a, SmMatrix* x, const Known& want, bool whole);
+  // The form of random rows, n long, around a random matrix.
+  void expect_pair(Operand middle, Operand outer, std::int64_t rows, std::int64_t n, Random& random);
 };
 INSTANTIATE_BOTH_HOSTS(QuadTest);
 
@@ -48,60 +50,43 @@ void QuadTest::expect_form(SmMatrix* a, SmMatrix* x, const Known& want, bool who
   }
 }
 
+void QuadTest::expect_pair(Operand middle, Operand outer, std::int64_t rows, std::int64_t n, Random& random) {
+  SCOPED_TRACE(name_of(middle) + " of order " + std::to_string(n) + " between " + std::to_string(rows) + " rows of " +
+               name_of(outer));
+  const Known known_a = random_known(random, middle.shape, n, n);
+  const Known known_x = random_known(random, outer.shape, rows, n);
+  SmMatrix* a = build(middle, known_a);
+  SmMatrix* x = build(outer, known_x);
+  expect_form(a, x, form_of_rows(known_a, known_x), dense_general(outer.shape));
+  EXPECT_TRUE(same_entries(read(a), known_a));
+  EXPECT_TRUE(same_entries(read(x), known_x));
+  EXPECT_EQ(a->state, middle.state);
+  EXPECT_EQ(x->state, outer.state);
+  destroy(a);
+  destroy(x);
+}
+
 TEST_P(QuadTest, a_dense_x_is_served_for_every_middle_matrix) {
   Random random(1);
-  for (const Operand& operand : all_operands())
-    for (const std::int64_t n : {1, 4})
-      for (const std::int64_t rows : {1, 3, 6})
-        for (const Shape shape : {kGeneralColumns, kGeneralRows}) {
-          SCOPED_TRACE(name_of(operand) + " of order " + std::to_string(n) + " between " + std::to_string(rows) +
-                       " rows of " + name_of(shape));
-          const Known known_a = random_known(random, operand.shape, n, n);
-          const Known known_x = random_known(random, shape, rows, n);
-          SmMatrix* a = build(operand, known_a);
-          SmMatrix* x = build(shape, known_x);
-          expect_form(a, x, form_of_rows(known_a, known_x), true);
-          EXPECT_TRUE(same_entries(read(a), known_a));
-          EXPECT_TRUE(same_entries(read(x), known_x));
-          EXPECT_EQ(a->state, operand.state);
-          destroy(a);
-          destroy(x);
-        }
+  for (const Operand& middle : all_operands())
+    for (const Shape outer : {kGeneralColumns, kGeneralRows})
+      for (const std::int64_t n : {1, 4})
+        for (const std::int64_t rows : {1, 3, 6}) expect_pair(middle, {outer}, rows, n, random);
 }
 
 TEST_P(QuadTest, a_sparse_x_is_served_for_a_symmetric_matrix) {
   Random random(2);
-  for (const Operand& operand : kSymmetricOperands)
+  for (const Operand& middle : kSymmetricOperands)
     for (const std::int64_t n : {1, 4})
-      for (const std::int64_t rows : {1, 3, 6}) {
-        SCOPED_TRACE(name_of(operand));
-        const Known known_a = random_known(random, operand.shape, n, n);
-        const Known known_x = random_known(random, kGeneralSparse, rows, n);
-        SmMatrix* a = build(operand, known_a);
-        SmMatrix* x = build(kGeneralSparse, known_x);
-        expect_form(a, x, form_of_rows(known_a, known_x), false);
-        EXPECT_TRUE(same_entries(read(a), known_a));
-        EXPECT_TRUE(same_entries(read(x), known_x));
-        destroy(a);
-        destroy(x);
-      }
+      for (const std::int64_t rows : {1, 3, 6}) expect_pair(middle, {kGeneralSparse}, rows, n, random);
 }
 
 TEST_P(QuadTest, a_symmetric_or_diagonal_x_is_read_by_rows_for_a_symmetric_matrix) {
   Random random(3);
-  for (const Operand& operand : kSymmetricOperands)
+  for (const Operand& middle : kSymmetricOperands)
     for (const Operand& outer : symmetric_and_diagonal()) {
       if (outer.shape == kSymmetricSparse && outer.state > SM_STATE_ORDERED) continue;  // 118
-      SCOPED_TRACE(name_of(operand) + " between " + name_of(outer));
-      const Known known_a = random_known(random, operand.shape, 5, 5);
-      const Known known_x = random_known(random, outer.shape, 5, 5);
-      SmMatrix* a = build(operand, known_a);
-      SmMatrix* x = build(outer, known_x);
-      expect_form(a, x, form_of_rows(known_a, known_x), false);
-      EXPECT_TRUE(same_entries(read(x), known_x));
-      EXPECT_EQ(x->state, outer.state);
-      destroy(a);
-      destroy(x);
+      expect_pair(middle, outer, 5, 5, random);
     }
 }
 

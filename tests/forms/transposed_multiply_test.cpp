@@ -120,7 +120,6 @@ TEST_P(TransposedMultiplyTest, kind_none_then_an_open_matrix_then_an_alias) {
   Output y(4);
   SmMatrix* none = new_untyped_with_an_entry(session(), SM_STATE_OPEN);
   EXPECT_EQ(qxsmvmult(y.data(), none, y.data(), 1, 0), SM_UNTYPED);
-  harmless(none);
   EXPECT_EQ(qxsmvmult(y.data(), sized(kSymmetricSparse, 4), y.data(), 1, 0), SM_NOT_CLOSED);
   std::vector<double> data(16, 1.0);
   for (const Shape shape : kDense) {

@@ -7,12 +7,8 @@ namespace {
 
 class UnusualRecordsTest : public FormsTest {
  protected:
-  // A record that was reset and has the array attached: it has no pool.
   SmMatrix* tied(std::vector<double>& data, std::int64_t rows, std::int64_t cols, Shape shape) {
-    SmMatrix* m = new_open_tied(session(), data, rows, cols, shape.kind, shape.format);
-    EXPECT_EQ(m->pool, nullptr);
-    EXPECT_EQ(fn().qxsmclose(m, kNan), SM_OK);
-    return m;
+    return new_tied(session(), shape, data, rows, cols);
   }
   static inline const Known kA = Known::full({{4.0, 1.0}, {1.0, 2.0}});
   static inline const Known kX = Known::full({{1.0, 0.0}, {1.0, 1.0}});

@@ -4,8 +4,6 @@
 namespace sm::test {
 namespace {
 
-constexpr Shape kGeneralShapes[] = {kGeneralSparse, kGeneralColumns, kGeneralRows};
-constexpr Shape kDiagonalShapes[] = {kDiagonalColumns, kDiagonalRows};
 constexpr double kScales[] = {1.0, -1.0, 2.5, -0.375};
 
 class AccumulationTest : public ModuleTest {
@@ -49,7 +47,7 @@ TEST_P(AccumulationTest, general_sparse_matrices_add_up_and_the_target_grows_to_
 
 TEST_P(AccumulationTest, a_general_target_grows_just_as_far_as_the_stored_entries) {
   SmMatrix* target = with(kGeneralSparse, from_rows({{1, 2}}));
-  SmMatrix* source = sized(session(), kGeneralSparse, 50, 50);
+  SmMatrix* source = new_sized(session(), kGeneralSparse, 50, 50);
   ASSERT_EQ(fn().qxsmassign(source, 40, 9, 0, 3.0), SM_OK);
   ASSERT_EQ(add(target, source, 0.5), SM_OK);
   EXPECT_EQ(target->rows, 41);
@@ -58,7 +56,7 @@ TEST_P(AccumulationTest, a_general_target_grows_just_as_far_as_the_stored_entrie
 }
 
 TEST_P(AccumulationTest, general_sparse_matrices_may_be_unsized_or_without_entries) {
-  SmMatrix* nothing = sized(session(), kGeneralSparse, 4, 4);
+  SmMatrix* nothing = new_sized(session(), kGeneralSparse, 4, 4);
   SmMatrix* some = with(kGeneralSparse, from_rows({{1, 0}, {0, 2}}));
   const Nonzeros two{{{0, 0}, 1.0}, {{1, 1}, 2.0}};
   EXPECT_EQ(add(some, nothing), SM_OK);
@@ -135,6 +133,22 @@ TEST_P(AccumulationTest, an_entry_below_the_diagonal_of_a_reordered_source_goes_
   SmMatrix* target = open(Dense(3, 3));
   ASSERT_EQ(add(target, source, 3.0), SM_OK);
   EXPECT_EQ(entries(target), (Nonzeros{{{0, 0}, 12.0}, {{1, 1}, 12.0}, {{2, 2}, 12.0}, {{1, 2}, 3.0}}));
+}
+
+// A count of entries that no matrix can exceed takes no new ones, while those that are there are still added to.
+TEST_P(AccumulationTest, an_entry_without_a_place_does_not_stop_the_others_and_the_last_answer_is_told) {
+  const Dense b = from_rows({{1, 7, 0}, {7, 2, 0}, {0, 0, 3}});
+  SmMatrix* target = open(from_diagonal({10, 20, 30}));
+  target->nnz = SM_MAX_ELEMENTS;
+  EXPECT_EQ(add(target, with(kSymmetricSparse, b), 1.0), SM_OK) << "the last one has its place";
+  target->nnz = 3;
+  EXPECT_EQ(entries(target), (Nonzeros{{{0, 0}, 11.0}, {{1, 1}, 22.0}, {{2, 2}, 33.0}}));
+  SmMatrix* grown = open(from_diagonal({10, 20}));
+  ASSERT_EQ(fn().qxsmassign(grown, 0, 2, 0, 5.0), SM_OK);  // row 2 comes in without a diagonal
+  grown->nnz = SM_MAX_ELEMENTS;
+  EXPECT_EQ(add(grown, with(kSymmetricSparse, b), 1.0), SM_TOO_LARGE) << "the last one has none";
+  grown->nnz = 3;
+  EXPECT_EQ(entries(grown), (Nonzeros{{{0, 0}, 11.0}, {{0, 2}, 5.0}, {{1, 1}, 22.0}}));
 }
 
 TEST_P(AccumulationTest, closing_the_source_drops_nothing) {
@@ -234,7 +248,7 @@ TEST_P(AccumulationTest, a_tied_target_is_changed_where_it_lies_and_never_freed)
   for (const Shape shape : kSquareFactored) {
     std::vector<double> data = laid_out(shape, from_rows({{4, 1}, {1, 9}}));
     const std::vector<double> before = data;
-    SmMatrix* target = build_tied(session(), shape, data, 2);
+    SmMatrix* target = new_tied(session(), shape, data, 2, 2);
     SmMatrix* source = with(shape, from_rows({{1, 2}, {2, 3}}));
     ASSERT_EQ(fn().qxsmfact(target, 0), SM_OK);
     ASSERT_EQ(add(target, source, 2.0), SM_OK);
@@ -254,8 +268,8 @@ TEST_P(AccumulationTest, refuses_a_target_that_nothing_is_added_to) {
   for (const Shape shape : kShapes) {
     SmMatrix* b = with(shape, five);
     EXPECT_EQ(refused(new_untyped(session()), b), SM_UNAVAILABLE) << name_of(shape);
-    UntypedRecord none(session());
-    EXPECT_EQ(refused(none.get(), b), SM_UNAVAILABLE);
+    SmMatrix* none = new_untyped_with_an_entry(session());
+    EXPECT_EQ(refused(none, b), SM_UNAVAILABLE);
     if (shape.kind != SM_KIND_GENERAL || !is_sparse(shape)) {
       EXPECT_EQ(refused(with(kGeneralSparse, five), b), SM_KIND_MISMATCH) << name_of(shape);
     }
@@ -305,7 +319,7 @@ TEST_P(AccumulationTest, refuses_a_symmetric_target_by_size_then_by_state_then_b
 
 TEST_P(AccumulationTest, operands_whose_values_could_not_be_had_answer_104) {
   for (const Shape shape : kSquareFactored) {
-    SmMatrix* missing = build_without_values(session(), shape, 2);
+    SmMatrix* missing = new_without_values(session(), shape, 2);
     SmMatrix* there = with(shape, from_diagonal({1, 2}));
     EXPECT_EQ(refused(there, missing), SM_BAD_ARGUMENT) << name_of(shape);
     EXPECT_EQ(refused(missing, there), SM_BAD_ARGUMENT) << name_of(shape);

@@ -5,8 +5,6 @@ namespace sm::test {
 namespace {
 
 using Index = std::int64_t;
-constexpr Shape kSymmetric[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows};
-constexpr Shape kDiagonalShapes[] = {kDiagonalColumns, kDiagonalRows};
 
 class AdditionRefusalsTest : public ModuleTest {
  protected:
@@ -36,11 +34,11 @@ const Dense kTwo = from_diagonal({1, 2});
 TEST_P(AdditionRefusalsTest, an_empty_target_is_done_before_any_check) {
   SmMatrix* b = with(kGeneralRows, kTwo);
   for (const Shape shape : kShapes) {
-    SmMatrix* empty = sized(session(), shape, 0, 0);
+    SmMatrix* empty = new_sized(session(), shape, 0, 0);
     EXPECT_EQ(refused(empty, b, -1, b), SM_OK) << name_of(shape);
     EXPECT_EQ(refused(empty, empty, -1, empty), SM_OK);
   }
-  SmMatrix* unfilled = sized(session(), kGeneralSparse, 4, 4);
+  SmMatrix* unfilled = new_sized(session(), kGeneralSparse, 4, 4);
   EXPECT_EQ(refused(unfilled, with(kGeneralSparse, kTwo)), SM_OK) << "a general matrix without entries takes none";
   SmMatrix* none = new_untyped(session());
   EXPECT_EQ(refused(none, none, -1, none), SM_OK);
@@ -88,8 +86,8 @@ TEST_P(AdditionRefusalsTest, kinds_that_do_not_pair_answer_124) {
     const SmStatus none_as_addend = refused(target(g_shape, kTwo), new_untyped(session()));
     EXPECT_EQ(none_as_addend, g_shape.kind == SM_KIND_SYMMETRIC ? SM_DIMENSION_MISMATCH : SM_UNAVAILABLE);
   }
-  UntypedRecord none(session());
-  EXPECT_EQ(refused(none.get(), with(kDiagonalRows, kTwo), -1), SM_UNAVAILABLE);
+  SmMatrix* none = new_untyped_with_an_entry(session());
+  EXPECT_EQ(refused(none, with(kDiagonalRows, kTwo), -1), SM_UNAVAILABLE);
 }
 
 TEST_P(AdditionRefusalsTest, a_negative_offset_answers_104_before_the_order_and_the_states) {
@@ -98,7 +96,7 @@ TEST_P(AdditionRefusalsTest, a_negative_offset_answers_104_before_the_order_and_
     for (const Shape g_shape : kDiagonalShapes) {
       EXPECT_EQ(refused(with(g_shape, kTwo), with(g_shape, kTwo), off), SM_BAD_ARGUMENT);
     }
-    for (const Shape g_shape : kSymmetric) {
+    for (const Shape g_shape : kSymmetricShapes) {
       EXPECT_EQ(refused(with(g_shape, kTwo), open(from_diagonal({1, 2, 3})), off), SM_BAD_ARGUMENT) << name_of(g_shape);
     }
   }
@@ -115,7 +113,7 @@ TEST_P(AdditionRefusalsTest, a_diagonal_block_outside_the_target_answers_104) {
 
 TEST_P(AdditionRefusalsTest, another_order_than_that_of_the_block_answers_121_before_the_states) {
   const Dense three = from_diagonal({1, 2, 3});
-  for (const Shape g_shape : kSymmetric)
+  for (const Shape g_shape : kSymmetricShapes)
     for (const Shape b_shape : {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalColumns, kDiagonalRows})
       for (const Index off : {Index{0}, Index{2}, Index{3}, Index{4}, kHuge}) {
         SmMatrix* p = with(kGeneralRows, kTwo);
@@ -136,11 +134,17 @@ TEST_P(AdditionRefusalsTest, a_closed_sparse_target_answers_119_before_an_open_a
 }
 
 TEST_P(AdditionRefusalsTest, an_open_addend_answers_113_before_p_is_sized) {
-  for (const Shape g_shape : kSymmetric) {
+  for (const Shape g_shape : kSymmetricShapes) {
     SCOPED_TRACE(name_of(g_shape));
     SmMatrix* p = with(kGeneralRows, kTwo);
     EXPECT_EQ(refused(target(g_shape, kTwo), open(kTwo), 0, p), SM_NOT_CLOSED);
     EXPECT_EQ(refused(target(g_shape, kTwo), open(kTwo), 0, new_untyped(session())), SM_NOT_CLOSED);
+  }
+  for (const Shape g_shape : kSymmetricShapes) {  // one of order 0 behind the end of G
+    EXPECT_EQ(refused(target(g_shape, kTwo), open(Dense(0, 0)), 2), SM_NOT_CLOSED) << name_of(g_shape);
+    SmMatrix* closed = open(Dense(0, 0));
+    ASSERT_EQ(fn().qxsmclose(closed, 0.0), SM_OK);
+    EXPECT_EQ(refused(target(g_shape, kTwo), closed, 2), SM_OK) << name_of(g_shape);
   }
   std::vector<double> data{1, 0, 2};
   SmMatrix* packed = new_open_tied(session(), data, 2, 2, SM_KIND_SYMMETRIC, SM_FORMAT_ROWS);
@@ -148,18 +152,18 @@ TEST_P(AdditionRefusalsTest, an_open_addend_answers_113_before_p_is_sized) {
 }
 
 TEST_P(AdditionRefusalsTest, a_p_that_cannot_be_sized_or_written_leaves_g_as_it_was) {
-  for (const Shape g_shape : kSymmetric) {
+  for (const Shape g_shape : kSymmetricShapes) {
     SCOPED_TRACE(name_of(g_shape));
     SmMatrix* g = target(g_shape, from_rows({{1, 3}, {3, 2}}));
     EXPECT_EQ(refused(g, with(kDiagonalRows, kTwo), 0, new_untyped(session())), SM_UNTYPED);
     const Snapshot before = snapshot(g);
-    SmMatrix* diagonal = sized(session(), kDiagonalRows, 2, 2);
+    SmMatrix* diagonal = new_sized(session(), kDiagonalRows, 2, 2);
     EXPECT_EQ(qxsmAddGinv(g, with(kDiagonalRows, kTwo), diagonal, 0, 2.0, 0.0), SM_BAD_ARGUMENT);
     EXPECT_TRUE(snapshot(g) == before);
   }
   SmMatrix* g = with(kDiagonalRows, from_diagonal({1, 2, 3}));
   const Snapshot before = snapshot(g);
-  SmMatrix* small = sized(session(), kDiagonalRows, 1, 1);
+  SmMatrix* small = new_sized(session(), kDiagonalRows, 1, 1);
   EXPECT_EQ(qxsmAddGinv(g, with(kDiagonalRows, kTwo), small, 1, 2.0, 0.0), SM_BAD_ARGUMENT);
   EXPECT_TRUE(snapshot(g) == before);
 }
@@ -179,7 +183,7 @@ TEST_P(AdditionRefusalsTest, an_addend_whose_values_could_not_be_had_changes_not
     for (const Shape g_shape : {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalRows}) {
       if (g_shape.kind == SM_KIND_DIAGONAL && b_shape.kind != SM_KIND_DIAGONAL) continue;
       SmMatrix* g = target(g_shape, kTwo);
-      SmMatrix* b = build_without_values(session(), b_shape, 2);
+      SmMatrix* b = new_without_values(session(), b_shape, 2);
       const Dense before = contents(g);
       qxsmAddGinv(g, b, nullptr, 0, 2.0, 0.0);
       EXPECT_TRUE(near(contents(g), before, 0.0)) << name_of(g_shape) << ", " << name_of(b_shape);

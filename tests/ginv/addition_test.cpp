@@ -6,7 +6,6 @@ namespace {
 
 using Index = std::int64_t;
 constexpr double kScales[] = {1.0, -2.5, 0.375};
-constexpr Shape kDiagonalShapes[] = {kDiagonalColumns, kDiagonalRows};
 // What may be added to a symmetric matrix.
 constexpr Shape kAddends[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalColumns, kDiagonalRows};
 
@@ -92,13 +91,13 @@ TEST_P(AdditionTest, a_diagonal_block_is_added_and_the_old_elements_saved) {
 TEST_P(AdditionTest, the_old_diagonal_may_be_saved_into_any_matrix_that_has_the_places) {
   for (const Shape shape : kShapes) {
     if (shape.kind == SM_KIND_SYMMETRIC && is_sparse(shape)) continue;
-    SmMatrix* p = sized(session(), shape, 3, 3);
+    SmMatrix* p = new_sized(session(), shape, 3, 3);
     ASSERT_EQ(
         add(with(kDiagonalRows, from_diagonal({1, 2, 3})), with(kDiagonalRows, from_diagonal({5, 5})), 1, 1.0, 0.0, p),
         SM_OK);
     EXPECT_TRUE(near(contents(p), from_diagonal({2, 3, 0}), 0.0)) << name_of(shape);
   }
-  SmMatrix* p = sized(session(), kSymmetricSparse, 2, 2);
+  SmMatrix* p = new_sized(session(), kSymmetricSparse, 2, 2);
   ASSERT_EQ(add(with(kDiagonalRows, from_diagonal({1, 2})), with(kDiagonalRows, from_diagonal({5, 5})), 0, 1.0, 0.0, p),
             SM_OK);
   EXPECT_EQ(entries(p), (Nonzeros{{{0, 0}, 1.0}, {{1, 1}, 2.0}}));
@@ -116,7 +115,7 @@ TEST_P(AdditionTest, a_packed_target_takes_every_symmetric_and_diagonal_addend) 
           SmMatrix* target = with(g_shape, g);
           SmMatrix* source = with(b_shape, b);
           const Snapshot before = snapshot(source);
-          SmMatrix* p = sized(session(), kGeneralRows, 2, 3);
+          SmMatrix* p = new_sized(session(), kGeneralRows, 2, 3);
           ASSERT_EQ(add(target, source, off, s, 0.0, p), SM_OK);
           const Dense want = added(g, b, off, s, b_shape.kind == SM_KIND_DIAGONAL);
           EXPECT_TRUE(near(contents(target), want, 0.0)) << name_of(g_shape) << ", " << name_of(b_shape) << ' ' << off;
@@ -135,7 +134,7 @@ TEST_P(AdditionTest, an_open_sparse_target_takes_every_symmetric_and_diagonal_ad
         const Dense b = random_symmetric(random, 5 - off, 50);
         SmMatrix* target = open(g);
         SmMatrix* source = with(b_shape, b);
-        SmMatrix* p = sized(session(), kSymmetricRows, 1, 1);
+        SmMatrix* p = new_sized(session(), kSymmetricRows, 1, 1);
         ASSERT_EQ(add(target, source, off, s, 0.0, p), SM_OK);
         const Dense want = added(g, b, off, s, b_shape.kind == SM_KIND_DIAGONAL);
         EXPECT_TRUE(near(contents(target), want, 0.0)) << name_of(b_shape) << ' ' << off;
@@ -168,7 +167,7 @@ TEST_P(AdditionTest, the_old_block_may_be_saved_into_every_shape_that_holds_a_tr
          {kGeneralSparse, kGeneralColumns, kGeneralRows, kSymmetricSparse, kSymmetricColumns, kSymmetricRows})
       for (const Index off : {0, 2}) {
         SmMatrix* target = is_sparse(g_shape) ? open(g) : with(g_shape, g);
-        SmMatrix* p = sized(session(), p_shape, 1, 1);
+        SmMatrix* p = new_sized(session(), p_shape, 1, 1);
         ASSERT_EQ(
             add(target, with(kDiagonalRows, from_diagonal(std::vector<double>(at(5 - off), 1.0))), off, 1.0, 0.0, p),
             SM_OK);
@@ -229,11 +228,31 @@ TEST_P(AdditionTest, a_tolerance_zeroes_general_and_diagonal_blocks_too) {
     }
 }
 
+TEST_P(AdditionTest, what_the_tolerance_changes_costs_the_factor_even_when_nothing_is_added) {
+  const Dense g = from_rows({{4, 1e-9}, {1e-9, 9}});
+  for (const Shape shape : kPacked)
+    for (const double tolerance : {1e-8, 1e-10}) {
+      SmMatrix* target = with(shape, g);
+      ASSERT_EQ(fn().qxsmfact(target, 0), SM_OK);
+      SmMatrix* nothing = new_without_values(session(), shape, 2);
+      ASSERT_EQ(add(target, nothing, 0, 1.0, tolerance), SM_OK);
+      if (tolerance < 1e-9) {
+        EXPECT_EQ(target->state, SM_STATE_FACTORED) << "nothing is so small";
+        EXPECT_EQ(target->rank, 2);
+        continue;
+      }
+      EXPECT_TRUE(near(contents(target), from_diagonal({4, 9}), 0.0)) << name_of(shape);
+      EXPECT_EQ(target->state, SM_STATE_CLOSED);
+      EXPECT_EQ(target->dense_factor, nullptr);
+      expect_voided(target);
+    }
+}
+
 TEST_P(AdditionTest, the_tolerance_is_applied_to_the_sum) {
   for (const Shape shape : {kSymmetricSparse, kSymmetricColumns, kSymmetricRows}) {
     const Dense g = from_rows({{1, 2}, {2, 3}});
     SmMatrix* target = is_sparse(shape) ? open(g) : with(shape, g);
-    SmMatrix* p = sized(session(), kSymmetricRows, 1, 1);
+    SmMatrix* p = new_sized(session(), kSymmetricRows, 1, 1);
     ASSERT_EQ(add(target, with(kSymmetricRows, from_rows({{1, 2}, {2, 2.5}})), 0, -1.0, 0.5, p), SM_OK);
     EXPECT_TRUE(near(contents(target), Dense(2, 2), 0.0)) << "0, 0 and exactly the tolerance";
     EXPECT_TRUE(near(contents(p), g, 0.0));
@@ -284,7 +303,7 @@ TEST_P(AdditionTest, a_tied_target_is_changed_where_it_lies_and_never_freed) {
   for (const Shape shape : kSquareFactored)
     for (const bool closed : {true, false}) {
       std::vector<double> data = laid_out(shape, from_diagonal({4, 9}));
-      SmMatrix* g = closed ? build_tied(session(), shape, data, 2)
+      SmMatrix* g = closed ? new_tied(session(), shape, data, 2, 2)
                            : new_open_tied(session(), data, 2, 2, shape.kind, shape.format);
       if (closed) {
         ASSERT_EQ(fn().qxsmfact(g, 0), SM_OK);

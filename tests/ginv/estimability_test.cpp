@@ -7,7 +7,6 @@ namespace sm::test {
 namespace {
 
 using Flags = std::vector<std::int32_t>;
-constexpr Shape kSymmetric[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows};
 constexpr double kTolerance = 1e-8;
 
 struct Check {
@@ -74,7 +73,7 @@ TEST_P(EstimabilityTest, tells_the_vectors_of_the_row_space_from_others) {
       want.push_back(spanned(problem.a, one) ? 0 : 1);
       x.insert(x.end(), one.begin(), one.end());
     }
-    for (const Shape shape : kSymmetric) {
+    for (const Shape shape : kSymmetricShapes) {
       SCOPED_TRACE(problem.name + ' ' + name_of(shape));
       SmMatrix* m = build(session(), shape, problem.a);
       for (int again = 0; again < 2; ++again) {
@@ -118,7 +117,7 @@ TEST_P(EstimabilityTest, answers_the_status_of_the_solve_when_nothing_can_be_sol
     ASSERT_EQ(fn().qxsminv(in_place, 1, kNan), SM_OK);
     expect_unchecked(in_place, SM_NO_FACTOR);
   }
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     SmMatrix* indefinite = build(session(), shape, from_rows({{4, 1}, {1, -3}}));
     expect_unchecked(indefinite, SM_NOT_DEFINITE);
   }
@@ -176,7 +175,7 @@ TEST_P(EstimabilityTest, a_vector_of_zeros_always_passes) {
   SmMatrix* h = build(session(), kGeneralSparse, random_dense(random, 3, 3));
   const std::vector<double> zeros(3, 0.0);
   for (const double tolerance : {0.0, 1e-8, 5.0}) EXPECT_TRUE(reproduced(h, zeros, tolerance));
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     for (const Dense& a : {from_diagonal({1, 2, 4}), from_diagonal({0, 0, 0})}) {
       EXPECT_EQ(check(build(session(), shape, a), zeros, 1, 'G', 0.0).failed, 0) << name_of(shape);
     }
@@ -200,7 +199,7 @@ TEST_P(EstimabilityTest, a_nan_in_a_comparison_fails_the_vector) {
   ASSERT_EQ(fn().qxsmassign(broken, 1, 0, 0, kNan), SM_OK);
   EXPECT_FALSE(reproduced(broken, {1, 2}, huge)) << "a NaN in the form";
   EXPECT_TRUE(reproduced(broken, {1, 0}, 0.0)) << "a row that meets a 0 is not looked at";
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     const Check c = check(build(session(), shape, from_diagonal({1, 2})), {kNan, 1, 1, 1}, 2);
     EXPECT_EQ(c.flags, (Flags{1, 0})) << name_of(shape);
     EXPECT_EQ(c.failed, 1);
@@ -232,12 +231,12 @@ TEST_P(EstimabilityTest, what_cannot_be_checked_stays_failed_without_a_complaint
 TEST_P(EstimabilityTest, everything_counts_as_failed_before_any_check) {
   expect_unchecked(new_untyped(session()), SM_OK);
   expect_unchecked(build_open(session(), Dense(0, 0)), SM_OK);
-  expect_unchecked(sized(session(), kGeneralSparse, 2, 3), SM_OK);  // empty before the shape
-  UntypedRecord none(session());
-  expect_unchecked(none.get(), SM_NOT_CLOSED);
-  none.get()->state = SM_STATE_CLOSED;
-  expect_unchecked(none.get(), SM_NOT_CLOSED);
-  none.get()->state = SM_STATE_OPEN;
+  expect_unchecked(new_sized(session(), kGeneralSparse, 2, 3), SM_OK);  // empty before the shape
+  SmMatrix* none = new_untyped_with_an_entry(session());
+  expect_unchecked(none, SM_NOT_CLOSED);
+  none->state = SM_STATE_CLOSED;
+  expect_unchecked(none, SM_NOT_CLOSED);
+  none->state = SM_STATE_OPEN;
   for (const char mode : {'G', 'H'}) {
     expect_unchecked(build_open(session(), from_diagonal({1, 1})), SM_NOT_CLOSED, mode);
     std::vector<double> data(6, 1.0);

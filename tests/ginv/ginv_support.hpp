@@ -1,5 +1,5 @@
-// Matrices of every shape from dense ones, read back without the module, and the generalized inverse that they are held
-// against.
+// What a refused call must leave, the generalized inverse that results are held against, and a loop of refused
+// requests.
 #pragma once
 
 #include <cmath>
@@ -7,42 +7,14 @@
 #include <vector>
 
 #include "cholesky/cholesky_support.hpp"
-#include "store/store_test.hpp"
+#include "support/matrices.hpp"
+#include "support/output.hpp"
 
 namespace sm::test {
 
-// What the settings of a new instance hold: the singularity tolerance, and the one below which nothing is stored.
+// The singularity tolerance that a new instance has.
 constexpr double kSingular = 1.110223024625157e-12;
-constexpr double kUntouched = -777.0;
 
-Dense from_rows(const std::vector<std::vector<double>>& rows);
-Dense from_diagonal(const std::vector<double>& d);
-// Multiples of 1/64, about `percent` of them stored; symmetric ones have a full diagonal.
-Dense random_dense(Random& random, std::int64_t rows, std::int64_t cols, std::int64_t percent = 100);
-Dense random_symmetric(Random& random, std::int64_t n, std::int64_t percent = 100);
-Problem problem_from(const Dense& symmetric);
-// Row and column `from` and what follows.
-Dense trailing(const Dense& a, std::int64_t from);
-Dense scaled(const Dense& a, long double s);
-Dense sum(const Dense& a, const Dense& b);
-
-// A new matrix with the elements of `a` that the shape stores; closed. Zeros are not entered into a sparse one.
-SmMatrix* build(Session& session, Shape shape, const Dense& a);
-// Symmetric sparse, taking entries.
-SmMatrix* build_open(Session& session, const Dense& a);
-// A reset record with the array tied to it, closed: it has no pool until an operation needs one.
-SmMatrix* build_tied(Session& session, Shape shape, std::vector<double>& data, std::int64_t n);
-// The values of the shape's layout.
-std::vector<double> laid_out(Shape shape, const Dense& a);
-SmMatrix* sized(Session& session, Shape shape, std::int64_t rows, std::int64_t cols);
-// A value array that could not be had: rows and cols are n, values null.
-SmMatrix* build_without_values(Session& session, Shape shape, std::int64_t n);
-
-Shape shape_of(const SmMatrix* matrix);
-// What is stored, in whatever state; both triangles of a symmetric matrix. An array may take the place of the values.
-Dense contents(SmMatrix* matrix, const double* values = nullptr);
-// The stored entries of a sparse matrix, upper triangle first index first, whatever order the rows are in.
-Nonzeros entries(SmMatrix* matrix);
 // Numbers to the bit, kind and format, sizes, state, results and arrays: what a refused call must leave.
 struct Snapshot {
   std::vector<std::uint64_t> words;
@@ -69,19 +41,6 @@ struct Named {
 };
 std::vector<Named> semidefinite_problems();
 
-// A record of kind none that says it holds something, which no operation leaves: it shows where the kind is looked at.
-class UntypedRecord {
- public:
-  explicit UntypedRecord(Session& session) : matrix_(new_untyped(session)) { matrix_->nnz = 1; }
-  ~UntypedRecord() { matrix_->nnz = 0; }
-  UntypedRecord(const UntypedRecord&) = delete;
-  UntypedRecord& operator=(const UntypedRecord&) = delete;
-  SmMatrix* get() { return matrix_; }
-
- private:
-  SmMatrix* matrix_;
-};
-
 // Refuses every request of run(session, problem) in turn, once and then from there on. After a refusal
 // `refused(status)` must hold, and the answer be right when it is SM_OK all the same. The same call made again must
 // succeed, answer the same and leave as many blocks as an untroubled one, `spare` aside. Answers how many requests
@@ -93,33 +52,16 @@ std::int64_t survives(HostKind kind, Prepare prepare, Run run, Answer answer, Re
   EXPECT_EQ(run(calm, untroubled), SM_OK);
   const auto want = answer(untroubled);
   const std::int64_t blocks = calm.host().live_blocks();
-  std::int64_t requests = 0;
-  for (const bool for_ever : {false, true})
-    for (std::int64_t k = 0; k < 1000; ++k) {
-      SCOPED_TRACE("request " + std::to_string(k) + (for_ever ? " and on" : ""));
-      Session session(kind);
-      auto problem = prepare(session);
-      session.host().fail_request(k, for_ever);
-      const SmStatus status = run(session, problem);
-      const bool met = session.host().stop_failing() > 0;
-      requests = k;
-      if (!met) {
-        EXPECT_EQ(status, SM_OK);
-        break;
-      }
-      EXPECT_TRUE(refused(status)) << "status " << status;
-      if (status == SM_OK) {
-        EXPECT_EQ(answer(problem), want);
-      }
-      EXPECT_EQ(run(session, problem), SM_OK);
+  return refuse_each_request(kind, prepare, run, [&](Session& session, auto& problem, SmStatus status, std::int64_t) {
+    EXPECT_TRUE(refused(status)) << "status " << status;
+    if (status == SM_OK) {
       EXPECT_EQ(answer(problem), want);
-      EXPECT_GE(session.host().live_blocks(), blocks);
-      EXPECT_LE(session.host().live_blocks(), blocks + spare);
-      session.close();
-      EXPECT_EQ(session.host().live_pools(), 0);
-      EXPECT_EQ(session.host().violations(), 0);
     }
-  return requests;
+    EXPECT_EQ(run(session, problem), SM_OK);
+    EXPECT_EQ(answer(problem), want);
+    EXPECT_GE(session.host().live_blocks(), blocks);
+    EXPECT_LE(session.host().live_blocks(), blocks + spare);
+  });
 }
 
 inline bool is_no_memory(SmStatus status) { return status == SM_NO_MEMORY; }

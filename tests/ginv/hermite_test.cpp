@@ -4,10 +4,6 @@
 namespace sm::test {
 namespace {
 
-constexpr Shape kGeneralShapes[] = {kGeneralSparse, kGeneralColumns, kGeneralRows};
-constexpr Shape kDiagonalShapes[] = {kDiagonalColumns, kDiagonalRows};
-constexpr Shape kSymmetric[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows};
-
 class HermiteTest : public ModuleTest {
  protected:
   SmMatrix* with(Shape shape, const Dense& a) { return build(session(), shape, a); }
@@ -69,7 +65,7 @@ TEST_P(HermiteTest, of_a_sparse_matrix_is_the_product_with_its_generalized_inver
 TEST_P(HermiteTest, of_a_definite_matrix_is_the_identity) {
   Random random(92);
   const Dense a = positive_definite(grid(3, 3), random).dense();
-  for (const Shape shape : kSymmetric)
+  for (const Shape shape : kSymmetricShapes)
     for (const Shape h_shape : kGeneralShapes) {
       SmMatrix* h = result(h_shape);
       ASSERT_EQ(hermite(with(shape, a), h), SM_OK);
@@ -147,7 +143,7 @@ TEST_P(HermiteTest, vectors_are_estimable_by_the_form_as_by_the_matrix) {
     if (v % 2) one = product(a, one);
     x.insert(x.end(), one.begin(), one.end());
   }
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     SmMatrix* m = with(shape, a);
     std::vector<std::int32_t> by_matrix(8);
     std::vector<std::int32_t> by_form(8);
@@ -192,13 +188,27 @@ TEST_P(HermiteTest, work_does_not_outlive_the_call) {
   }
 }
 
+TEST_P(HermiteTest, a_result_that_memory_is_wanting_for_is_not_passed_off_as_one) {
+  for (const Shape shape : {kSymmetricSparse, kDiagonalRows})
+    for (const Shape h_shape : kGeneralShapes) {
+      SmMatrix* a = with(shape, from_diagonal({4, 9}));
+      ASSERT_EQ(fn().qxsmfact(a, 0), SM_OK);
+      SmMatrix* h = new_typed(session(), h_shape);
+      host().fail_request(0, false);  // the sizing
+      EXPECT_EQ(hermite(a, h), SM_NO_MEMORY) << name_of(shape) << " into " << name_of(h_shape);
+      EXPECT_EQ(host().stop_failing(), 1);
+      ASSERT_EQ(hermite(a, h), SM_OK);
+      EXPECT_TRUE(near(contents(h), identity(2), 1e-15));
+    }
+}
+
 TEST_P(HermiteTest, its_checks_come_in_order) {
   SmMatrix* h = result(kGeneralRows);
   EXPECT_EQ(refused(new_untyped(session()), h), SM_OK);
   SmMatrix* empty = build_open(session(), Dense(0, 0));
   EXPECT_EQ(refused(empty, empty), SM_OK);  // empty before open and the same handle
-  UntypedRecord none(session());
-  EXPECT_EQ(refused(none.get(), none.get()), SM_UNTYPED);  // the kind before the state
+  SmMatrix* none = new_untyped_with_an_entry(session());
+  EXPECT_EQ(refused(none, none), SM_UNTYPED);  // the kind before the state
   SmMatrix* open = build_open(session(), from_diagonal({1}));
   EXPECT_EQ(refused(open, open), SM_NOT_CLOSED);  // the state before the same handle
   SmMatrix* wide = with(kGeneralRows, from_rows({{1, 2, 3}, {4, 5, 6}}));
@@ -243,7 +253,7 @@ TEST_P(HermiteTest, of_a_general_matrix_answers_124_with_the_result_sized) {
 }
 
 TEST_P(HermiteTest, an_indefinite_matrix_answers_as_factoring_and_inverting_do) {
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     SmMatrix* a = with(shape, from_rows({{4, 1}, {1, -3}}));
     EXPECT_EQ(hermite(a, result(kGeneralRows)), SM_NOT_DEFINITE) << name_of(shape);
   }

@@ -169,7 +169,7 @@ TEST_P(InversionStatesTest, a_tied_array_is_let_go_and_never_freed) {
     for (const bool factor_first : {false, true}) {
       SCOPED_TRACE(name_of(shape) + (factor_first ? " factored" : ""));
       std::vector<double> data = given;
-      SmMatrix* m = build_tied(session(), shape, data, 4);
+      SmMatrix* m = new_tied(session(), shape, data, 4, 4);
       if (factor_first) {
         ASSERT_EQ(fn().qxsmfact(m, 0), SM_OK);
       } else {
@@ -186,13 +186,13 @@ TEST_P(InversionStatesTest, a_tied_array_is_let_go_and_never_freed) {
       EXPECT_EQ(fn().qxsmresize(m, 3, 3), SM_OK) << "and goes back like any other";
     }
     std::vector<double> data = given;
-    SmMatrix* m = build_tied(session(), shape, data, 4);
+    SmMatrix* m = new_tied(session(), shape, data, 4, 4);
     ASSERT_EQ(invert(m, kInPlace), SM_OK);
     EXPECT_EQ(m->values, data.data()) << "inverted where it lies";
     EXPECT_EQ(m->owns_values, 0);
     expect_inverse(m, data.data());
     std::vector<double> factor = given;
-    SmMatrix* factored_in_place = build_tied(session(), shape, factor, 4);
+    SmMatrix* factored_in_place = new_tied(session(), shape, factor, 4, 4);
     ASSERT_EQ(fn().qxsmfact(factored_in_place, 1), SM_OK);
     ASSERT_EQ(invert(factored_in_place, kInPlace), SM_OK);
     expect_inverse(factored_in_place, factor.data());

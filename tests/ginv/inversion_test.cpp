@@ -6,7 +6,6 @@ namespace {
 
 constexpr std::int16_t kApart = 0;
 constexpr std::int16_t kInPlace = 1;
-constexpr Shape kDiagonalShapes[] = {kDiagonalColumns, kDiagonalRows};
 
 class InversionTest : public ModuleTest {
  protected:
@@ -155,9 +154,9 @@ TEST_P(InversionTest, its_checks_come_in_order) {
   for (const std::int16_t in_place : {kApart, kInPlace}) {
     EXPECT_EQ(refused(new_untyped(session()), in_place), SM_OK);
     EXPECT_EQ(refused(build_open(session(), Dense(0, 0)), in_place), SM_OK);  // empty before open
-    EXPECT_EQ(refused(sized(session(), kGeneralSparse, 2, 3), in_place), SM_OK);
-    UntypedRecord none(session());
-    EXPECT_EQ(refused(none.get(), in_place), SM_UNTYPED);  // the kind before the state
+    EXPECT_EQ(refused(new_sized(session(), kGeneralSparse, 2, 3), in_place), SM_OK);
+    SmMatrix* none = new_untyped_with_an_entry(session());
+    EXPECT_EQ(refused(none, in_place), SM_UNTYPED);  // the kind before the state
     std::vector<double> data(6, 1.0);
     EXPECT_EQ(refused(new_open_tied(session(), data, 2, 3, SM_KIND_GENERAL, SM_FORMAT_ROWS), in_place),
               SM_NOT_CLOSED);  // the state before the shape

@@ -243,9 +243,9 @@ TEST_P(OrthogonalTest, a_matrix_without_small_roots_keeps_its_count_through_many
 TEST_P(OrthogonalTest, its_checks_come_in_order) {
   EXPECT_EQ(refused(new_untyped(session())), SM_OK);
   EXPECT_EQ(refused(build_open(session(), Dense(0, 0))), SM_OK);  // empty before open
-  EXPECT_EQ(refused(sized(session(), kGeneralSparse, 2, 3)), SM_OK);
-  UntypedRecord none(session());
-  EXPECT_EQ(refused(none.get()), SM_UNTYPED);  // the kind before the state
+  EXPECT_EQ(refused(new_sized(session(), kGeneralSparse, 2, 3)), SM_OK);
+  SmMatrix* none = new_untyped_with_an_entry(session());
+  EXPECT_EQ(refused(none), SM_UNTYPED);  // the kind before the state
   std::vector<double> data(6, 1.0);
   EXPECT_EQ(refused(new_open_tied(session(), data, 2, 3, SM_KIND_GENERAL, SM_FORMAT_ROWS)),
             SM_NOT_CLOSED);  // the state before the shape

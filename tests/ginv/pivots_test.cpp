@@ -117,9 +117,9 @@ TEST_P(PivotsTest, a_pivot_that_is_not_above_0_is_told_as_0) {
 TEST_P(PivotsTest, its_checks_come_in_order) {
   EXPECT_EQ(untouched(new_untyped(session())), SM_OK);
   EXPECT_EQ(untouched(build_open(session(), Dense(0, 0))), SM_OK);  // empty before open
-  EXPECT_EQ(untouched(sized(session(), kGeneralSparse, 2, 3)), SM_OK);
-  UntypedRecord none(session());
-  EXPECT_EQ(untouched(none.get()), SM_UNTYPED);  // the kind before the state
+  EXPECT_EQ(untouched(new_sized(session(), kGeneralSparse, 2, 3)), SM_OK);
+  SmMatrix* none = new_untyped_with_an_entry(session());
+  EXPECT_EQ(untouched(none), SM_UNTYPED);  // the kind before the state
   std::vector<double> data(6, 1.0);
   EXPECT_EQ(untouched(new_open_tied(session(), data, 2, 3, SM_KIND_GENERAL, SM_FORMAT_ROWS)),
             SM_NOT_CLOSED);  // the state before the shape

@@ -260,6 +260,23 @@ TEST_P(UpdateTest, packed_offsets_far_outside_write_nothing) {
       }
 }
 
+TEST_P(UpdateTest, operands_whose_values_could_not_be_had_give_a_packed_g_nothing_and_a_sparse_one_zeros) {
+  const Dense g = from_rows({{7, 8}, {8, 9}});
+  const Dense a = from_rows({{1, 2}, {2, 3}});
+  for (const Shape shape : kPacked) {
+    for (const bool of_a : {true, false}) {
+      SmMatrix* missing = new_without_values(session(), shape, 2);
+      SmMatrix* there = with(shape, a);
+      SmMatrix* target = with(shape, g);
+      EXPECT_EQ(update(target, of_a ? missing : there, of_a ? there : missing), SM_OK) << name_of(shape) << of_a;
+      EXPECT_TRUE(near(contents(target), g, 0.0)) << name_of(shape) << of_a;
+    }
+    SmMatrix* sparse = with(kSymmetricSparse, g);
+    EXPECT_EQ(update(sparse, new_without_values(session(), shape, 2), with(kSymmetricSparse, a)), SM_OK);
+    EXPECT_TRUE(near(contents(sparse), a, 0.0)) << name_of(shape);
+  }
+}
+
 TEST_P(UpdateTest, a_changed_packed_target_loses_its_separate_array_rank_and_log_determinant) {
   const Dense g = from_rows({{4, 0}, {0, 9}});
   const Dense one = from_diagonal({1, 1});
@@ -294,7 +311,7 @@ TEST_P(UpdateTest, an_empty_a_writes_nothing_and_lowers_the_state_all_the_same) 
   for (const Shape shape : {kSymmetricSparse, kSymmetricColumns, kSymmetricRows}) {
     SmMatrix* g = with(shape, from_diagonal({4, 9}));
     ASSERT_EQ(fn().qxsmfact(g, 0), SM_OK);
-    SmMatrix* empty = sized(session(), shape, 0, 0);
+    SmMatrix* empty = new_sized(session(), shape, 0, 0);
     ASSERT_EQ(update(g, empty, with(shape, from_diagonal({1, 1}))), SM_OK);
     EXPECT_EQ(g->state, SM_STATE_SYMBOLIC) << name_of(shape);
     EXPECT_TRUE(near(contents(g), from_diagonal({4, 9}), 0.0));
@@ -318,7 +335,7 @@ TEST_P(UpdateTest, a_tied_target_is_changed_where_it_lies_and_never_freed) {
   const Dense a = from_rows({{1, 2}, {2, 3}});
   for (const Shape shape : kPacked) {
     std::vector<double> data = laid_out(shape, from_rows({{4, 1}, {1, 9}}));
-    SmMatrix* g = build_tied(session(), shape, data, 2);
+    SmMatrix* g = new_tied(session(), shape, data, 2, 2);
     ASSERT_EQ(fn().qxsmfact(g, 0), SM_OK);
     ASSERT_EQ(update(g, with(shape, a), with(shape, a), 0, 0, 2.0), SM_OK);
     EXPECT_EQ(data, laid_out(shape, scaled(a, 3.0L)));
@@ -335,8 +352,8 @@ TEST_P(UpdateTest, its_checks_come_in_order) {
   SmMatrix* open = build_open(session(), one);
   EXPECT_EQ(refused(open, open, general), SM_NOT_CLOSED);  // open before the same handle
   EXPECT_EQ(refused(open, general, open), SM_NOT_CLOSED);
-  UntypedRecord none(session());
-  EXPECT_EQ(refused(none.get(), general, general), SM_NOT_CLOSED);
+  SmMatrix* none = new_untyped_with_an_entry(session());
+  EXPECT_EQ(refused(none, general, general), SM_NOT_CLOSED);
   SmMatrix* diagonal = with(kDiagonalRows, one);
   EXPECT_EQ(refused(diagonal, diagonal, general), SM_BAD_ARGUMENT);  // the same handle before the kinds
   EXPECT_EQ(refused(diagonal, general, diagonal), SM_BAD_ARGUMENT);

@@ -6,8 +6,6 @@
 namespace sm::test {
 namespace {
 
-constexpr Shape kSymmetric[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows};
-
 class ConvergenceTest : public ModuleTest {
  protected:
   SmMatrix* with(Shape shape, const Dense& a) { return build(session(), shape, a); }
@@ -31,7 +29,7 @@ TEST_P(ConvergenceTest, comes_with_the_first_step_whose_rho_is_within_the_square
   const Dense a = positive_definite(grid(6, 5), random).dense();
   const std::vector<double> b = random.vector(30);
   const double start = first_rho(a, b);
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     SmMatrix* m = with(shape, a);
     const std::vector<Step> steps = recorded(m, b, {0.0, 12, 1});
     ASSERT_EQ(steps.size(), 12U);
@@ -54,7 +52,7 @@ TEST_P(ConvergenceTest, comes_with_the_first_step_whose_rho_is_within_the_square
 
 TEST_P(ConvergenceTest, a_tolerance_of_1_or_more_is_met_before_the_first_step) {
   const Dense a = from_rows({{4, 1}, {1, 3}});
-  for (const Shape shape : kSymmetric)
+  for (const Shape shape : kSymmetricShapes)
     for (const double tolerance : {1.0, 2.0, 1e6}) {
       const Solved s = solve(with(shape, a), {1, 2}, {tolerance, 0, 1});
       EXPECT_EQ(s.status, SM_OK);
@@ -66,7 +64,7 @@ TEST_P(ConvergenceTest, a_tolerance_of_1_or_more_is_met_before_the_first_step) {
 
 TEST_P(ConvergenceTest, an_exact_solution_meets_a_tolerance_of_0) {
   // The preconditioned matrix is the identity: nothing is left after one step.
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     const Solved s = solve(with(shape, from_diagonal({1, 4, 16})), {1, 2, 4}, {0.0, 0, 1});
     EXPECT_EQ(s.status, SM_OK);
     EXPECT_EQ(s.iterations, 1);
@@ -78,7 +76,7 @@ TEST_P(ConvergenceTest, an_exact_solution_meets_a_tolerance_of_0) {
 TEST_P(ConvergenceTest, a_right_hand_side_of_zeros_has_converged_at_the_start) {
   Random random(122);
   const Dense a = positive_definite(grid(3, 3), random).dense();
-  for (const Shape shape : kSymmetric)
+  for (const Shape shape : kSymmetricShapes)
     for (const double tolerance : {0.0, 1e-10, kNan}) {
       const Solved s = solve(with(shape, a), std::vector<double>(18, 0.0), {tolerance, 0, 2});
       EXPECT_EQ(s.status, SM_OK);
@@ -92,7 +90,7 @@ TEST_P(ConvergenceTest, a_limit_below_1_stands_for_the_order_and_2) {
   const Dense a = ill_conditioned(8, 1e6);
   Random random(123);
   const std::vector<double> b = random.vector(8);
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     SmMatrix* m = with(shape, a);
     for (const std::int64_t limit : {std::int64_t{0}, std::int64_t{-1}, std::numeric_limits<std::int64_t>::min()}) {
       const Solved s = solve(m, b, {0.0, limit, 1});
@@ -111,7 +109,7 @@ TEST_P(ConvergenceTest, a_right_hand_side_that_does_not_converge_leaves_the_late
   const std::vector<double> hard = random.vector(8);
   b.insert(b.end(), hard.begin(), hard.end());
   b.insert(b.end(), hard.begin(), hard.end());
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     SmMatrix* m = with(shape, a);
     const Solved s = solve(m, b, {1e-12, 3, 3});
     const Solved alone = solve(m, hard, {1e-12, 3, 1});
@@ -128,7 +126,7 @@ TEST_P(ConvergenceTest, a_right_hand_side_that_does_not_converge_leaves_the_late
 }
 
 TEST_P(ConvergenceTest, converging_with_the_last_step_allowed_is_converging) {
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     const Solved s = solve(with(shape, from_diagonal({1, 4})), {1, 2}, {1e-8, 1, 1});
     EXPECT_EQ(s.status, SM_OK);
     EXPECT_EQ(s.iterations, 1);
@@ -139,7 +137,7 @@ TEST_P(ConvergenceTest, a_negative_tolerance_or_a_nan_selects_setting_2) {
   Random random(125);
   const Dense a = positive_definite(grid(5, 5), random).dense();
   const std::vector<double> b = random.vector(25);
-  for (const Shape shape : kSymmetric)
+  for (const Shape shape : kSymmetricShapes)
     for (const double setting : {kSingular, 1e-3, 0.25}) {
       SmMatrix* m = with(shape, a);
       const Solved want = solve(m, b, {setting, 1000, 1});
@@ -158,7 +156,7 @@ TEST_P(ConvergenceTest, a_negative_tolerance_or_a_nan_selects_setting_2) {
 
 TEST_P(ConvergenceTest, a_tolerance_does_not_reach_the_preconditioner) {
   // With a tolerance of 0.5 and diagonal elements far below it, one step with the full preconditioner solves it.
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     const Solved s = solve(with(shape, from_diagonal({1e-3, 1e-6, 1e-13})), {1, 1, 1}, {0.5, 0, 1});
     EXPECT_EQ(s.status, SM_OK);
     EXPECT_EQ(s.iterations, 1);
@@ -168,7 +166,7 @@ TEST_P(ConvergenceTest, a_tolerance_does_not_reach_the_preconditioner) {
 
 TEST_P(ConvergenceTest, a_direction_that_the_matrix_annihilates_stops_it) {
   // b is no combination of the columns, and p'Ap is 0 in the first step.
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     const Solved s = solve(with(shape, from_rows({{1, 1}, {1, 1}})), {1, -1, 1, 1}, {1e-10, 100, 2});
     EXPECT_EQ(s.status, SM_NOT_CONVERGED);
     EXPECT_TRUE(std::isnan(s.residual));
@@ -180,7 +178,7 @@ TEST_P(ConvergenceTest, a_direction_that_the_matrix_annihilates_stops_it) {
 
 TEST_P(ConvergenceTest, a_nan_on_either_side_stops_it) {
   const Dense a = from_rows({{4, 1, 0}, {1, 3, 1}, {0, 1, 5}});
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     for (std::size_t place = 0; place < 3; ++place) {
       std::vector<double> b{1, 2, 3, 1, 2, 3};
       b[place] = kNan;
@@ -200,7 +198,7 @@ TEST_P(ConvergenceTest, a_nan_on_either_side_stops_it) {
 
 TEST_P(ConvergenceTest, without_any_preconditioner_nothing_is_to_be_done) {
   // rho is 0 from the start when the whole diagonal is 0.
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     const Solved s = solve(with(shape, from_rows({{0, 1}, {1, 0}})), {1, 2}, {1e-10, 0, 1});
     EXPECT_EQ(s.status, SM_OK);
     EXPECT_EQ(s.x, (std::vector<double>{0, 0}));
@@ -226,7 +224,7 @@ TEST_P(ConvergenceTest, the_residual_is_computed_from_b_in_steps_1_51_and_101_on
   const Dense a = ill_conditioned(60, 1e8);
   Random random(126);
   const std::vector<double> b = random.vector(60);
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     SmMatrix* m = with(shape, a);
     const std::vector<Step> calm = recorded(m, b, {0.0, 110, 1});
     ASSERT_EQ(calm.size(), 110U);

@@ -4,8 +4,6 @@
 namespace sm::test {
 namespace {
 
-constexpr Shape kSymmetric[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows};
-
 class ProgressTest : public ModuleTest {
  protected:
   ProgressTest() {
@@ -21,7 +19,7 @@ INSTANTIATE_BOTH_HOSTS(ProgressTest);
 
 TEST_P(ProgressTest, is_told_rho_the_user_word_and_the_number_after_every_step) {
   const Recurrence want = conjugate_gradients(a_, b_, 6);
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     SmMatrix* m = with(shape);
     m->solver_word = -1234567890123;
     Recorder recorder;
@@ -41,7 +39,7 @@ TEST_P(ProgressTest, is_told_rho_the_user_word_and_the_number_after_every_step) 
 }
 
 TEST_P(ProgressTest, changes_nothing_by_listening) {
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     SmMatrix* m = with(shape);
     const Solved silent = solve(m, b_);
     Recorder recorder;
@@ -58,7 +56,7 @@ TEST_P(ProgressTest, changes_nothing_by_listening) {
 
 TEST_P(ProgressTest, stops_the_solve_with_the_last_iterate_in_x) {
   const Recurrence want = conjugate_gradients(a_, b_, 4);
-  for (const Shape shape : kSymmetric)
+  for (const Shape shape : kSymmetricShapes)
     for (const std::int32_t answer : {1, -1, 1 << 16}) {
       SmMatrix* m = with(shape);
       for (std::int64_t stop = 1; stop <= 4; ++stop) {
@@ -81,7 +79,7 @@ TEST_P(ProgressTest, counts_from_1_for_each_right_hand_side_and_stops_the_later_
   b.insert(b.end(), 16, 0.0);  // converged at once: no step
   b.insert(b.end(), b_.begin(), b_.end());
   b.insert(b.end(), b_.begin(), b_.end());
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     SmMatrix* m = with(shape);
     Recorder recorder;
     ASSERT_EQ(qxsmsetprogress(instance(), Recorder::record, &recorder), SM_OK);

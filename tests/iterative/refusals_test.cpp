@@ -4,9 +4,6 @@
 namespace sm::test {
 namespace {
 
-constexpr Shape kSymmetric[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows};
-constexpr Shape kGeneralShapes[] = {kGeneralSparse, kGeneralColumns, kGeneralRows};
-
 class RefusalsTest : public ModuleTest {
  protected:
   SmMatrix* with(Shape shape, const Dense& a) { return build(session(), shape, a); }
@@ -44,9 +41,9 @@ TEST_P(RefusalsTest, come_in_order) {
   for (const std::int32_t nrhs : {1, 0}) {
     EXPECT_EQ(untouched(new_untyped(session()), true, nrhs), SM_OK);
     EXPECT_EQ(untouched(build_open(session(), Dense(0, 0)), true, nrhs), SM_OK);  // empty before open
-    EXPECT_EQ(untouched(sized(session(), kGeneralSparse, 2, 2), true, nrhs), SM_OK);
-    UntypedRecord none(session());
-    EXPECT_EQ(untouched(none.get(), true, nrhs), SM_UNTYPED);  // the kind before the state
+    EXPECT_EQ(untouched(new_sized(session(), kGeneralSparse, 2, 2), true, nrhs), SM_OK);
+    SmMatrix* none = new_untyped_with_an_entry(session());
+    EXPECT_EQ(untouched(none, true, nrhs), SM_UNTYPED);  // the kind before the state
     EXPECT_EQ(untouched(build_open(session(), from_diagonal({1, 2})), true, nrhs), SM_NOT_CLOSED);
     std::vector<double> data(4, 1.0);
     EXPECT_EQ(untouched(new_open_tied(session(), data, 2, 2, SM_KIND_GENERAL, SM_FORMAT_ROWS), true, nrhs),
@@ -78,7 +75,7 @@ TEST_P(RefusalsTest, no_right_hand_sides_are_an_answer) {
 }
 
 TEST_P(RefusalsTest, a_diagonal_element_below_the_negative_limit_answers_103_with_no_iterations) {
-  for (const Shape shape : kSymmetric)
+  for (const Shape shape : kSymmetricShapes)
     for (const double bad : {-1.0, -0.125, -1e12}) {
       SmMatrix* m = with(shape, from_rows({{4, 1, 0}, {1, bad, 0}, {0, 0, 2}}));
       const std::int64_t blocks = host().live_blocks();
@@ -89,7 +86,7 @@ TEST_P(RefusalsTest, a_diagonal_element_below_the_negative_limit_answers_103_wit
       EXPECT_EQ(host().live_blocks(), blocks);
       EXPECT_TRUE(snapshot(m) == before);
     }
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     const Solved s = solve(with(shape, from_diagonal({4, -0.0625})), {1, 2}, {1e-10, 0, 1});
     EXPECT_EQ(s.status, SM_OK) << "within the limit";
     EXPECT_EQ(s.x, (std::vector<double>{0.25, 0}));
@@ -98,7 +95,7 @@ TEST_P(RefusalsTest, a_diagonal_element_below_the_negative_limit_answers_103_wit
 
 TEST_P(RefusalsTest, work_goes_back_whatever_the_answer_is) {
   const Dense a = ill_conditioned(6, 1e4);
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     SmMatrix* m = with(shape, a);
     const std::int64_t blocks = host().live_blocks();
     EXPECT_EQ(solve(m, {1, 2, 3, 4, 5, 6}, {1e-6, 100, 1}).status, SM_OK);

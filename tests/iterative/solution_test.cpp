@@ -4,9 +4,6 @@
 namespace sm::test {
 namespace {
 
-constexpr Shape kSymmetric[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows};
-constexpr Shape kDiagonalShapes[] = {kDiagonalColumns, kDiagonalRows};
-
 class SolutionTest : public ModuleTest {
  protected:
   SmMatrix* with(Shape shape, const Dense& a) { return build(session(), shape, a); }
@@ -21,7 +18,7 @@ TEST_P(SolutionTest, solves_definite_systems_of_every_format) {
     const Dense a = problem.dense();
     const std::vector<double> b = random.vector(3 * problem.n);
     const Dense want = product(inverse(a), columns(b, problem.n));
-    for (const Shape shape : kSymmetric) {
+    for (const Shape shape : kSymmetricShapes) {
       SmMatrix* m = with(shape, a);
       const Snapshot before = snapshot(m);
       const Solved s = solve(m, b, {1e-14, 1000, 3});
@@ -70,7 +67,7 @@ TEST_P(SolutionTest, of_a_singular_system_with_a_solution_is_one) {
   for (int round = 0; round < 8; ++round) {
     const Dense a = cross_product(random, 6, 4, 2).problem.dense();
     const std::vector<double> b = product(a, random.vector(12));
-    for (const Shape shape : kSymmetric) {
+    for (const Shape shape : kSymmetricShapes) {
       const Solved s = solve(with(shape, a), b, {1e-12, 200, 1});
       EXPECT_EQ(s.status, SM_OK);
       EXPECT_TRUE(near(product(a, s.x), b, 1e-8)) << name_of(shape) << " round " << round;
@@ -83,7 +80,7 @@ TEST_P(SolutionTest, each_iterate_is_that_of_the_recurrence) {
   const Dense a = positive_definite(grid(4, 4), random).dense();
   const std::vector<double> b = random.vector(16);
   const Recurrence want = conjugate_gradients(a, b, 6);
-  for (const Shape shape : kSymmetric)
+  for (const Shape shape : kSymmetricShapes)
     for (std::int64_t k = 1; k <= 6; ++k) {
       const Solved s = solve(with(shape, a), b, {0.0, k, 1});
       EXPECT_EQ(s.status, SM_NOT_CONVERGED);
@@ -99,7 +96,7 @@ TEST_P(SolutionTest, a_zero_on_the_diagonal_gets_no_preconditioner_and_is_correc
       from_rows({{4, 1, 1, 0, 1}, {1, 0, 2, 0, 3}, {1, 2, 8, 1, 2}, {0, 0, 1, -0.0625, 1}, {1, 3, 2, 1, 16}});
   const std::vector<double> b{1, 2, 3, 4, 5};
   const Recurrence want = conjugate_gradients(a, b, 2);
-  for (const Shape shape : kSymmetric)
+  for (const Shape shape : kSymmetricShapes)
     for (std::int64_t k = 1; k <= 2; ++k) {
       const Solved s = solve(with(shape, a), b, {0.0, k, 1});
       EXPECT_EQ(s.status, SM_NOT_CONVERGED);
@@ -143,7 +140,7 @@ TEST_P(SolutionTest, several_right_hand_sides_are_solved_one_by_one) {
   Random random(116);
   const Dense a = positive_definite(grid(4, 3), random).dense();
   const std::vector<double> b = random.vector(48);
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     SmMatrix* m = with(shape, a);
     const Solved all = solve(m, b, {1e-8, 100, 4});
     EXPECT_EQ(all.status, SM_OK);
@@ -161,7 +158,7 @@ TEST_P(SolutionTest, several_right_hand_sides_are_solved_one_by_one) {
 
 TEST_P(SolutionTest, what_x_holds_before_does_not_matter) {
   const Dense a = from_rows({{4, 1}, {1, 3}});
-  for (const Shape shape : kSymmetric) {
+  for (const Shape shape : kSymmetricShapes) {
     SmMatrix* m = with(shape, a);
     const std::vector<double> b{1, 2};
     std::vector<double> x(2, kNan);
@@ -176,7 +173,7 @@ TEST_P(SolutionTest, a_tied_array_is_only_read) {
   const Dense a = from_rows({{4, 1}, {1, 3}});
   for (const Shape shape : kSquareFactored) {
     std::vector<double> data = laid_out(shape, a);
-    SmMatrix* m = build_tied(session(), shape, data, 2);
+    SmMatrix* m = new_tied(session(), shape, data, 2, 2);
     const Solved s = solve(m, {1, 2}, {1e-14, 0, 1});
     EXPECT_EQ(s.status, SM_OK);
     EXPECT_TRUE(near(product(contents(m), s.x), {1, 2}, 1e-14)) << name_of(shape);

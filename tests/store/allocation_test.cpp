@@ -10,46 +10,12 @@ namespace {
 
 class Allocation : public ::testing::TestWithParam<HostKind> {
  protected:
-  // prepare(Session&) -> problem; run(Session&, problem&) -> status; check(Session&, problem&, status, request) looks at
-  // what a refused request left. Whatever that is, it must go with the instance. Answers the number of requests.
   template <class Prepare, class Run, class Check>
   std::int64_t each_request_refused(Prepare prepare, Run run, Check check) {
-    std::int64_t requests = 0;
-    for (const bool for_ever : {false, true}) {
-      for (std::int64_t k = 0;; ++k) {
-        SCOPED_TRACE("request " + std::to_string(k) + (for_ever ? " and on" : ""));
-        Session session(GetParam());
-        EXPECT_NE(session.instance(), nullptr);
-        auto problem = prepare(session);
-        session.host().fail_request(k, for_ever);
-        const SmStatus status = run(session, problem);
-        const bool met = session.host().stop_failing() > 0;
-        if (met) {
-          check(session, problem, status, k);
-        } else {
-          EXPECT_EQ(status, SM_OK);
-        }
-        session.close();
-        EXPECT_EQ(session.host().live_pools(), 0);
-        EXPECT_EQ(session.host().live_blocks(), 0);
-        EXPECT_EQ(session.host().violations(), 0);
-        requests = k;
-        if (!met) break;
-      }
-    }
-    return requests;
+    return refuse_each_request(GetParam(), prepare, run, check);
   }
 
-  static SmMatrix* typed(Session& session, Shape shape) {
-    SmMatrix* m = nullptr;
-    EXPECT_EQ(session.fn().qxsmnew(session.instance(), &m, shape.kind, shape.format), SM_OK);
-    return m;
-  }
-  static SmMatrix* square(Session& session, Shape shape, std::int64_t n) {
-    SmMatrix* m = typed(session, shape);
-    EXPECT_EQ(session.fn().qxsmresize(m, n, n), SM_OK);
-    return m;
-  }
+  static SmMatrix* square(Session& session, Shape shape, std::int64_t n) { return new_sized(session, shape, n, n); }
   static SmStatus set(Session& session, SmMatrix* m, std::int64_t row, std::int64_t col, double value) {
     return session.fn().qxsmassign(m, row, col, 0, value);
   }
@@ -133,7 +99,7 @@ TEST_P(Allocation, typing_a_reset_record_without_a_pool_keeps_it_for_the_next_tr
     };
     each_request_refused(
         [](Session& session) {
-          SmMatrix* m = typed(session, kGeneralRows);
+          SmMatrix* m = new_typed(session, kGeneralRows);
           EXPECT_EQ(session.fn().qxsmdelete(m), SM_OK);
           return m;
         },
@@ -167,7 +133,7 @@ TEST_P(Allocation, sizing_without_memory_answers_101_and_works_the_next_time) {
     SCOPED_TRACE(name_of(c.shape) + " from " + std::to_string(c.from) + " to " + std::to_string(c.to));
     const auto size = [&c](Session& session, SmMatrix* m) { return session.fn().qxsmresize(m, c.to, c.to); };
     const std::int64_t requests = each_request_refused(
-        [&c](Session& session) { return c.from > 0 ? square(session, c.shape, c.from) : typed(session, c.shape); },
+        [&c](Session& session) { return c.from > 0 ? square(session, c.shape, c.from) : new_typed(session, c.shape); },
         size,
         [&](Session& session, SmMatrix* m, SmStatus status, std::int64_t) {
           EXPECT_EQ(status, SM_NO_MEMORY);

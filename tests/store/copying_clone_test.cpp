@@ -238,7 +238,7 @@ TEST_P(Clone, a_reassembled_copy_is_open_and_holds_the_rows_of_its_source) {
     EXPECT_EQ(copy->solver_word, 12);
     EXPECT_EQ(copy->nnz, a.matrix->nnz) << "counted, not preset";
     expect_voided(copy);
-    EXPECT_EQ(contents(copy), a.stored) << "in the caller's order";
+    EXPECT_EQ(entries(copy), a.stored) << "in the caller's order";
     EXPECT_EQ(copy->perm, nullptr);
     EXPECT_EQ(copy->work, nullptr);
     ASSERT_EQ(fn().qxsmassign(copy, 0, 29, 1, 0.25), SM_OK) << "more can be added";
@@ -259,7 +259,7 @@ TEST_P(Clone, a_reassembled_copy_keeps_stored_zeros_and_needs_more_than_one_slab
   SmMatrix* copy = target();
   ASSERT_EQ(fn().qxsmclone(a.matrix, copy, -1), SM_OK);
   ASSERT_GT(copy->nnz, copy->slab_nodes);
-  EXPECT_EQ(contents(copy), a.stored);
+  EXPECT_EQ(entries(copy), a.stored);
   ASSERT_EQ(fn().qxsmclose(copy, kNan), SM_OK);
   EXPECT_EQ(compressed(copy), a.stored);
 }
@@ -278,11 +278,11 @@ TEST_P(Clone, values_are_copied_to_the_bit) {
 }
 
 TEST_P(Clone, an_empty_copy_takes_the_state_of_its_source_unless_it_is_reassembled) {
-  SmMatrix* source = sized(session(), kSymmetricSparse, 0, 0);
+  SmMatrix* source = new_sized(session(), kSymmetricSparse, 0, 0);
   ASSERT_EQ(fn().qxsmclose(source, 0.0), SM_OK);
   ASSERT_EQ(source->state, SM_STATE_CLOSED);
   source->solver_word = 3;
-  SmMatrix* copy = sized(session(), kSymmetricSparse, 4, 4);
+  SmMatrix* copy = new_sized(session(), kSymmetricSparse, 4, 4);
   ASSERT_EQ(fn().qxsmclone(source, copy, 0), SM_OK);
   EXPECT_EQ(copy->state, SM_STATE_CLOSED);
   EXPECT_EQ(copy->rows, 0);

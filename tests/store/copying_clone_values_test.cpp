@@ -18,7 +18,7 @@ class CloneValues : public ModuleTest {
     return m;
   }
   void expect_copy(const Filled& a, SmMatrix* copy) {
-    EXPECT_EQ(contents(copy), a.stored) << name_of(a.shape);
+    EXPECT_EQ(entries(copy), a.stored) << name_of(a.shape);
     EXPECT_EQ(copy->rows, a.dense.rows());
     EXPECT_EQ(copy->cols, a.dense.cols());
     EXPECT_EQ(copy->nnz, a.matrix->nnz);
@@ -61,11 +61,11 @@ TEST_P(CloneValues, a_copy_and_its_source_are_apart) {
     SmMatrix* copy = typed(shape);
     ASSERT_EQ(fn().qxsmclone(a.matrix, copy, 0), SM_OK);
     ASSERT_EQ(fn().qxsmassign(copy, 4, 4, 0, 1000.0), SM_OK);
-    EXPECT_EQ(contents(a.matrix), a.stored);
+    EXPECT_EQ(entries(a.matrix), a.stored);
     Nonzeros changed = a.stored;
     changed[{4, 4}] = 1000.0;
     ASSERT_EQ(fn().qxsmDestroyMatrix(instance(), &a.matrix), SM_OK);
-    EXPECT_EQ(contents(copy), changed);
+    EXPECT_EQ(entries(copy), changed);
   }
 }
 
@@ -84,8 +84,8 @@ TEST_P(CloneValues, a_copy_of_trees_takes_slabs_as_assembly_does_and_goes_on_gro
     ASSERT_EQ(fn().qxsmassign(copy, 30, c, 0, 1.0), SM_OK);
     expected[{30, c}] = 1.0;
   }
-  EXPECT_EQ(contents(copy), expected);
-  EXPECT_EQ(contents(a.matrix), a.stored);
+  EXPECT_EQ(entries(copy), expected);
+  EXPECT_EQ(entries(a.matrix), a.stored);
 }
 
 TEST_P(CloneValues, a_copy_of_trees_ends_exactly_where_a_slab_does) {
@@ -109,7 +109,7 @@ TEST_P(CloneValues, a_copy_of_trees_with_removed_and_grown_rows_holds_what_is_le
   ASSERT_EQ(fn().qxsmassign(source, 40, 5, 0, 3.0), SM_OK);
   SmMatrix* copy = typed(kGeneralSparse);
   ASSERT_EQ(fn().qxsmclone(source, copy, 0), SM_OK);
-  EXPECT_EQ(contents(copy), (Nonzeros{{{2, 2}, 2.0}, {{40, 5}, 3.0}}));
+  EXPECT_EQ(entries(copy), (Nonzeros{{{2, 2}, 2.0}, {{40, 5}, 3.0}}));
   EXPECT_EQ(copy->rows, 41);
   EXPECT_EQ(copy->cols, 6);
 }
@@ -151,7 +151,7 @@ TEST_P(CloneValues, values_are_copied_to_the_bit) {
     SmMatrix* source = filled_with(session(), shape, 4, 4, elements).matrix;
     SmMatrix* copy = typed(shape);
     ASSERT_EQ(fn().qxsmclone(source, copy, 0), SM_OK);
-    const Nonzeros got = contents(copy);
+    const Nonzeros got = entries(copy);
     for (std::int64_t k = 0; k < 4; ++k)
       EXPECT_EQ(bits(got.at({k, k})), bits(odd[at(k)])) << name_of(shape) << ' ' << k;
   }
@@ -166,16 +166,16 @@ TEST_P(CloneValues, a_matrix_copied_onto_itself_stays_whatever_it_is) {
       const double* values = a.matrix->values;
       EXPECT_EQ(fn().qxsmclone(a.matrix, a.matrix, flag), SM_OK);
       EXPECT_EQ(a.matrix->values, values);
-      EXPECT_EQ(contents(a.matrix), a.stored);
+      EXPECT_EQ(entries(a.matrix), a.stored);
       EXPECT_EQ(a.matrix->state, SM_STATE_CLOSED);
       const Unclosed open = unclosed(session(), shape);
-      const Nonzeros before = contents(open.matrix);
+      const Nonzeros before = entries(open.matrix);
       EXPECT_EQ(fn().qxsmclone(open.matrix, open.matrix, flag), SM_OK);
-      EXPECT_EQ(contents(open.matrix), before);
+      EXPECT_EQ(entries(open.matrix), before);
       EXPECT_EQ(open.matrix->state, SM_STATE_OPEN);
     }
   }
-  SmMatrix* none = untyped(session());
+  SmMatrix* none = new_untyped(session());
   EXPECT_EQ(fn().qxsmclone(none, none, 0), SM_OK);
   SmMatrix* factored = filled_definite(session(), kSymmetricSparse, 4, random).matrix;
   ASSERT_EQ(fn().qxsmfact(factored, 0), SM_OK);
@@ -187,18 +187,18 @@ TEST_P(CloneValues, the_kind_and_state_of_the_source_are_checked_before_the_targ
   Random random(5);
   const Filled kept = filled(session(), kGeneralColumns, 3, 4, random);
   kept.matrix->solver_word = 8;
-  SmMatrix* none = untyped(session());
+  SmMatrix* none = new_untyped(session());
   EXPECT_EQ(fn().qxsmclone(none, kept.matrix, 0), SM_UNTYPED);
-  EXPECT_EQ(fn().qxsmclone(none, untyped(session()), 0), SM_UNTYPED);
+  EXPECT_EQ(fn().qxsmclone(none, new_untyped(session()), 0), SM_UNTYPED);
   for (const Shape shape : kShapes) {
     const Unclosed open = unclosed(session(), shape);
     open.matrix->solver_word = 9;
     EXPECT_EQ(fn().qxsmclone(open.matrix, kept.matrix, 0), SM_NOT_CLOSED) << name_of(shape);
-    EXPECT_EQ(fn().qxsmclone(open.matrix, untyped(session()), 0), SM_NOT_CLOSED) << name_of(shape);
+    EXPECT_EQ(fn().qxsmclone(open.matrix, new_untyped(session()), 0), SM_NOT_CLOSED) << name_of(shape);
   }
-  EXPECT_EQ(fn().qxsmclone(without_rows(session(), 3), kept.matrix, 0), SM_NOT_CLOSED);
-  EXPECT_EQ(fn().qxsmclone(sized(session(), kSymmetricSparse, 3, 3), typed(kSymmetricSparse), 1), SM_NOT_CLOSED);
-  EXPECT_EQ(contents(kept.matrix), kept.stored);
+  EXPECT_EQ(fn().qxsmclone(new_without_rows(session(), 3), kept.matrix, 0), SM_NOT_CLOSED);
+  EXPECT_EQ(fn().qxsmclone(new_sized(session(), kSymmetricSparse, 3, 3), typed(kSymmetricSparse), 1), SM_NOT_CLOSED);
+  EXPECT_EQ(entries(kept.matrix), kept.stored);
   EXPECT_EQ(kept.matrix->rows, 3);
   EXPECT_EQ(kept.matrix->solver_word, 8);
 }
@@ -212,8 +212,8 @@ TEST_P(CloneValues, the_answer_of_sizing_the_target_comes_before_the_comparison_
     EXPECT_EQ(fn().qxsmclone(wide.matrix, target, 0), SM_NOT_SQUARE) << name_of(shape);
     EXPECT_EQ(target->solver_word, 77) << "taken over first";
   }
-  EXPECT_EQ(fn().qxsmclone(wide.matrix, untyped(session()), 0), SM_UNTYPED);
-  EXPECT_EQ(contents(wide.matrix), wide.stored);
+  EXPECT_EQ(fn().qxsmclone(wide.matrix, new_untyped(session()), 0), SM_UNTYPED);
+  EXPECT_EQ(entries(wide.matrix), wide.stored);
 }
 
 TEST_P(CloneValues, every_pair_of_different_kinds_or_formats_answers_110_with_the_target_sized) {
@@ -223,30 +223,30 @@ TEST_P(CloneValues, every_pair_of_different_kinds_or_formats_answers_110_with_th
     a.matrix->solver_word = 5;
     for (const Shape to : kShapes) {
       if (from.kind == to.kind && from.format == to.format) continue;
-      SmMatrix* target = sized(session(), to, 2, 2);
+      SmMatrix* target = new_sized(session(), to, 2, 2);
       EXPECT_EQ(fn().qxsmclone(a.matrix, target, 0), SM_KIND_MISMATCH) << name_of(from) << " to " << name_of(to);
       EXPECT_EQ(target->rows, 4);
       EXPECT_EQ(target->cols, 4);
       EXPECT_EQ(target->solver_word, 5);
-      EXPECT_TRUE(same(dense_contents(target), Dense(4, 4))) << name_of(from) << " to " << name_of(to);
+      EXPECT_TRUE(same(contents(target), Dense(4, 4))) << name_of(from) << " to " << name_of(to);
     }
-    EXPECT_EQ(contents(a.matrix), a.stored);
+    EXPECT_EQ(entries(a.matrix), a.stored);
   }
 }
 
 TEST_P(CloneValues, an_empty_source_empties_a_target_of_any_kind) {
   Random random(8);
-  SmMatrix* trees = sized(session(), kGeneralSparse, 3, 3);
+  SmMatrix* trees = new_sized(session(), kGeneralSparse, 3, 3);
   for (const Shape to : kShapes) {
     SmMatrix* target = filled(session(), to, 4, 4, random).matrix;
     trees->solver_word = 6;
     EXPECT_EQ(fn().qxsmclone(trees, target, 0), SM_OK) << name_of(to);
     EXPECT_EQ(target->rows, 3);
     EXPECT_EQ(target->solver_word, 6);
-    EXPECT_TRUE(same(dense_contents(target), Dense(3, 3))) << name_of(to);
+    EXPECT_TRUE(same(contents(target), Dense(3, 3))) << name_of(to);
   }
   for (const Shape from : kAllButSymmetricSparse) {
-    SmMatrix* source = sized(session(), from, 0, 0);
+    SmMatrix* source = new_sized(session(), from, 0, 0);
     for (const Shape to : kShapes) {
       SmMatrix* target = filled(session(), to, 4, 4, random).matrix;
       EXPECT_EQ(fn().qxsmclone(source, target, 0), SM_OK) << name_of(from) << " to " << name_of(to);

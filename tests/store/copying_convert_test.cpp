@@ -20,7 +20,8 @@ bool served(Shape from, Shape to) {
   }
 }
 
-// What the target stores after a conversion: every stored value, at both places when only the target keeps both triangles.
+// What the target stores after a conversion: every stored value, at both places when only the target keeps both
+// triangles.
 Nonzeros converted(const Filled& a, Shape to) {
   if (same_shape(a.shape, to)) return a.stored;
   Nonzeros out;
@@ -51,8 +52,8 @@ class Convert : public ModuleTest {
     EXPECT_EQ(target->cols, a.dense.cols());
     EXPECT_EQ(target->kind, to.kind);
     EXPECT_EQ(target->format, to.format);
-    EXPECT_EQ(contents(target), converted(a, to));
-    EXPECT_TRUE(same(dense_contents(target), a.dense));
+    EXPECT_EQ(entries(target), converted(a, to));
+    EXPECT_TRUE(same(contents(target), a.dense));
     if (same_shape(a.shape, to)) return;
     EXPECT_EQ(target->state, SM_STATE_CLOSED);
     EXPECT_EQ(target->definite, -1);
@@ -72,9 +73,9 @@ TEST_P(Convert, every_pair_of_shapes_is_converted_or_answers_124_with_the_target
         } else {
           EXPECT_EQ(fn().qxsmconvert(a.matrix, target, 0), SM_UNAVAILABLE) << name_of(from) << " to " << name_of(to);
           EXPECT_EQ(target->rows, n);
-          EXPECT_TRUE(same(dense_contents(target), Dense(n, n)));
+          EXPECT_TRUE(same(contents(target), Dense(n, n)));
         }
-        EXPECT_EQ(contents(a.matrix), a.stored) << "the source stays";
+        EXPECT_EQ(entries(a.matrix), a.stored) << "the source stays";
         EXPECT_EQ(a.matrix->state, SM_STATE_CLOSED);
       }
     }
@@ -101,7 +102,7 @@ TEST_P(Convert, a_matrix_that_is_not_square_answers_111_before_124) {
     for (const Shape to : {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalColumns, kDiagonalRows}) {
       EXPECT_EQ(fn().qxsmconvert(a.matrix, typed(to), 0), SM_NOT_SQUARE) << name_of(from) << " to " << name_of(to);
     }
-    EXPECT_EQ(contents(a.matrix), a.stored);
+    EXPECT_EQ(entries(a.matrix), a.stored);
   }
 }
 
@@ -115,7 +116,7 @@ TEST_P(Convert, the_flag_is_that_of_a_copy_and_means_nothing_otherwise) {
   EXPECT_TRUE(near(solved_identity(copy), inverse(a.dense), 1e-9));
   ASSERT_EQ(fn().qxsmconvert(a.matrix, copy, 1), SM_OK);
   EXPECT_EQ(copy->state, SM_STATE_OPEN);
-  EXPECT_EQ(contents(copy), a.stored);
+  EXPECT_EQ(entries(copy), a.stored);
   for (const Shape from : kShapes)
     for (const Shape to : kShapes) {
       if (!served(from, to) || same_shape(from, to)) continue;
@@ -123,7 +124,7 @@ TEST_P(Convert, the_flag_is_that_of_a_copy_and_means_nothing_otherwise) {
       SmMatrix* target = typed(to);
       ASSERT_EQ(fn().qxsmconvert(b.matrix, target, 1), SM_OK) << name_of(from) << " to " << name_of(to);
       EXPECT_EQ(target->state, SM_STATE_CLOSED);
-      EXPECT_EQ(contents(target), converted(b, to));
+      EXPECT_EQ(entries(target), converted(b, to));
     }
 }
 
@@ -165,7 +166,7 @@ TEST_P(Convert, zeros_are_entered_and_only_closing_drops_them) {
     SmMatrix* trees = typed(kGeneralSparse);
     ASSERT_EQ(fn().qxsmconvert(a.matrix, trees, 0), SM_OK);
     EXPECT_EQ(trees->nnz, 16);
-    EXPECT_EQ(bits(contents(trees).at({3, 1})), bits(-0.0));
+    EXPECT_EQ(bits(entries(trees).at({3, 1})), bits(-0.0));
     SmMatrix* rows = typed(kSymmetricSparse);
     ASSERT_EQ(fn().qxsmconvert(a.matrix, rows, 0), SM_OK);
     EXPECT_EQ(compressed(rows), (Nonzeros{{{0, 0}, 1.0}, {{1, 1}, 0.0}, {{2, 2}, 0.0}, {{2, 3}, 5.0}, {{3, 3}, 0.0}}));
@@ -223,7 +224,7 @@ TEST_P(Convert, an_empty_source_gives_an_empty_target) {
   Random random(9);
   for (const Shape from : kShapes)
     for (const Shape to : kShapes) {
-      SmMatrix* source = sized(session(), from, 0, 0);
+      SmMatrix* source = new_sized(session(), from, 0, 0);
       ASSERT_EQ(fn().qxsmclose(source, 0.0), SM_OK);
       SmMatrix* target = filled(session(), to, 3, 3, random).matrix;
       EXPECT_EQ(fn().qxsmconvert(source, target, 0), served(from, to) ? SM_OK : SM_UNAVAILABLE)
@@ -234,26 +235,26 @@ TEST_P(Convert, an_empty_source_gives_an_empty_target) {
         EXPECT_EQ(target->state, SM_STATE_CLOSED) << name_of(from) << " to " << name_of(to);
       }
     }
-  SmMatrix* trees = sized(session(), kGeneralSparse, 2, 5);
+  SmMatrix* trees = new_sized(session(), kGeneralSparse, 2, 5);
   SmMatrix* target = filled(session(), kGeneralRows, 3, 3, random).matrix;
   EXPECT_EQ(fn().qxsmconvert(trees, target, 0), SM_OK);
-  EXPECT_TRUE(same(dense_contents(target), Dense(2, 5)));
+  EXPECT_TRUE(same(contents(target), Dense(2, 5)));
 }
 
 TEST_P(Convert, the_same_record_twice_answers_0_and_stays) {
   Random random(10);
-  SmMatrix* none = untyped(session());
+  SmMatrix* none = new_untyped(session());
   EXPECT_EQ(fn().qxsmconvert(none, none, 0), SM_OK);
   for (const Shape shape : kShapes) {
     const Filled a = filled(session(), shape, 4, 4, random);
     const Unclosed open = unclosed(session(), shape);
-    const Nonzeros before = contents(open.matrix);
+    const Nonzeros before = entries(open.matrix);
     for (const std::int32_t flag : {0, 1}) {
       EXPECT_EQ(fn().qxsmconvert(a.matrix, a.matrix, flag), SM_OK);
-      EXPECT_EQ(contents(a.matrix), a.stored) << name_of(shape);
+      EXPECT_EQ(entries(a.matrix), a.stored) << name_of(shape);
       EXPECT_EQ(a.matrix->state, SM_STATE_CLOSED);
       EXPECT_EQ(fn().qxsmconvert(open.matrix, open.matrix, flag), SM_OK);
-      EXPECT_EQ(contents(open.matrix), before) << name_of(shape);
+      EXPECT_EQ(entries(open.matrix), before) << name_of(shape);
       EXPECT_EQ(open.matrix->state, SM_STATE_OPEN);
     }
   }
@@ -262,18 +263,18 @@ TEST_P(Convert, the_same_record_twice_answers_0_and_stays) {
 TEST_P(Convert, the_kind_and_state_of_the_source_are_checked_before_the_target_is_touched) {
   Random random(11);
   const Filled kept = filled(session(), kGeneralColumns, 3, 4, random);
-  EXPECT_EQ(fn().qxsmconvert(untyped(session()), kept.matrix, 0), SM_UNTYPED);
-  EXPECT_EQ(fn().qxsmconvert(untyped(session(), true), kept.matrix, 0), SM_UNTYPED);
-  EXPECT_EQ(fn().qxsmconvert(untyped(session()), untyped(session()), 0), SM_UNTYPED);
+  EXPECT_EQ(fn().qxsmconvert(new_untyped(session()), kept.matrix, 0), SM_UNTYPED);
+  EXPECT_EQ(fn().qxsmconvert(new_untyped_with_an_entry(session()), kept.matrix, 0), SM_UNTYPED);
+  EXPECT_EQ(fn().qxsmconvert(new_untyped(session()), new_untyped(session()), 0), SM_UNTYPED);
   for (const Shape shape : kShapes) {
     const Unclosed open = unclosed(session(), shape);
     EXPECT_EQ(fn().qxsmconvert(open.matrix, kept.matrix, 0), SM_NOT_CLOSED) << name_of(shape);
-    EXPECT_EQ(fn().qxsmconvert(open.matrix, untyped(session()), 0), SM_NOT_CLOSED) << name_of(shape);
+    EXPECT_EQ(fn().qxsmconvert(open.matrix, new_untyped(session()), 0), SM_NOT_CLOSED) << name_of(shape);
     const Filled a = filled(session(), shape, 3, 3, random);
-    EXPECT_EQ(fn().qxsmconvert(a.matrix, untyped(session()), 0), SM_UNTYPED) << "the answer of sizing the target";
+    EXPECT_EQ(fn().qxsmconvert(a.matrix, new_untyped(session()), 0), SM_UNTYPED) << "the answer of sizing the target";
   }
-  EXPECT_EQ(fn().qxsmconvert(without_rows(session(), 3), kept.matrix, 0), SM_NOT_CLOSED);
-  EXPECT_EQ(contents(kept.matrix), kept.stored);
+  EXPECT_EQ(fn().qxsmconvert(new_without_rows(session(), 3), kept.matrix, 0), SM_NOT_CLOSED);
+  EXPECT_EQ(entries(kept.matrix), kept.stored);
 }
 
 INSTANTIATE_BOTH_HOSTS(Convert);

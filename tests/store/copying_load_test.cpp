@@ -34,7 +34,7 @@ class Load : public ModuleTest {
 TEST_P(Load, a_matrix_of_the_shape_takes_the_values_in_place) {
   for (const Shape shape : kDense) {
     const bool wide = shape.kind == SM_KIND_GENERAL;
-    SmMatrix* m = sized(session(), shape, 4, wide ? 7 : 4);
+    SmMatrix* m = new_sized(session(), shape, 4, wide ? 7 : 4);
     const double* array = m->values;
     const std::vector<double> values = counted(slots(shape, 4, wide ? 7 : 4));
     EXPECT_EQ(load(values.data(), m, 4, wide ? 7 : 4, shape), SM_OK) << name_of(shape);
@@ -47,7 +47,7 @@ TEST_P(Load, a_matrix_of_the_shape_takes_the_values_in_place) {
 TEST_P(Load, the_values_are_in_the_layout_of_the_format) {
   for (const Shape shape : kDense) {
     const std::vector<double> values = counted(slots(shape, 3, 3));
-    SmMatrix* m = sized(session(), kGeneralSparse, 1, 1);
+    SmMatrix* m = new_sized(session(), kGeneralSparse, 1, 1);
     ASSERT_EQ(load(values.data(), m, 3, 3, shape), SM_OK);
     for (std::int64_t r = 0; r < 3; ++r)
       for (std::int64_t c = 0; c < 3; ++c) {
@@ -85,7 +85,7 @@ TEST_P(Load, every_matrix_becomes_every_dense_shape_in_its_own_record) {
 
 TEST_P(Load, each_of_kind_format_rows_and_columns_asks_for_a_new_matrix) {
   const std::vector<double> values = counted(6);
-  SmMatrix* m = sized(session(), kGeneralRows, 2, 3);
+  SmMatrix* m = new_sized(session(), kGeneralRows, 2, 3);
   struct Wanted {
     std::int64_t rows, cols;
     Shape shape;
@@ -103,7 +103,7 @@ TEST_P(Load, each_of_kind_format_rows_and_columns_asks_for_a_new_matrix) {
 TEST_P(Load, loading_again_and_again_loses_no_pool_and_no_block) {
   for (const Shape from : {kSymmetricSparse, kGeneralSparse}) {
     const std::vector<double> values = counted(16);
-    SmMatrix* m = sized(session(), from, 6, 6);
+    SmMatrix* m = new_sized(session(), from, 6, 6);
     std::int64_t pools = 0;
     std::int64_t blocks = 0;
     for (int k = 0; k < 5; ++k) {
@@ -154,18 +154,74 @@ TEST_P(Load, an_open_tied_matrix_of_the_shape_stays_open_and_is_written_where_it
 
 TEST_P(Load, the_matrix_s_own_array_is_refused_when_it_would_be_given_back) {
   SmMatrix* m = filled_with(session(), kGeneralRows, 2, 3, {{{0, 0}, 1.0}, {{1, 2}, 6.0}}).matrix;
-  const Nonzeros before = contents(m);
+  const Nonzeros before = entries(m);
   EXPECT_EQ(load(m->values, m, 3, 2, kGeneralRows), SM_BAD_ARGUMENT);
   EXPECT_EQ(load(m->values, m, 2, 3, kGeneralColumns), SM_BAD_ARGUMENT);
   EXPECT_EQ(load(m->values, m, 1, 1, {4, SM_FORMAT_ROWS}), SM_BAD_ARGUMENT) << "before the kind is looked at";
   EXPECT_EQ(load(m->values, m, 3, 2, kGeneralSparse), SM_UNAVAILABLE) << "after format 21";
-  EXPECT_EQ(contents(m), before);
+  EXPECT_EQ(entries(m), before);
   EXPECT_EQ(load(m->values, m, 2, 3, kGeneralRows), SM_OK);
-  EXPECT_EQ(contents(m), before);
+  EXPECT_EQ(entries(m), before);
   std::vector<double> mine = counted(6);
   SmMatrix* tied = new_open_tied(session(), mine, 2, 3, SM_KIND_GENERAL, SM_FORMAT_ROWS);
   EXPECT_EQ(load(tied->values, tied, 3, 2, kGeneralRows), SM_OK) << "a tied one is not given back";
   expect_loaded(tied, counted(6), 3, 2, kGeneralRows);
+}
+
+TEST_P(Load, values_inside_an_array_that_would_be_given_back_are_refused_wherever_they_begin) {
+  Random random(7);
+  for (const Shape shape : kSquareFactored) {
+    SCOPED_TRACE(name_of(shape));
+    const Filled a = filled_definite(session(), shape, 4, random);
+    ASSERT_EQ(fn().qxsmfact(a.matrix, 0), SM_OK);
+    const std::int64_t count = a.matrix->nnz;
+    const double* factor = a.matrix->dense_factor;
+    for (const double* array : {static_cast<const double*>(a.matrix->values), factor})
+      for (const std::int64_t from : {std::int64_t{0}, std::int64_t{1}, count - 1}) {
+        EXPECT_EQ(load(array + from, a.matrix, 1, 1, kGeneralRows), SM_BAD_ARGUMENT) << from;
+        EXPECT_EQ(load(array + from, a.matrix, 3, -3, {9, 99}), SM_BAD_ARGUMENT) << "before the type is looked at";
+      }
+    EXPECT_EQ(contents(a.matrix), a.stored);
+    EXPECT_EQ(a.matrix->state, SM_STATE_FACTORED);
+    EXPECT_EQ(a.matrix->rank, 4);
+    EXPECT_EQ(a.matrix->dense_factor, factor);
+  }
+  const Filled sparse = filled_definite(session(), kSymmetricSparse, 4, random);
+  ASSERT_EQ(fn().qxsmfact(sparse.matrix, 0), SM_OK);
+  for (const double* p : {static_cast<const double*>(sparse.matrix->nz_values),
+                          static_cast<const double*>(sparse.matrix->nz_values + sparse.matrix->nnz - 1),
+                          static_cast<const double*>(sparse.matrix->factor_diag),
+                          static_cast<const double*>(sparse.matrix->factor_values)}) {
+    EXPECT_EQ(load(p, sparse.matrix, 1, 1, kGeneralRows), SM_BAD_ARGUMENT);
+  }
+  EXPECT_EQ(sparse.matrix->state, SM_STATE_FACTORED);
+}
+
+TEST_P(Load, a_factor_beside_a_tied_array_is_refused_and_the_tied_array_is_not) {
+  std::vector<double> mine{4.0, 2.0, 5.0};
+  SmMatrix* m = new_open_tied(session(), mine, 2, 2, SM_KIND_SYMMETRIC, SM_FORMAT_ROWS);
+  ASSERT_EQ(fn().qxsmclose(m, kNan), SM_OK);
+  ASSERT_EQ(fn().qxsmfact(m, 0), SM_OK);
+  EXPECT_EQ(load(m->dense_factor, m, 3, 1, kGeneralRows), SM_BAD_ARGUMENT);
+  EXPECT_EQ(load(mine.data() + 1, m, 2, 1, kGeneralRows), SM_OK);
+  expect_loaded(m, {2.0, 5.0}, 2, 1, kGeneralRows);
+}
+
+TEST_P(Load, into_its_shape_a_matrix_takes_values_from_its_own_factor_and_from_an_overlapping_array) {
+  SmMatrix* m = filled_with(session(), kDiagonalRows, 3, 3, {{{0, 0}, 4.0}, {{1, 1}, 9.0}, {{2, 2}, 16.0}}).matrix;
+  ASSERT_EQ(fn().qxsmfact(m, 0), SM_OK);
+  ASSERT_EQ(load(m->dense_factor, m, 3, 3, kDiagonalRows), SM_OK);
+  expect_loaded(m, {2.0, 3.0, 4.0}, 3, 3, kDiagonalRows);
+  for (const std::ptrdiff_t from : {0, 1, 2}) {
+    std::vector<double> mine = counted(8);
+    SmMatrix* tied = sized(session(), kGeneralRows, 1, 1);
+    ASSERT_EQ(qxsmtie(tied, mine.data() + 1, 2, 3, SM_KIND_GENERAL, SM_FORMAT_ROWS), SM_OK);
+    const std::vector<double> want(mine.begin() + from, mine.begin() + from + 6);
+    ASSERT_EQ(load(mine.data() + from, tied, 2, 3, kGeneralRows), SM_OK);
+    expect_loaded(tied, want, 2, 3, kGeneralRows);
+    EXPECT_EQ(mine.front(), 1.0);
+    EXPECT_EQ(mine.back(), 8.0);
+  }
 }
 
 TEST_P(Load, null_values_come_before_everything_and_do_nothing) {
@@ -175,9 +231,9 @@ TEST_P(Load, null_values_come_before_everything_and_do_nothing) {
     for (const std::int32_t format : {21, 22, 23, 99}) {
       EXPECT_EQ(qxsmcopyv(nullptr, a.matrix, 7, -1, shape.kind, format), SM_OK) << name_of(shape);
     }
-    EXPECT_EQ(contents(a.matrix), a.stored);
+    EXPECT_EQ(entries(a.matrix), a.stored);
   }
-  EXPECT_EQ(qxsmcopyv(nullptr, untyped(session()), 2, 2, SM_KIND_GENERAL, SM_FORMAT_ROWS), SM_OK);
+  EXPECT_EQ(qxsmcopyv(nullptr, new_untyped(session()), 2, 2, SM_KIND_GENERAL, SM_FORMAT_ROWS), SM_OK);
   SmMatrix* factored = filled_definite(session(), kSymmetricRows, 3, random).matrix;
   ASSERT_EQ(fn().qxsmfact(factored, 0), SM_OK);
   EXPECT_EQ(qxsmcopyv(nullptr, factored, 3, 3, SM_KIND_SYMMETRIC, SM_FORMAT_ROWS), SM_OK);
@@ -192,14 +248,14 @@ TEST_P(Load, the_sparse_format_answers_124_before_the_matrix_is_looked_at) {
     for (const std::int32_t kind : {1, 2, 3, 6, 9}) {
       EXPECT_EQ(qxsmcopyv(values.data(), a.matrix, 3, -3, kind, SM_FORMAT_SPARSE), SM_UNAVAILABLE) << name_of(shape);
     }
-    EXPECT_EQ(contents(a.matrix), a.stored);
+    EXPECT_EQ(entries(a.matrix), a.stored);
   }
-  EXPECT_EQ(load(values.data(), untyped(session()), 3, 3, kGeneralSparse), SM_UNAVAILABLE);
+  EXPECT_EQ(load(values.data(), new_untyped(session()), 3, 3, kGeneralSparse), SM_UNAVAILABLE);
 }
 
 TEST_P(Load, a_record_of_kind_none_answers_1_before_kind_format_and_size_are_looked_at) {
   const std::vector<double> values = counted(9);
-  SmMatrix* none = untyped(session());
+  SmMatrix* none = new_untyped(session());
   EXPECT_EQ(load(values.data(), none, 3, 3, kGeneralRows), SM_UNTYPED);
   EXPECT_EQ(load(values.data(), none, 3, -3, kGeneralRows), SM_UNTYPED);
   EXPECT_EQ(load(values.data(), none, 3, 3, {4, SM_FORMAT_ROWS}), SM_UNTYPED);
@@ -250,7 +306,7 @@ TEST_P(Load, a_size_that_is_refused_leaves_what_sizing_leaves) {
 TEST_P(Load, nothing_is_loaded_into_0_by_0) {
   const std::vector<double> values = counted(1);
   for (const Shape to : kDense) {
-    SmMatrix* m = sized(session(), to, 2, 2);
+    SmMatrix* m = new_sized(session(), to, 2, 2);
     EXPECT_EQ(load(values.data(), m, 0, 0, to), SM_OK) << name_of(to);
     EXPECT_EQ(m->nnz, 0);
     EXPECT_EQ(m->rows, 0);
@@ -260,7 +316,7 @@ TEST_P(Load, nothing_is_loaded_into_0_by_0) {
 
 TEST_P(Load, values_are_copied_to_the_bit) {
   const std::vector<double> odd{-0.0, kNan, -kInfinity, 5e-324};
-  SmMatrix* m = sized(session(), kDiagonalRows, 4, 4);
+  SmMatrix* m = new_sized(session(), kDiagonalRows, 4, 4);
   ASSERT_EQ(load(odd.data(), m, 4, 4, kDiagonalRows), SM_OK);
   EXPECT_EQ(bits(m->values, 4), bits(odd));
 }

@@ -108,7 +108,7 @@ TEST_P(DenseExtraction, a_factored_or_inverted_matrix_shows_its_values) {
 }
 
 TEST_P(DenseExtraction, a_matrix_that_grew_is_written_in_its_new_size) {
-  SmMatrix* general = sized(session(), kGeneralSparse, 2, 2);
+  SmMatrix* general = new_sized(session(), kGeneralSparse, 2, 2);
   ASSERT_EQ(fn().qxsmassign(general, 3, 5, 0, 7.0), SM_OK);
   Output out(24);
   EXPECT_EQ(fn().qxsmdense(general, out.data(), 2), SM_OK);
@@ -119,7 +119,7 @@ TEST_P(DenseExtraction, a_matrix_that_grew_is_written_in_its_new_size) {
   EXPECT_EQ(fn().qxsmdense(general, cleared.data(), 0), SM_UNAVAILABLE);
   EXPECT_TRUE(cleared.cleared());
 
-  SmMatrix* symmetric = sized(session(), kSymmetricSparse, 2, 2);
+  SmMatrix* symmetric = new_sized(session(), kSymmetricSparse, 2, 2);
   ASSERT_EQ(fn().qxsmassign(symmetric, 0, 3, 0, 7.0), SM_OK);
   ASSERT_EQ(fn().qxsmclose(symmetric, 0.0), SM_OK);
   Output packed_rows(10);
@@ -133,14 +133,14 @@ TEST_P(DenseExtraction, emptiness_kind_and_state_are_checked_before_the_output_i
   Output out(9);
   for (const std::int16_t mode : {std::int16_t{2}, std::int16_t{9}}) {
     for (const Shape shape : kShapes) {
-      EXPECT_EQ(fn().qxsmdense(sized(session(), shape, 0, 0), out.data(), mode), SM_OK) << name_of(shape);
+      EXPECT_EQ(fn().qxsmdense(new_sized(session(), shape, 0, 0), out.data(), mode), SM_OK) << name_of(shape);
       const Unclosed open = unclosed(session(), shape);
       EXPECT_EQ(fn().qxsmdense(open.matrix, out.data(), mode), SM_NOT_CLOSED) << name_of(shape);
     }
-    EXPECT_EQ(fn().qxsmdense(sized(session(), kGeneralSparse, 3, 3), out.data(), mode), SM_OK);
-    EXPECT_EQ(fn().qxsmdense(untyped(session()), out.data(), mode), SM_OK);
-    EXPECT_EQ(fn().qxsmdense(untyped(session(), true), out.data(), mode), SM_UNTYPED);
-    EXPECT_EQ(fn().qxsmdense(without_rows(session(), 3), out.data(), mode), SM_NOT_CLOSED);
+    EXPECT_EQ(fn().qxsmdense(new_sized(session(), kGeneralSparse, 3, 3), out.data(), mode), SM_OK);
+    EXPECT_EQ(fn().qxsmdense(new_untyped(session()), out.data(), mode), SM_OK);
+    EXPECT_EQ(fn().qxsmdense(new_untyped_with_an_entry(session()), out.data(), mode), SM_UNTYPED);
+    EXPECT_EQ(fn().qxsmdense(new_without_rows(session(), 3), out.data(), mode), SM_NOT_CLOSED);
   }
   EXPECT_TRUE(out.untouched());
 }
@@ -166,7 +166,7 @@ TEST_P(DenseExtraction, a_mode_that_is_not_served_answers_124_with_the_stored_fo
 }
 
 TEST_P(DenseExtraction, more_elements_than_any_array_holds_answer_105_before_anything_is_cleared) {
-  SmMatrix* m = sized(session(), kGeneralSparse, 2, SM_MAX_ELEMENTS);
+  SmMatrix* m = new_sized(session(), kGeneralSparse, 2, SM_MAX_ELEMENTS);
   ASSERT_EQ(fn().qxsmassign(m, 1, SM_MAX_ELEMENTS - 1, 0, 1.0), SM_OK);
   Output out(8);
   for (const std::int16_t mode : {std::int16_t{2}, std::int16_t{0}, std::int16_t{9}}) {

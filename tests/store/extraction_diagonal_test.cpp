@@ -90,14 +90,14 @@ TEST_P(DiagonalExtraction, a_factored_or_inverted_matrix_shows_the_diagonal_of_i
 TEST_P(DiagonalExtraction, emptiness_kind_state_and_range_are_checked_before_the_output_is_touched) {
   Output out(3);
   for (const Shape shape : kShapes) {
-    EXPECT_EQ(fn().qxsmdiag(sized(session(), shape, 0, 0), out.data(), 5, 1), SM_OK) << name_of(shape);
+    EXPECT_EQ(fn().qxsmdiag(new_sized(session(), shape, 0, 0), out.data(), 5, 1), SM_OK) << name_of(shape);
     const Unclosed open = unclosed(session(), shape);
     EXPECT_EQ(fn().qxsmdiag(open.matrix, out.data(), 5, 1), SM_NOT_CLOSED) << name_of(shape);
   }
-  EXPECT_EQ(fn().qxsmdiag(sized(session(), kGeneralSparse, 3, 3), out.data(), -1, 9), SM_OK);
-  EXPECT_EQ(fn().qxsmdiag(untyped(session()), out.data(), 0, 0), SM_OK);
-  EXPECT_EQ(fn().qxsmdiag(untyped(session(), true), out.data(), 5, 1), SM_UNTYPED);
-  EXPECT_EQ(fn().qxsmdiag(without_rows(session(), 3), out.data(), 5, 1), SM_NOT_CLOSED);
+  EXPECT_EQ(fn().qxsmdiag(new_sized(session(), kGeneralSparse, 3, 3), out.data(), -1, 9), SM_OK);
+  EXPECT_EQ(fn().qxsmdiag(new_untyped(session()), out.data(), 0, 0), SM_OK);
+  EXPECT_EQ(fn().qxsmdiag(new_untyped_with_an_entry(session()), out.data(), 5, 1), SM_UNTYPED);
+  EXPECT_EQ(fn().qxsmdiag(new_without_rows(session(), 3), out.data(), 5, 1), SM_NOT_CLOSED);
   Random random(5);
   using Range = std::pair<std::int64_t, std::int64_t>;
   for (const Shape shape : kShapes) {
@@ -172,7 +172,7 @@ TEST_P(DiagonalExtraction, a_diagonal_matrix_is_one_whatever_its_state) {
     EXPECT_EQ(flag_of(filled(session(), shape, 4, 4, random).matrix, -1.0), 1);
     const Unclosed open = unclosed(session(), shape);
     EXPECT_EQ(flag_of(open.matrix, 0.0), 1);
-    EXPECT_EQ(flag_of(sized(session(), shape, 0, 0), 0.0), 0) << "an empty one is not";
+    EXPECT_EQ(flag_of(new_sized(session(), shape, 0, 0), 0.0), 0) << "an empty one is not";
   }
 }
 
@@ -193,7 +193,7 @@ TEST_P(DiagonalExtraction, a_reordered_matrix_is_judged_by_all_it_stores) {
 TEST_P(DiagonalExtraction, the_flag_is_cleared_before_emptiness_kind_state_and_shape_are_checked) {
   int answer = -1;
   for (const Shape shape : kWithOffDiagonal) {
-    EXPECT_EQ(is_diagonal(sized(session(), shape, 0, 0), 0.0, &answer), SM_OK);
+    EXPECT_EQ(is_diagonal(new_sized(session(), shape, 0, 0), 0.0, &answer), SM_OK);
     EXPECT_EQ(answer, 0) << name_of(shape);
     const Unclosed open = unclosed(session(), shape);
     open.matrix->cols = 4;  // not square either
@@ -201,13 +201,13 @@ TEST_P(DiagonalExtraction, the_flag_is_cleared_before_emptiness_kind_state_and_s
     EXPECT_EQ(answer, 0);
     open.matrix->cols = 3;
   }
-  EXPECT_EQ(is_diagonal(sized(session(), kGeneralSparse, 3, 5), 0.0, &answer), SM_OK) << "empty before its shape";
+  EXPECT_EQ(is_diagonal(new_sized(session(), kGeneralSparse, 3, 5), 0.0, &answer), SM_OK) << "empty before its shape";
   EXPECT_EQ(answer, 0);
-  EXPECT_EQ(is_diagonal(untyped(session()), 0.0, &answer), SM_OK);
+  EXPECT_EQ(is_diagonal(new_untyped(session()), 0.0, &answer), SM_OK);
   EXPECT_EQ(answer, 0);
-  EXPECT_EQ(is_diagonal(untyped(session(), true), 0.0, &answer), SM_KIND_MISMATCH);
+  EXPECT_EQ(is_diagonal(new_untyped_with_an_entry(session()), 0.0, &answer), SM_KIND_MISMATCH);
   EXPECT_EQ(answer, 0);
-  EXPECT_EQ(is_diagonal(without_rows(session(), 3), 0.0, &answer), SM_NOT_CLOSED);
+  EXPECT_EQ(is_diagonal(new_without_rows(session(), 3), 0.0, &answer), SM_NOT_CLOSED);
   EXPECT_EQ(answer, 0);
   for (const Shape shape : {kGeneralSparse, kGeneralColumns, kGeneralRows}) {
     SmMatrix* m = filled_with(session(), shape, 3, 4, {{{1, 1}, 2.0}}).matrix;

@@ -141,22 +141,22 @@ TEST_P(RowExtraction, a_factored_or_inverted_matrix_with_an_array_of_its_own_sho
 TEST_P(RowExtraction, a_matrix_without_entries_answers_0_and_leaves_the_output) {
   Output out(3);
   for (const Shape shape : kShapes) {
-    EXPECT_EQ(qxsmrow(sized(session(), shape, 0, 0), 5, out.data(), 0), SM_OK) << name_of(shape);
+    EXPECT_EQ(qxsmrow(new_sized(session(), shape, 0, 0), 5, out.data(), 0), SM_OK) << name_of(shape);
   }
-  EXPECT_EQ(qxsmrow(sized(session(), kGeneralSparse, 3, 3), 5, out.data(), 0), SM_OK);
-  EXPECT_EQ(qxsmrow(untyped(session()), 5, out.data(), 0), SM_OK);
+  EXPECT_EQ(qxsmrow(new_sized(session(), kGeneralSparse, 3, 3), 5, out.data(), 0), SM_OK);
+  EXPECT_EQ(qxsmrow(new_untyped(session()), 5, out.data(), 0), SM_OK);
   EXPECT_TRUE(out.untouched());
 }
 
 TEST_P(RowExtraction, kind_then_state_then_row_are_checked_before_the_output_is_touched) {
   Output out(3);
-  EXPECT_EQ(qxsmrow(untyped(session(), true), 5, out.data(), 0), SM_UNTYPED);
+  EXPECT_EQ(qxsmrow(new_untyped_with_an_entry(session()), 5, out.data(), 0), SM_UNTYPED);
   for (const Shape shape : kShapes) {
     const Unclosed open = unclosed(session(), shape);
     EXPECT_EQ(qxsmrow(open.matrix, 0, out.data(), 0), SM_NOT_CLOSED) << name_of(shape);
     EXPECT_EQ(qxsmrow(open.matrix, -1, out.data(), 0), SM_NOT_CLOSED) << name_of(shape);
   }
-  EXPECT_EQ(qxsmrow(without_rows(session(), 3), 7, out.data(), 0), SM_NOT_CLOSED);
+  EXPECT_EQ(qxsmrow(new_without_rows(session(), 3), 7, out.data(), 0), SM_NOT_CLOSED);
   Random random(7);
   for (const Shape shape : kShapes) {
     SmMatrix* m = filled(session(), shape, 3, 3, random).matrix;

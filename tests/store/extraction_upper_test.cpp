@@ -18,8 +18,8 @@ class UpperExtraction : public ModuleTest {
     return qxsmUpperSub(m, out, b.r0, b.r1, b.c0, b.c1);
   }
 
-  // Every stored element (i, j) of the block at its place; one with i >= c0 and j > i also where a row j - c0 and a column
-  // i - r0 lead to, when that is inside.
+  // Every stored element (i, j) of the block at its place; one with i >= c0 and j > i also where a row j - c0 and a
+  // column i - r0 lead to, when that is inside.
   static std::vector<double> expected_block(const Filled& a, const Block& b) {
     const std::int64_t w = b.c1 - b.c0 + 1;
     std::vector<double> out(at(b.size()), 0.0);
@@ -74,15 +74,15 @@ TEST_P(UpperExtraction, rows_and_blocks_of_an_ordered_matrix_are_in_the_callers_
 
 TEST_P(UpperExtraction, a_row_of_a_matrix_that_is_not_readable_leaves_the_output) {
   Output out(3);
-  EXPECT_EQ(qxsmUpperRow(sized(session(), kGeneralSparse, 3, 3), 9, out.data()), SM_OK) << "empty";
-  EXPECT_EQ(qxsmUpperRow(sized(session(), kSymmetricSparse, 0, 0), 9, out.data()), SM_OK) << "empty";
-  EXPECT_EQ(qxsmUpperRow(untyped(session()), 0, out.data()), SM_OK) << "of kind none it is empty too";
-  EXPECT_EQ(qxsmUpperRow(untyped(session(), true), 9, out.data()), SM_UNTYPED);
+  EXPECT_EQ(qxsmUpperRow(new_sized(session(), kGeneralSparse, 3, 3), 9, out.data()), SM_OK) << "empty";
+  EXPECT_EQ(qxsmUpperRow(new_sized(session(), kSymmetricSparse, 0, 0), 9, out.data()), SM_OK) << "empty";
+  EXPECT_EQ(qxsmUpperRow(new_untyped(session()), 0, out.data()), SM_OK) << "of kind none it is empty too";
+  EXPECT_EQ(qxsmUpperRow(new_untyped_with_an_entry(session()), 9, out.data()), SM_UNTYPED);
   for (const Shape shape : kShapes) {
     const Unclosed open = unclosed(session(), shape);
     EXPECT_EQ(qxsmUpperRow(open.matrix, 9, out.data()), SM_NOT_CLOSED) << name_of(shape);
   }
-  EXPECT_EQ(qxsmUpperRow(without_rows(session(), 3), 0, out.data()), SM_NOT_CLOSED);
+  EXPECT_EQ(qxsmUpperRow(new_without_rows(session(), 3), 0, out.data()), SM_NOT_CLOSED);
   EXPECT_TRUE(out.untouched());
 }
 
@@ -150,9 +150,9 @@ TEST_P(UpperExtraction, a_block_on_the_diagonal_is_a_full_symmetric_one) {
 }
 
 TEST_P(UpperExtraction, a_mirror_is_placed_by_counting_from_the_beginning_and_left_out_behind_the_end) {
-  // Rows 0 .. 2 and columns 1 .. 3 of {1, 2, 3, 4; 5, 6, 7; 8, 9; 10}: the mirror of (1, 2) comes to row 1, column 1, where
-  // (1, 2) itself is; that of (1, 3) to row 2, column 1, and gives way to (2, 2); that of (2, 3) to row 2, column 2, where
-  // (2, 3) is.
+  // Rows 0 .. 2 and columns 1 .. 3 of {1, 2, 3, 4; 5, 6, 7; 8, 9; 10}: the mirror of (1, 2) comes to row 1, column 1,
+  // where (1, 2) itself is; that of (1, 3) to row 2, column 1, and gives way to (2, 2); that of (2, 3) to row 2, column
+  // 2, where (2, 3) is.
   Nonzeros full;
   for (std::int64_t i = 0, k = 1; i < 4; ++i)
     for (std::int64_t j = i; j < 4; ++j) full[{i, j}] = static_cast<double>(k++);
@@ -176,15 +176,15 @@ TEST_P(UpperExtraction, a_block_is_cleared_before_every_check) {
     EXPECT_EQ(block(m, out.data(), wanted), status);
     EXPECT_TRUE(out.cleared());
   };
-  expect_cleared(untyped(session()), b, SM_OK);
-  expect_cleared(sized(session(), kSymmetricSparse, 0, 0), b, SM_OK);
-  expect_cleared(sized(session(), kGeneralSparse, 2, 2), b, SM_OK);
-  expect_cleared(untyped(session(), true), b, SM_UNTYPED);
+  expect_cleared(new_untyped(session()), b, SM_OK);
+  expect_cleared(new_sized(session(), kSymmetricSparse, 0, 0), b, SM_OK);
+  expect_cleared(new_sized(session(), kGeneralSparse, 2, 2), b, SM_OK);
+  expect_cleared(new_untyped_with_an_entry(session()), b, SM_UNTYPED);
   for (const Shape shape : kShapes) {
     const Unclosed open = unclosed(session(), shape);
     expect_cleared(open.matrix, {0, 8, 0, 8}, SM_NOT_CLOSED);
   }
-  expect_cleared(without_rows(session(), 3), b, SM_NOT_CLOSED);
+  expect_cleared(new_without_rows(session(), 3), b, SM_NOT_CLOSED);
   Random random(7);
   for (const Shape shape : kShapes) {
     if (shape.kind == SM_KIND_SYMMETRIC && is_sparse(shape)) continue;
@@ -220,7 +220,7 @@ TEST_P(UpperExtraction, an_empty_block_has_nothing_to_clear) {
   for (const Block& b : {Block{2, 1, 2, 3}, Block{0, 1, 3, 2}, Block{3, 1, 3, 1}, Block{3, 0, 3, 0}, Block{0, -5, 0, 2},
                          Block{kHuge, -kHuge, kHuge, -kHuge}}) {
     EXPECT_EQ(block(m, out.data(), b), SM_OUTSIDE) << b.r0 << ".." << b.r1 << ", " << b.c0 << ".." << b.c1;
-    EXPECT_EQ(block(untyped(session()), out.data(), b), SM_OK);
+    EXPECT_EQ(block(new_untyped(session()), out.data(), b), SM_OK);
   }
   EXPECT_TRUE(out.untouched());
 }

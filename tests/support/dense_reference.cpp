@@ -25,6 +25,20 @@ Dense identity(std::int64_t n) {
   return a;
 }
 
+Dense from_rows(const std::vector<std::vector<double>>& rows) {
+  Dense a(static_cast<std::int64_t>(rows.size()), rows.empty() ? 0 : static_cast<std::int64_t>(rows[0].size()));
+  for (std::int64_t r = 0; r < a.rows(); ++r)
+    for (std::int64_t c = 0; c < a.cols(); ++c)
+      a(r, c) = rows[static_cast<std::size_t>(r)][static_cast<std::size_t>(c)];
+  return a;
+}
+
+Dense from_diagonal(const std::vector<double>& d) {
+  Dense a(static_cast<std::int64_t>(d.size()), static_cast<std::int64_t>(d.size()));
+  for (std::int64_t i = 0; i < a.rows(); ++i) a(i, i) = d[static_cast<std::size_t>(i)];
+  return a;
+}
+
 Dense transposed(const Dense& a) {
   Dense t(a.cols(), a.rows());
   for (std::int64_t r = 0; r < a.rows(); ++r)
@@ -47,6 +61,27 @@ Dense reordered(const Dense& a, const std::vector<std::int64_t>& perm) {
     for (std::int64_t j = 0; j < n; ++j)
       p(i, j) = a(perm[static_cast<std::size_t>(i)], perm[static_cast<std::size_t>(j)]);
   return p;
+}
+
+Dense trailing(const Dense& a, std::int64_t from) {
+  Dense t(a.rows() - from, a.cols() - from);
+  for (std::int64_t r = 0; r < t.rows(); ++r)
+    for (std::int64_t c = 0; c < t.cols(); ++c) t(r, c) = a(from + r, from + c);
+  return t;
+}
+
+Dense scaled(const Dense& a, long double s) {
+  Dense b(a.rows(), a.cols());
+  for (std::int64_t r = 0; r < a.rows(); ++r)
+    for (std::int64_t c = 0; c < a.cols(); ++c) b(r, c) = s * a(r, c);
+  return b;
+}
+
+Dense sum(const Dense& a, const Dense& b) {
+  Dense t(a.rows(), a.cols());
+  for (std::int64_t r = 0; r < a.rows(); ++r)
+    for (std::int64_t c = 0; c < a.cols(); ++c) t(r, c) = a(r, c) + b(r, c);
+  return t;
 }
 
 Dense principal(const Dense& a, const std::vector<bool>& keep) {
@@ -72,6 +107,13 @@ Dense columns(const std::vector<double>& x, std::int64_t n) {
   for (std::int64_t c = 0; c < count; ++c)
     for (std::int64_t r = 0; r < n; ++r) a(r, c) = x[static_cast<std::size_t>(c * n + r)];
   return a;
+}
+
+std::vector<double> row_major(const Dense& a) {
+  std::vector<double> v;
+  for (std::int64_t r = 0; r < a.rows(); ++r)
+    for (std::int64_t c = 0; c < a.cols(); ++c) v.push_back(static_cast<double>(a(r, c)));
+  return v;
 }
 
 DenseFactor factor_with_drops(const Dense& a, double tolerance) {

@@ -27,15 +27,23 @@ class Dense {
 };
 
 Dense identity(std::int64_t n);
+Dense from_rows(const std::vector<std::vector<double>>& rows);
+Dense from_diagonal(const std::vector<double>& d);
 Dense transposed(const Dense& a);
 Dense product(const Dense& a, const Dense& b);
 // Row and column k of the answer are row and column perm[k] of a.
 Dense reordered(const Dense& a, const std::vector<std::int64_t>& perm);
+// Row and column `from` and what follows.
+Dense trailing(const Dense& a, std::int64_t from);
+Dense scaled(const Dense& a, long double s);
+Dense sum(const Dense& a, const Dense& b);
 // The rows and columns whose flag is set.
 Dense principal(const Dense& a, const std::vector<bool>& keep);
 std::vector<double> product(const Dense& a, const std::vector<double>& x);
 // The n x k matrix whose columns lie one after the other in x.
 Dense columns(const std::vector<double>& x, std::int64_t n);
+// Element by element, row by row.
+std::vector<double> row_major(const Dense& a);
 
 // A = U'DU in the order given, unit upper triangular U. A dropped pivot has d = 0, and the rest of its row of U is 0.
 struct DenseFactor {
@@ -58,6 +66,7 @@ long double largest(const Dense& a);  // the largest magnitude, NaN when there i
 
 // Each element apart: |got - want| <= tolerance * max(1, largest magnitude of want). A NaN fails.
 ::testing::AssertionResult near(const Dense& got, const Dense& want, double tolerance);
+inline ::testing::AssertionResult same(const Dense& got, const Dense& want) { return near(got, want, 0.0); }
 ::testing::AssertionResult near(const std::vector<double>& got, const std::vector<double>& want, double tolerance);
 
 }  // namespace sm::test

@@ -3,6 +3,8 @@
 
 #include <gtest/gtest.h>
 
+#include <string>
+
 #include "support/test_host.hpp"
 
 namespace sm::test {
@@ -50,30 +52,60 @@ class ModuleTest : public ::testing::TestWithParam<HostKind> {
                            ::testing::Values(::sm::test::HostKind::embedded, ::sm::test::HostKind::minimal), \
                            [](const auto& i) { return ::sm::test::name_of(i.param); })
 
-// Runs `run` with every request refused in turn, first once and then from there on; see the comments at its body.
-//   prepare(Session&) -> anything    builds the problem without faults
+// Makes a call meet the refusal of each of its requests in turn, first once and then from there on, each time with a
+// fresh problem in a session of its own, which must leave nothing behind. A call that meets none must answer 0. Answers
+// how many requests there were.
+//   prepare(Session&) -> problem                   builds it without faults
 //   run(Session&, problem&) -> SmStatus
-// Expects 101 whenever a fault was met, no block left behind, and 0 when the same call is made again afterwards.
-template <class Prepare, class Run>
-void survives_every_allocation_failure(HostKind kind, Prepare prepare, Run run) {
+//   check(Session&, problem&, SmStatus, request)   looks at what a refusal left, and may make the call again
+template <class Prepare, class Run, class Check>
+std::int64_t refuse_each_request(HostKind kind, Prepare prepare, Run run, Check check) {
+  constexpr std::int64_t kEnough = 1000;
+  std::int64_t requests = kEnough;
   for (const bool for_ever : {false, true}) {
-    for (std::int64_t k = 0;; ++k) {
+    bool met = true;
+    for (std::int64_t k = 0; met && k < kEnough; ++k) {
+      SCOPED_TRACE("request " + std::to_string(k) + (for_ever ? " and on" : ""));
       Session session(kind);
-      ASSERT_NE(session.instance(), nullptr);
+      EXPECT_NE(session.instance(), nullptr);
       auto problem = prepare(session);
-      const std::int64_t blocks = session.host().live_blocks();
       session.host().fail_request(k, for_ever);
       const SmStatus status = run(session, problem);
-      if (session.host().stop_failing() == 0) {
+      met = session.host().stop_failing() > 0;
+      if (met) {
+        check(session, problem, status, k);
+      } else {
         EXPECT_EQ(status, SM_OK);
-        break;
+        requests = k;
       }
-      EXPECT_EQ(status, SM_NO_MEMORY) << "request " << k << (for_ever ? " and on" : "");
-      EXPECT_LE(session.host().live_blocks(), blocks) << "request " << k;
-      EXPECT_EQ(run(session, problem), SM_OK) << "after request " << k;
+      session.close();
+      EXPECT_EQ(session.host().live_pools(), 0);
+      EXPECT_EQ(session.host().live_blocks(), 0);
       EXPECT_EQ(session.host().violations(), 0);
     }
+    EXPECT_FALSE(met) << "more requests than anybody expects";
   }
+  return requests;
+}
+
+// Expects 101 of every refusal, no block left behind, and 0 when the same call is made again. Answers how many requests
+// there were.
+template <class Prepare, class Run>
+std::int64_t survives_every_allocation_failure(HostKind kind, Prepare prepare, Run run) {
+  std::int64_t blocks = 0;
+  return refuse_each_request(
+      kind,
+      [&](Session& session) {
+        auto problem = prepare(session);
+        blocks = session.host().live_blocks();
+        return problem;
+      },
+      run,
+      [&](Session& session, auto& problem, SmStatus status, std::int64_t) {
+        EXPECT_EQ(status, SM_NO_MEMORY);
+        EXPECT_LE(session.host().live_blocks(), blocks);
+        EXPECT_EQ(run(session, problem), SM_OK) << "again";
+      });
 }
 
 bool is_missing(double value);  // the missing value, to the bit

@@ -4,6 +4,8 @@
 #include <cmath>
 #include <numeric>
 
+#include "support/shapes.hpp"
+
 namespace sm::test {
 
 namespace {
@@ -17,8 +19,6 @@ Graph sorted(Graph graph) {
   graph.edges.erase(std::unique(graph.edges.begin(), graph.edges.end()), graph.edges.end());
   return graph;
 }
-
-std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
 }  // namespace
 
@@ -175,6 +175,22 @@ Graph any_graph(Random& random, std::int64_t limit) {
       break;
   }
   return random.chance(50) ? relabelled(g, random.permutation(g.n)) : g;
+}
+
+Dense random_dense(Random& random, std::int64_t rows, std::int64_t cols, std::int64_t percent) {
+  Dense a(rows, cols);
+  for (std::int64_t r = 0; r < rows; ++r)
+    for (std::int64_t c = 0; c < cols; ++c)
+      if (random.chance(percent)) a(r, c) = random.dyadic();
+  return a;
+}
+
+Dense random_symmetric(Random& random, std::int64_t n, std::int64_t percent) {
+  Dense a(n, n);
+  for (std::int64_t r = 0; r < n; ++r)
+    for (std::int64_t c = r; c < n; ++c)
+      if (r == c || random.chance(percent)) a(r, c) = a(c, r) = random.dyadic();
+  return a;
 }
 
 Dense Problem::dense() const {

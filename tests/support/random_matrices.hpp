@@ -48,6 +48,10 @@ Graph relabelled(const Graph& graph, const std::vector<std::int64_t>& label);
 // One of the families above, of an order below `limit`.
 Graph any_graph(Random& random, std::int64_t limit);
 
+// Multiples of 1/64, about `percent` of them stored; symmetric ones have a full diagonal.
+Dense random_dense(Random& random, std::int64_t rows, std::int64_t cols, std::int64_t percent = 100);
+Dense random_symmetric(Random& random, std::int64_t n, std::int64_t percent = 100);
+
 struct Entry {
   std::int64_t row;
   std::int64_t col;

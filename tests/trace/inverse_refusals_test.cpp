@@ -2,15 +2,12 @@
 #include <gtest/gtest.h>
 
 #include "cholesky/cholesky_support.hpp"
-#include "store/filled.hpp"
+#include "trace/trace_refusals.hpp"
 
 namespace sm::test {
 namespace {
 
-constexpr Shape kWithInverse[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalColumns, kDiagonalRows};
-constexpr Shape kGeneral[] = {kGeneralSparse, kGeneralColumns, kGeneralRows};
-
-class InverseTraceRefusals : public ModuleTest {
+class InverseTraceRefusals : public TraceRefusals {
  protected:
   SmStatus trace(SmMatrix* a, SmMatrix* b, std::int64_t start, double* result) {
     Output out(1);
@@ -32,10 +29,6 @@ class InverseTraceRefusals : public ModuleTest {
     EXPECT_EQ(result, sum) << "status " << status;
     return status;
   }
-  SmMatrix* some(Shape shape, std::int64_t rows, std::int64_t cols) {
-    Random random(1);
-    return filled(session(), shape, rows, cols, random).matrix;
-  }
   SmMatrix* definite(Shape shape, std::int64_t n) {
     Random random(2);
     return filled_definite(session(), shape, n, random).matrix;
@@ -49,34 +42,11 @@ class InverseTraceRefusals : public ModuleTest {
 };
 
 TEST_P(InverseTraceRefusals, two_empty_matrices_or_one_of_kind_none_answer_100_before_the_state) {
-  for (const Shape sa : kShapes)
-    for (const Shape sb : kShapes) {
-      SmMatrix* a = sized(session(), sa, 0, 0);
-      SmMatrix* b = sized(session(), sb, 0, 0);
-      a->state = b->state = SM_STATE_OPEN;
-      EXPECT_EQ(refused(a, b, -1), SM_NOTHING_TO_REPORT) << name_of(sa) << ", " << name_of(sb);
-    }
-  EXPECT_EQ(refused(sized(session(), kGeneralSparse, 3, 4), sized(session(), kGeneralSparse, 2, 5)),
-            SM_NOTHING_TO_REPORT);
-  for (const Shape shape : kShapes) {
-    const Unclosed open = unclosed(session(), shape);
-    EXPECT_EQ(refused(untyped(session()), open.matrix), SM_NOTHING_TO_REPORT);
-    EXPECT_EQ(refused(open.matrix, untyped(session())), SM_NOTHING_TO_REPORT);
-    EXPECT_EQ(refused(untyped(session(), true), open.matrix), SM_NOTHING_TO_REPORT);
-    EXPECT_EQ(refused(open.matrix, untyped(session(), true)), SM_NOTHING_TO_REPORT);
-  }
+  expect_nothing_to_report([&](SmMatrix* a, SmMatrix* b) { return refused(a, b, -1); });
 }
 
 TEST_P(InverseTraceRefusals, one_open_matrix_of_two_answers_113_before_the_sizes_are_compared) {
-  for (const Shape shape : kShapes) {
-    const Unclosed open = unclosed(session(), shape);
-    for (const Shape other : kShapes) {
-      EXPECT_EQ(refused(open.matrix, some(other, 5, 5)), SM_NOT_CLOSED) << name_of(shape) << ", " << name_of(other);
-      EXPECT_EQ(refused(some(other, 5, 5), open.matrix), SM_NOT_CLOSED) << name_of(other) << ", " << name_of(shape);
-    }
-  }
-  EXPECT_EQ(refused(without_rows(session(), 3), some(kSymmetricRows, 4, 4)), SM_NOT_CLOSED);
-  EXPECT_EQ(refused(some(kSymmetricRows, 4, 4), without_rows(session(), 3)), SM_NOT_CLOSED);
+  expect_not_closed([&](SmMatrix* a, SmMatrix* b) { return refused(a, b); });
 }
 
 TEST_P(InverseTraceRefusals, orders_that_do_not_agree_answer_111_before_the_kind_is_looked_at) {
@@ -84,19 +54,19 @@ TEST_P(InverseTraceRefusals, orders_that_do_not_agree_answer_111_before_the_kind
     for (const Shape sb : kShapes) {
       EXPECT_EQ(refused(some(sa, 4, 4), some(sb, 5, 5), -1), SM_NOT_SQUARE) << name_of(sa) << ", " << name_of(sb);
     }
-  for (const Shape sa : kGeneral) {
+  for (const Shape sa : kGeneralShapes) {
     EXPECT_EQ(refused(some(sa, 3, 5), some(kGeneralRows, 3, 3)), SM_NOT_SQUARE) << name_of(sa);
     EXPECT_EQ(refused(some(sa, 5, 3), some(kGeneralRows, 5, 5)), SM_NOT_SQUARE) << name_of(sa);
     EXPECT_EQ(refused(definite(kSymmetricRows, 5), some(sa, 3, 5)), SM_NOT_SQUARE) << "rows count, not columns";
   }
-  EXPECT_EQ(refused(sized(session(), kSymmetricRows, 0, 0), some(kGeneralRows, 4, 4)), SM_NOT_SQUARE)
+  EXPECT_EQ(refused(new_sized(session(), kSymmetricRows, 0, 0), some(kGeneralRows, 4, 4)), SM_NOT_SQUARE)
       << "one empty matrix is looked at like any other";
-  EXPECT_EQ(refused(definite(kSymmetricRows, 4), sized(session(), kGeneralSparse, 3, 4)), SM_NOT_SQUARE);
+  EXPECT_EQ(refused(definite(kSymmetricRows, 4), new_sized(session(), kGeneralSparse, 3, 4)), SM_NOT_SQUARE);
 }
 
 TEST_P(InverseTraceRefusals, a_general_or_inverted_matrix_answers_124) {
   for (const Shape sb : kShapes) {
-    for (const Shape sa : kGeneral) {
+    for (const Shape sa : kGeneralShapes) {
       EXPECT_EQ(refused(some(sa, 4, 4), some(sb, 4, 4), -1), SM_UNAVAILABLE) << name_of(sa) << ", " << name_of(sb);
     }
     for (const Shape sa : kSquareFactored)
@@ -106,11 +76,11 @@ TEST_P(InverseTraceRefusals, a_general_or_inverted_matrix_answers_124) {
         EXPECT_EQ(refused(a, some(sb, 4, 4), 9), SM_UNAVAILABLE) << name_of(sa) << ", " << name_of(sb);
       }
   }
-  EXPECT_EQ(refused(sized(session(), kGeneralSparse, 4, 4), some(kSymmetricRows, 4, 4)), SM_UNAVAILABLE);
+  EXPECT_EQ(refused(new_sized(session(), kGeneralSparse, 4, 4), some(kSymmetricRows, 4, 4)), SM_UNAVAILABLE);
 }
 
 TEST_P(InverseTraceRefusals, a_matrix_that_cannot_be_factored_answers_103_before_a_row_is_read) {
-  for (const Shape sa : kWithInverse) {
+  for (const Shape sa : kInvertible) {
     SmMatrix* a = indefinite(sa, 3);
     EXPECT_EQ(refused(a, some(kGeneralRows, 3, 3), -1), SM_NOT_DEFINITE) << name_of(sa);
     EXPECT_EQ(refused(a, some(kGeneralRows, 3, 3), 3), SM_NOT_DEFINITE) << name_of(sa) << ", behind the last row";
@@ -119,7 +89,7 @@ TEST_P(InverseTraceRefusals, a_matrix_that_cannot_be_factored_answers_103_before
 }
 
 TEST_P(InverseTraceRefusals, a_negative_start_answers_117_with_a_sum_of_0) {
-  for (const Shape sa : kWithInverse)
+  for (const Shape sa : kInvertible)
     for (const Shape sb : kShapes) {
       for (const std::int64_t start : {std::int64_t{-1}, -kHuge - 1}) {
         EXPECT_EQ(ended(definite(sa, 4), some(sb, 4, 4), start, 0.0), SM_OUTSIDE) << name_of(sa) << ", " << name_of(sb);
@@ -128,7 +98,7 @@ TEST_P(InverseTraceRefusals, a_negative_start_answers_117_with_a_sum_of_0) {
 }
 
 TEST_P(InverseTraceRefusals, a_reordered_sparse_second_matrix_answers_118_with_a_sum_of_0) {
-  for (const Shape sa : kWithInverse)
+  for (const Shape sa : kInvertible)
     for (std::int32_t state = SM_STATE_REORDERED; state <= SM_STATE_FACTORED; ++state) {
       SmMatrix* b = definite(kSymmetricSparse, 4);
       ASSERT_EQ(bring_to(b, state), SM_OK);

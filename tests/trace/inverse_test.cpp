@@ -7,8 +7,6 @@
 namespace sm::test {
 namespace {
 
-constexpr Shape kWithInverse[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalColumns, kDiagonalRows};
-
 // Sum over j from `start` on of element j of the inverse times row j of b as it is read from `start` on. What a row is
 // short of is 0, and what it has too much meets nothing.
 double expected(const Dense& inverse_a, const Filled& b, std::int64_t start) {
@@ -39,21 +37,21 @@ class InverseTrace : public ModuleTest {
 
 TEST_P(InverseTrace, every_pair_of_shapes_is_summed_from_every_start) {
   Random random(1);
-  for (const Shape sa : kWithInverse)
+  for (const Shape sa : kInvertible)
     for (const Shape sb : kShapes)
       for (const std::int64_t n : {1, 2, 8}) {
         const Filled a = filled_definite(session(), sa, n, random);
         const Filled b = filled(session(), sb, n, n, random);
         expect_every_start(a.matrix, inverse(a.dense), b);
         EXPECT_EQ(a.matrix->state, SM_STATE_FACTORED);
-        EXPECT_EQ(contents(b.matrix), b.stored);
+        EXPECT_EQ(entries(b.matrix), b.stored);
         EXPECT_EQ(b.matrix->state, SM_STATE_CLOSED);
       }
 }
 
 TEST_P(InverseTrace, the_whole_sum_with_a_symmetric_matrix_is_the_trace_of_the_product) {
   Random random(2);
-  for (const Shape sa : kWithInverse)
+  for (const Shape sa : kInvertible)
     for (const Shape sb : {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalRows}) {
       const Filled a = filled_definite(session(), sa, 12, random);
       const Filled b = filled(session(), sb, 12, 12, random);
@@ -90,7 +88,7 @@ TEST_P(InverseTrace, rows_that_come_moved_meet_the_inverse_where_they_are) {
 
 TEST_P(InverseTrace, rows_shorter_or_longer_than_the_order_are_filled_up_or_cut) {
   Random random(3);
-  for (const Shape sa : kWithInverse)
+  for (const Shape sa : kInvertible)
     for (const Shape sb : {kGeneralSparse, kGeneralColumns, kGeneralRows})
       for (const std::int64_t cols : {1, 3, 5, 7, 40}) {
         const Filled a = filled_definite(session(), sa, 5, random);
@@ -100,7 +98,7 @@ TEST_P(InverseTrace, rows_shorter_or_longer_than_the_order_are_filled_up_or_cut)
 
 TEST_P(InverseTrace, a_start_behind_the_last_row_gives_0_and_a_factored_matrix) {
   Random random(4);
-  for (const Shape sa : kWithInverse) {
+  for (const Shape sa : kInvertible) {
     const Filled a = filled_definite(session(), sa, 4, random);
     const Filled b = filled(session(), kSymmetricRows, 4, 4, random);
     for (const std::int64_t start : {std::int64_t{4}, std::int64_t{5}, kHuge}) {
@@ -127,7 +125,7 @@ TEST_P(InverseTrace, the_first_matrix_is_taken_from_the_state_it_is_in) {
 
 TEST_P(InverseTrace, the_second_matrix_is_read_in_every_state_that_has_rows) {
   Random random(6);
-  for (const Shape sa : kWithInverse) {
+  for (const Shape sa : kInvertible) {
     const Filled a = filled_definite(session(), sa, 7, random);
     const Filled ordered = filled_definite(session(), kSymmetricSparse, 7, random);
     ASSERT_EQ(bring_to(ordered.matrix, SM_STATE_ORDERED), SM_OK);
@@ -171,9 +169,9 @@ TEST_P(InverseTrace, a_generalized_inverse_times_its_matrix_has_the_rank_as_its_
 
 TEST_P(InverseTrace, a_second_matrix_without_entries_gives_0) {
   Random random(8);
-  SmMatrix* trees = sized(session(), kGeneralSparse, 4, 4);
-  SmMatrix* narrow = sized(session(), kGeneralSparse, 4, 1);
-  for (const Shape sa : kWithInverse) {
+  SmMatrix* trees = new_sized(session(), kGeneralSparse, 4, 4);
+  SmMatrix* narrow = new_sized(session(), kGeneralSparse, 4, 1);
+  for (const Shape sa : kInvertible) {
     const Filled a = filled_definite(session(), sa, 4, random);
     EXPECT_EQ(trace_of(a.matrix, trees, 0), 0.0) << name_of(sa);
     EXPECT_EQ(trace_of(a.matrix, narrow, 0), 0.0) << name_of(sa);

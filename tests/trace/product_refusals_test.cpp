@@ -2,12 +2,12 @@
 #include <gtest/gtest.h>
 
 #include "cholesky/cholesky_support.hpp"
-#include "store/filled.hpp"
+#include "trace/trace_refusals.hpp"
 
 namespace sm::test {
 namespace {
 
-class ProductTraceRefusals : public ModuleTest {
+class ProductTraceRefusals : public TraceRefusals {
  protected:
   // The status of a call that must leave the missing value.
   SmStatus refused(SmMatrix* a, SmMatrix* b) {
@@ -16,45 +16,16 @@ class ProductTraceRefusals : public ModuleTest {
     EXPECT_TRUE(is_missing(out.values()[0])) << "status " << status;
     return status;
   }
-  SmMatrix* some(Shape shape, std::int64_t rows, std::int64_t cols) {
-    Random random(1);
-    return filled(session(), shape, rows, cols, random).matrix;
-  }
 };
 
-constexpr Shape kGeneral[] = {kGeneralSparse, kGeneralColumns, kGeneralRows};
 constexpr Shape kNotGeneral[] = {kSymmetricSparse, kSymmetricColumns, kSymmetricRows, kDiagonalColumns, kDiagonalRows};
 
 TEST_P(ProductTraceRefusals, two_empty_matrices_or_one_of_kind_none_answer_100_before_state_and_size) {
-  for (const Shape sa : kShapes)
-    for (const Shape sb : kShapes) {
-      SmMatrix* a = sized(session(), sa, 0, 0);
-      SmMatrix* b = sized(session(), sb, 0, 0);
-      a->state = b->state = SM_STATE_OPEN;
-      EXPECT_EQ(refused(a, b), SM_NOTHING_TO_REPORT) << name_of(sa) << ", " << name_of(sb);
-    }
-  EXPECT_EQ(refused(sized(session(), kGeneralSparse, 3, 4), sized(session(), kGeneralSparse, 2, 5)),
-            SM_NOTHING_TO_REPORT);
-  for (const Shape shape : kShapes) {
-    const Unclosed open = unclosed(session(), shape);
-    EXPECT_EQ(refused(untyped(session()), open.matrix), SM_NOTHING_TO_REPORT);
-    EXPECT_EQ(refused(open.matrix, untyped(session())), SM_NOTHING_TO_REPORT);
-    EXPECT_EQ(refused(open.matrix, untyped(session(), true)), SM_NOTHING_TO_REPORT);
-    EXPECT_EQ(refused(untyped(session(), true), open.matrix), SM_NOTHING_TO_REPORT);
-  }
+  expect_nothing_to_report([&](SmMatrix* a, SmMatrix* b) { return refused(a, b); });
 }
 
 TEST_P(ProductTraceRefusals, one_open_matrix_of_two_answers_113_before_the_sizes_are_compared) {
-  for (const Shape shape : kShapes) {
-    const Unclosed open = unclosed(session(), shape);
-    for (const Shape other : kShapes) {
-      EXPECT_EQ(refused(open.matrix, some(other, 5, 5)), SM_NOT_CLOSED) << name_of(shape) << ", " << name_of(other);
-      EXPECT_EQ(refused(some(other, 5, 5), open.matrix), SM_NOT_CLOSED) << name_of(other) << ", " << name_of(shape);
-    }
-    EXPECT_EQ(refused(open.matrix, sized(session(), kGeneralSparse, 9, 9)), SM_NOT_CLOSED) << "with an empty one too";
-  }
-  EXPECT_EQ(refused(without_rows(session(), 3), some(kSymmetricRows, 3, 3)), SM_NOT_CLOSED);
-  EXPECT_EQ(refused(some(kSymmetricRows, 3, 3), without_rows(session(), 3)), SM_NOT_CLOSED);
+  expect_not_closed([&](SmMatrix* a, SmMatrix* b) { return refused(a, b); });
 }
 
 TEST_P(ProductTraceRefusals, columns_that_are_not_the_others_rows_answer_121_before_the_pair_is_looked_at) {
@@ -62,21 +33,21 @@ TEST_P(ProductTraceRefusals, columns_that_are_not_the_others_rows_answer_121_bef
     for (const Shape sb : kShapes) {
       EXPECT_EQ(refused(some(sa, 4, 4), some(sb, 5, 5)), SM_DIMENSION_MISMATCH) << name_of(sa) << ", " << name_of(sb);
     }
-  for (const Shape sa : kGeneral)
-    for (const Shape sb : kGeneral) {
+  for (const Shape sa : kGeneralShapes)
+    for (const Shape sb : kGeneralShapes) {
       EXPECT_EQ(refused(some(sa, 3, 5), some(sb, 3, 5)), SM_DIMENSION_MISMATCH) << name_of(sa) << ", " << name_of(sb);
     }
   SmMatrix* odd = some(kGeneralRows, 3, 3);
   odd->kind = 9;
   EXPECT_EQ(refused(odd, some(kGeneralRows, 4, 4)), SM_DIMENSION_MISMATCH);
   EXPECT_EQ(refused(odd, some(kGeneralRows, 3, 3)), SM_UNAVAILABLE);
-  EXPECT_EQ(refused(sized(session(), kGeneralSparse, 3, 3), some(kGeneralRows, 4, 4)), SM_DIMENSION_MISMATCH)
+  EXPECT_EQ(refused(new_sized(session(), kGeneralSparse, 3, 3), some(kGeneralRows, 4, 4)), SM_DIMENSION_MISMATCH)
       << "one empty matrix is looked at like any other";
-  EXPECT_EQ(refused(sized(session(), kSymmetricRows, 0, 0), some(kGeneralRows, 4, 4)), SM_DIMENSION_MISMATCH);
+  EXPECT_EQ(refused(new_sized(session(), kSymmetricRows, 0, 0), some(kGeneralRows, 4, 4)), SM_DIMENSION_MISMATCH);
 }
 
 TEST_P(ProductTraceRefusals, a_general_matrix_serves_a_general_one_only) {
-  for (const Shape sa : kGeneral) {
+  for (const Shape sa : kGeneralShapes) {
     for (const Shape sb : kNotGeneral) {
       EXPECT_EQ(refused(some(sa, 4, 4), some(sb, 4, 4)), SM_UNAVAILABLE) << name_of(sa) << ", " << name_of(sb);
       EXPECT_EQ(refused(some(sa, 2, 4), some(sb, 4, 4)), SM_UNAVAILABLE) << name_of(sa) << ", " << name_of(sb);
@@ -85,14 +56,14 @@ TEST_P(ProductTraceRefusals, a_general_matrix_serves_a_general_one_only) {
 }
 
 TEST_P(ProductTraceRefusals, a_symmetric_matrix_by_columns_serves_no_general_one) {
-  for (const Shape sb : kGeneral) {
+  for (const Shape sb : kGeneralShapes) {
     EXPECT_EQ(refused(some(kSymmetricColumns, 4, 4), some(sb, 4, 4)), SM_UNAVAILABLE) << name_of(sb);
     EXPECT_EQ(refused(some(kSymmetricColumns, 4, 4), some(sb, 4, 2)), SM_UNAVAILABLE) << name_of(sb);
   }
 }
 
-// Formats that no call makes: the first matrix is looked at before the second, and what is not computed is told by 0 and
-// the missing value.
+// Formats that no call makes: the first matrix is looked at before the second, and what is not computed is told by 0
+// and the missing value.
 TEST_P(ProductTraceRefusals, a_format_that_does_not_exist_is_answered_by_the_first_matrix_then_by_the_second) {
   SmMatrix* odd_general = some(kGeneralRows, 4, 4);
   odd_general->format = 24;
@@ -103,7 +74,7 @@ TEST_P(ProductTraceRefusals, a_format_that_does_not_exist_is_answered_by_the_fir
   EXPECT_EQ(refused(some(kSymmetricSparse, 4, 4), odd_general), SM_OK);
   EXPECT_EQ(refused(some(kSymmetricRows, 4, 4), odd_general), SM_UNAVAILABLE);
   EXPECT_EQ(refused(some(kSymmetricColumns, 4, 4), odd_general), SM_UNAVAILABLE);
-  for (const Shape sa : kGeneral) EXPECT_EQ(refused(some(sa, 4, 4), odd_general), SM_UNAVAILABLE) << name_of(sa);
+  for (const Shape sa : kGeneralShapes) EXPECT_EQ(refused(some(sa, 4, 4), odd_general), SM_UNAVAILABLE) << name_of(sa);
   odd_general->format = SM_FORMAT_ROWS;
   odd_symmetric->format = SM_FORMAT_ROWS;
 }

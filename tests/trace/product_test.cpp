@@ -55,8 +55,8 @@ TEST_P(ProductTrace, every_pair_of_shapes_that_is_served_sums_every_product) {
         const Filled a = filled(session(), sa, n, n, random);
         const Filled b = filled(session(), sb, n, n, random);
         EXPECT_EQ(trace_of(a.matrix, b.matrix), expected(a.dense, b.dense)) << name_of(sa) << ", " << name_of(sb);
-        EXPECT_EQ(contents(a.matrix), a.stored);
-        EXPECT_EQ(contents(b.matrix), b.stored);
+        EXPECT_EQ(entries(a.matrix), a.stored);
+        EXPECT_EQ(entries(b.matrix), b.stored);
       }
     }
 }
@@ -152,7 +152,7 @@ TEST_P(ProductTrace, factored_and_inverted_matrices_with_an_array_of_their_own_c
 
 TEST_P(ProductTrace, one_empty_matrix_of_two_gives_0) {
   Random random(7);
-  SmMatrix* trees = sized(session(), kGeneralSparse, 4, 4);
+  SmMatrix* trees = new_sized(session(), kGeneralSparse, 4, 4);
   for (const Shape shape : kShapes) {
     SmMatrix* other = filled(session(), shape, 4, 4, random).matrix;
     if (served(shape, kGeneralSparse)) {
@@ -162,7 +162,7 @@ TEST_P(ProductTrace, one_empty_matrix_of_two_gives_0) {
       EXPECT_EQ(bits(trace_of(trees, other)), 0U) << name_of(shape);
     }
   }
-  SmMatrix* narrow = sized(session(), kGeneralSparse, 4, 2);
+  SmMatrix* narrow = new_sized(session(), kGeneralSparse, 4, 2);
   EXPECT_EQ(trace_of(filled(session(), kDiagonalRows, 4, 4, random).matrix, narrow), 0.0);
 }
 

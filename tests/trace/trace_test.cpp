@@ -105,14 +105,14 @@ TEST_P(Trace, a_matrix_is_summed_in_every_state) {
 
 TEST_P(Trace, a_matrix_without_entries_or_kind_answers_100) {
   for (const Shape shape : kShapes) {
-    SmMatrix* a = sized(session(), shape, 0, 0);
+    SmMatrix* a = new_sized(session(), shape, 0, 0);
     EXPECT_EQ(refused(a), SM_NOTHING_TO_REPORT) << name_of(shape);
     a->state = SM_STATE_OPEN;
     EXPECT_EQ(refused(a), SM_NOTHING_TO_REPORT) << "before the state is looked at";
   }
-  EXPECT_EQ(refused(sized(session(), kGeneralSparse, 3, 3)), SM_NOTHING_TO_REPORT);
-  EXPECT_EQ(refused(untyped(session())), SM_NOTHING_TO_REPORT);
-  EXPECT_EQ(refused(untyped(session(), true)), SM_NOTHING_TO_REPORT);
+  EXPECT_EQ(refused(new_sized(session(), kGeneralSparse, 3, 3)), SM_NOTHING_TO_REPORT);
+  EXPECT_EQ(refused(new_untyped(session())), SM_NOTHING_TO_REPORT);
+  EXPECT_EQ(refused(new_untyped_with_an_entry(session())), SM_NOTHING_TO_REPORT);
 }
 
 TEST_P(Trace, a_matrix_that_is_not_closed_answers_113) {
@@ -124,7 +124,7 @@ TEST_P(Trace, a_matrix_that_is_not_closed_answers_113) {
     EXPECT_EQ(refused(a.matrix), SM_NOT_CLOSED) << "before the kind is looked at";
     a.matrix->kind = kind;
   }
-  EXPECT_EQ(refused(without_rows(session(), 3)), SM_NOT_CLOSED);
+  EXPECT_EQ(refused(new_without_rows(session(), 3)), SM_NOT_CLOSED);
 }
 
 TEST_P(Trace, another_kind_answers_110_and_another_format_124) {
