@@ -40,7 +40,7 @@ std::vector<Case> cases_of(Size size) {
   each("f", {{{150}, {1000, 5000}, {5000, 15000, 50000}}}, random_coefficients);
   each("arrow", {{{500}, {12500, 50000}, {12500, 50000}}}, arrowhead, {"ordering"});
   for (const int second : pick(size, {{{500}, {5000, 20000}, {5000, 20000}}})) {
-    cases.push_back({"crossed", [second] { return crossed_factors(300, second, 15); }, {"ordering"}});
+    cases.push_back({"crossed", [second] { return crossed_factors(300, second, 10); }, {"ordering"}});
   }
   for (const int hubs : {1, 30, 1000}) {
     for (const int n : pick(size, {{{2000}, {10000, 100000}, {10000, 100000, 1000000}}})) {

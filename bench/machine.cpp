@@ -59,6 +59,7 @@ Json describe_machine(const std::string& module_file, Clock clock) {
             {"metis", fmt::format("{}.{}.{}", METIS_VER_MAJOR, METIS_VER_MINOR, METIS_VER_SUBMINOR)},
             {"eigen", fmt::format("{}.{}.{}", EIGEN_WORLD_VERSION, EIGEN_MAJOR_VERSION, EIGEN_MINOR_VERSION)},
             {"openblas", openblas_get_config()},
+            {"kernels", kernels()},
             {"blas_files", linear_algebra()},
             {"clock", clock == Clock::cpu ? "cpu" : "wall"},
             {"load", load[0]},

@@ -2,9 +2,12 @@
 #include <unistd.h>
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
-#include <iostream>
+#include <filesystem>
+#include <map>
+#include <optional>
 
 #include "bench/cases.hpp"
 #include "bench/harness/clock.hpp"
@@ -84,12 +87,16 @@ int main_of(int argc, char** argv) {
   return run(options);
 }
 
-// Libraries read these when they are loaded, so they must be there before the process starts.
-void start_again_with_one_thread(char** argv) {
-  if (std::getenv("OPENBLAS_NUM_THREADS") && std::getenv("OMP_NUM_THREADS")) return;
+// Libraries read their settings when they are loaded, so these must be there before the process starts. What the
+// environment says about OpenBLAS goes: the peers get the kernels that the library itself takes for this processor.
+void start_again_with_settings(char** argv) {
+  if (std::getenv("QXBENCH_STARTED")) return;
+  for (const char* name : {"OPENBLAS_CORETYPE", "OPENBLAS_L2_SIZE", "OPENBLAS_VERBOSE"}) unsetenv(name);
+  if (const char* kernels = std::getenv("QXBENCH_KERNELS")) setenv("OPENBLAS_CORETYPE", kernels, 1);
   setenv("OPENBLAS_NUM_THREADS", "1", 1);
   setenv("OMP_NUM_THREADS", "1", 1);
-  execv("/proc/self/exe", argv);
+  setenv("QXBENCH_STARTED", "1", 1);
+  execv(std::filesystem::read_symlink("/proc/self/exe").c_str(), argv);
 }
 
 }  // namespace
@@ -97,7 +104,7 @@ void start_again_with_one_thread(char** argv) {
 
 int main(int argc, char** argv) {
   try {
-    sm::bench::start_again_with_one_thread(argv);
+    sm::bench::start_again_with_settings(argv);
     return sm::bench::main_of(argc, argv);
   } catch (const std::exception& e) {
     std::fprintf(stderr, "qxbench: %s\n", e.what());

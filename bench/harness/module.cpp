@@ -29,6 +29,7 @@ Module::Module() : extension_(host_), instance_(extension_) {
   find(exports_.qxsmmultv, "qxsmmultv", true);
   find(exports_.qxsmcopyv, "qxsmcopyv", true);
   find(exports_.qxsmtraceinvAB, "qxsmtraceinvAB", true);
+  find(exports_.qxsmorder, "qxsmorder", false);
   find(exports_.qxsmrefill, "qxsmrefill", false);
   find(exports_.qxsminvpattern, "qxsminvpattern", false);
 }

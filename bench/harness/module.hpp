@@ -3,12 +3,13 @@
 
 #include <qxesm/qxesm.h>
 
+#include <cstdint>
 #include <qxhost/qxhost.hpp>
 #include <string>
 
 namespace sm::bench {
 
-// Operations that the module exports beside its table. The last three are null in a module that does not have them.
+// Operations that the module exports beside its table. The last four are null in a module that does not have them.
 struct Exports {
   decltype(&::qxsmmd) qxsmmd = nullptr;
   decltype(&::qxsmreorder) qxsmreorder = nullptr;
@@ -17,6 +18,7 @@ struct Exports {
   decltype(&::qxsmmultv) qxsmmultv = nullptr;
   decltype(&::qxsmcopyv) qxsmcopyv = nullptr;
   decltype(&::qxsmtraceinvAB) qxsmtraceinvAB = nullptr;
+  SmStatus (*qxsmorder)(SmMatrix* matrix, const std::int64_t* perm) = nullptr;
   SmStatus (*qxsmrefill)(SmMatrix* matrix, const double* values) = nullptr;
   SmStatus (*qxsminvpattern)(SmMatrix* matrix, double* values) = nullptr;
 };

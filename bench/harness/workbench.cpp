@@ -69,16 +69,14 @@ qxhost::Matrix Workbench::copy_of(SmMatrix* source) {
   return copy;
 }
 
-bool Workbench::can_factor(const std::string& phase, const std::string& variant) {
-  for (const char* step : {"ordering/", "numeric/"}) {
-    const std::string needed = job(step) + kOurs;
+bool Workbench::can_factor(std::initializer_list<const char*> phases) {
+  for (const char* step : {"ordering", "numeric"}) {
+    const std::string needed = fmt::format("{}/{}", job(step), kOurs);
     if (!forecast_.too_long(needed, problem_.n)) continue;
-    record(phase, variant,
-           {{.name = kOurs,
-             .seconds = {},
-             .fault = "",
-             .not_run = fmt::format("the factor alone is expected to take {:.0f} s",
-                                    forecast_.expected(needed, problem_.n))}});
+    Outcome outcome;
+    outcome.name = kOurs;
+    outcome.not_run = fmt::format("about {:.0f} s expected for its {}", forecast_.expected(needed, problem_.n), step);
+    for (const char* phase : phases) record(phase, "", {outcome});
     return false;
   }
   return true;

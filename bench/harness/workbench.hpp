@@ -2,6 +2,7 @@
 // from, each made when it is first asked for.
 #pragma once
 
+#include <initializer_list>
 #include <optional>
 #include <string>
 #include <vector>
@@ -29,8 +30,8 @@ class Workbench {
   const std::vector<int>& permutation();
   qxhost::Matrix copy_of(SmMatrix* source);
 
-  // False, with the phase recorded as not run, when ordering or factoring would take too long.
-  bool can_factor(const std::string& phase, const std::string& variant = "");
+  // False, with the phases recorded as not run, when ordering or factoring would take too long.
+  bool can_factor(std::initializer_list<const char*> phases);
 
   // `count` right-hand sides one after the other, all in the range of the matrix.
   std::vector<double> right_hand_sides(int count);

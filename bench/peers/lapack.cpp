@@ -7,6 +7,7 @@
 
 extern "C" {
 void openblas_set_num_threads(int count);
+char* openblas_get_corename();
 void dpotrf_(const char* triangle, const int* n, double* a, const int* lda, int* info);
 void dpotri_(const char* triangle, const int* n, double* a, const int* lda, int* info);
 void dpptrf_(const char* triangle, const int* n, double* a, int* info);
@@ -18,6 +19,8 @@ void dgemm_(const char* trans_a, const char* trans_b, const int* m, const int* n
 namespace sm::bench {
 
 void use_one_thread() { openblas_set_num_threads(1); }
+
+const char* kernels() { return openblas_get_corename(); }
 
 bool factor_full(std::vector<double>& a, int n) {
   int info = 0;

@@ -14,6 +14,9 @@ bool invert_full(std::vector<double>& r, int n);
 // The same with the upper triangle packed by columns.
 bool factor_packed(std::vector<double>& a, int n);
 
+// The set of kernels that OpenBLAS works with.
+const char* kernels();
+
 struct Rates {
   double gemm = 0.0;  // multiplications and additions a second
   double copy = 0.0;  // bytes a second, read and written

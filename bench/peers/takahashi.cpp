@@ -80,12 +80,21 @@ double Takahashi::element(int i, int j) const {
   return z_[static_cast<std::size_t>(std::lower_bound(begin, end, row) - row_.begin())];
 }
 
+std::vector<double> Takahashi::on_pattern(const UpperRows& rows) const {
+  std::vector<double> z;
+  z.reserve(rows.col.size());
+  for (int i = 0; i < rows.n; ++i) {
+    for (int p = rows.start[at(i)]; p < rows.start[at(i) + 1]; ++p) z.push_back(element(i, rows.col[at(p)]));
+  }
+  return z;
+}
+
 double Takahashi::trace_with(const UpperRows& b) const {
+  const std::vector<double> z = on_pattern(b);
   double trace = 0.0;
   for (int i = 0; i < b.n; ++i) {
     for (int p = b.start[at(i)]; p < b.start[at(i) + 1]; ++p) {
-      const int j = b.col[at(p)];
-      trace += (i == j ? 1.0 : 2.0) * b.value[at(p)] * element(i, j);
+      trace += (b.col[at(p)] == i ? 1.0 : 2.0) * b.value[at(p)] * z[at(p)];
     }
   }
   return trace;

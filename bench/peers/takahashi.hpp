@@ -18,6 +18,8 @@ class Takahashi {
   void run();
   // After run(), in the numbering of the matrix.
   [[nodiscard]] std::vector<double> diagonal() const;
+  // At the entries of `rows`, whose pattern is within the factor's.
+  [[nodiscard]] std::vector<double> on_pattern(const UpperRows& rows) const;
   // The trace of the inverse times B, whose pattern is within the factor's.
   [[nodiscard]] double trace_with(const UpperRows& b) const;
 

@@ -75,9 +75,7 @@ class Peer {
 }  // namespace
 
 void measure_factorization(Workbench& bench) {
-  for (const char* phase : {"symbolic", "numeric"}) {
-    if (!bench.can_factor(phase)) return;
-  }
+  if (!bench.can_factor({"symbolic", "numeric"})) return;
   Ours ours(bench);
   Peer simplicial(bench, Kind::simplicial), supernodal(bench, Kind::supernodal);
   // The peers run first in each round and stand as references then.

@@ -27,7 +27,7 @@ bool forget_peak() {
 }  // namespace
 
 void measure_memory(Workbench& bench) {
-  if (!bench.can_factor("memory")) return;
+  if (!bench.can_factor({"memory"})) return;
   const Problem& problem = bench.problem();
   const std::uint64_t before = bench.module().bytes_in_use();
   auto matrix = qxhost::Matrix::symmetric_sparse(bench.module().instance(), problem.n);

@@ -7,7 +7,7 @@
 namespace sm::bench {
 
 void measure_rank(Workbench& bench) {
-  if (bench.problem().definite() || !bench.can_factor("rank")) return;
+  if (bench.problem().definite() || !bench.can_factor({"rank"})) return;
   const double tolerance = bench.module().instance().get()->tolerances[2];
   const auto rank = static_cast<double>(bench.factored()->rank);
   const PivotMargins margins = pivot_margins(bench.rows(), bench.permutation(), tolerance);

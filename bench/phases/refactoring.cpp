@@ -18,7 +18,7 @@ std::array<std::vector<double>, 2> values_of(const UpperRows& rows) {
 }  // namespace
 
 void measure_refactoring(Workbench& bench) {
-  if (!bench.problem().definite() || !bench.can_factor("refactor")) return;
+  if (!bench.problem().definite() || !bench.can_factor({"refactor"})) return;
   const Exports& operations = bench.module().by_name();
   if (!operations.qxsmrefill) {
     bench.record("refactor", "",

@@ -46,7 +46,7 @@ std::string block_fault(const UpperRows& rows, const double* x, const std::vecto
 }  // namespace
 
 void measure_solves(Workbench& bench) {
-  if (!bench.can_factor("solve")) return;
+  if (!bench.can_factor({"solve"})) return;
   SmMatrix* ours = bench.factored();
   const std::vector<Peer> peers = factored_peers(bench);
   for (const int count : {1, 32}) {

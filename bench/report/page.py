@@ -19,10 +19,14 @@ PHASES = [
     ("symbolic", "Symbolic factorization",
      "The module's own permutation given to all. CHOLMOD's simplicial analysis counts but leaves the subscripts to the "
      "numeric phase; the supernodal one makes them and is the peer here."),
-    ("numeric", "Numeric factorization", "The module's own permutation given to all, memory fresh for all."),
-    ("total", "Order, factor and solve", "From a closed matrix to one solution, everybody with orderings of their own."),
+    ("numeric", "Numeric factorization",
+     "The module's own permutation given to all. Everybody allocates anew in each run: the host gives the module fresh "
+     "pages, the C library gives the peers pages that it kept from the run before."),
+    ("total", "Order, factor and solve",
+     "From a closed matrix to one solution, everybody with orderings of their own."),
     ("solve", "Solves", "With a factor that is there."),
-    ("inverse", "Diagonal of the inverse", "Beside a column by column Takahashi on CHOLMOD's factor, in the same order."),
+    ("inverse", "Diagonal of the inverse",
+     "Beside a column by column Takahashi on CHOLMOD's factor, in the same order."),
     ("trace", "Trace of an inverse product", "tr(A⁻B), B on the pattern of A."),
     ("refactor", "Refactor loop", "New values on the same pattern."),
     ("product", "Symmetric product", "From one stored triangle. Bytes: 16 for each entry, and the vectors."),
@@ -55,6 +59,7 @@ def conditions(run):
         ["system, compiler", f"{m['system']}, GCC {m['compiler']}"],
         ["module", f"commit {m['commit']}"],
         ["peers", f"CHOLMOD {m['cholmod']}, METIS {m['metis']}, Eigen {m['eigen']}, {m['openblas'].strip()}"],
+        ["OpenBLAS kernels", m["kernels"]],
         ["dgemm, order 2000", f"{m['dgemm'] / 1e9:.1f} GFLOP/s"],
         ["copy, read and written", f"{m['copy'] / 1e9:.1f} GB/s"],
         ["load when the run began", f"{m['load']:.1f} (one minute)"],
@@ -77,7 +82,7 @@ def shown(verdict, target):
     return f"{text.number(verdict.measured)} {target.unit}, {need}"
 
 
-def overview(run, reasons):
+def overview(run):
     rows = []
     for target in TARGETS:
         verdicts = target.judge(run)
@@ -129,7 +134,8 @@ def phase_table(run, phase):
         names += [n for n in r.times if n not in names]
     names.sort(key=lambda name: not name.startswith(OURS))
     variants = any(r.variant for r in results)
-    head = ["family", "case"] + (["variant"] if variants else []) + ["n", "entries"] + names + ["faster than the best by"]
+    head = ["family", "case"] + (["variant"] if variants else []) + ["n", "entries"] + names
+    head.append("faster than the best by")
     rows, added = [], None
     for r in results:
         peers = ("CHOLMOD supernodal",) if phase == "symbolic" else ("std::map",) if phase == "assembly" else None

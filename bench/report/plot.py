@@ -3,6 +3,8 @@
 import math
 from xml.sax.saxutils import escape
 
+from results import OURS
+
 WIDTH, HEIGHT = 300, 230
 LEFT, TOP, RIGHT, BOTTOM = 48, 28, 10, 34
 LEGEND_LINE = 16
@@ -50,7 +52,7 @@ def line(x0, y0, x1, y1, colour, width=1.0):
             f'stroke-width="{width}"/>')
 
 
-def frame(x, y, shift):
+def frame(x, y):
     parts = []
     for t in x.ticks():
         parts += [line(x.at(t), y.begin, x.at(t), y.end, "#dddddd"), text(x.at(t), y.begin + 15, label(t))]
@@ -61,44 +63,32 @@ def frame(x, y, shift):
     return parts
 
 
-def panel(title, series, colours, shift):
-    """One pair of axes; series maps a name to its (n, seconds)."""
+def panel(title, series, shift):
+    """One pair of axes with its legend; series maps a name to its (n, seconds). The module's own line is the first."""
     points = [p for s in series.values() for p in s]
     x = Axis([p[0] for p in points], shift + LEFT, shift + WIDTH - RIGHT)
     y = Axis([p[1] for p in points], HEIGHT - BOTTOM, TOP)
-    parts = frame(x, y, shift) + [text(shift + (LEFT + WIDTH - RIGHT) / 2, 16, title + ", seconds", size=12)]
-    for name, values in series.items():
-        places = [(x.at(n), y.at(s)) for n, s in sorted(values)]
+    parts = frame(x, y) + [text((x.begin + x.end) / 2, 16, title + ", seconds", size=12)]
+    for k, name in enumerate(sorted(series, key=lambda name: name != OURS)):
+        colour, width = COLOURS[k % len(COLOURS)], 2.4 if name == OURS else 1.2
+        places = [(x.at(n), y.at(s)) for n, s in sorted(series[name])]
         path = " ".join(f"{a:.1f},{b:.1f}" for a, b in places)
-        width = 2.4 if name == "qxesm" else 1.2
-        parts.append(f'<polyline points="{path}" fill="none" stroke="{colours[name]}" stroke-width="{width}"/>')
-        parts += [f'<circle cx="{a:.1f}" cy="{b:.1f}" r="2.6" fill="{colours[name]}"/>' for a, b in places]
-    return parts
-
-
-def legend(names, colours, width):
-    parts = []
-    for k, name in enumerate(names):
-        column, row = k % 3, k // 3
-        x, y = 14 + column * (width - 14) / 3, HEIGHT + 14 + row * LEGEND_LINE
-        parts += [line(x, y - 4, x + 18, y - 4, colours[name], 2.4), text(x + 24, y, name, "start")]
+        parts.append(f'<polyline points="{path}" fill="none" stroke="{colour}" stroke-width="{width}"/>')
+        parts += [f'<circle cx="{a:.1f}" cy="{b:.1f}" r="2.6" fill="{colour}"/>' for a, b in places]
+        level = HEIGHT + 14 + k * LEGEND_LINE
+        parts += [line(x.begin, level - 4, x.begin + 18, level - 4, colour, width + 0.6),
+                  text(x.begin + 24, level, name, "start")]
     return parts
 
 
 def draw(panels):
-    """panels: (title, series) side by side. The module's own line is the first colour everywhere."""
+    """panels: (title, series) side by side."""
     panels = [(title, series) for title, series in panels if series]
-    names = []
-    for _, series in panels:
-        names += [name for name in series if name not in names]
-    names.sort(key=lambda name: name != "qxesm")
-    colours = {name: COLOURS[k % len(COLOURS)] for k, name in enumerate(names)}
     width = WIDTH * len(panels)
-    height = HEIGHT + 10 + LEGEND_LINE * math.ceil(len(names) / 3)
+    height = HEIGHT + 10 + LEGEND_LINE * max(len(series) for _, series in panels)
     parts = [f'<svg xmlns="http://www.w3.org/2000/svg" width="{width}" height="{height}" '
              f'viewBox="0 0 {width} {height}" font-family="sans-serif" fill="#222222">',
              f'<rect width="{width}" height="{height}" fill="#ffffff"/>']
     for k, (title, series) in enumerate(panels):
-        parts += panel(title, series, colours, k * WIDTH)
-    parts += legend(names, colours, width) + ["</svg>"]
-    return "\n".join(parts) + "\n"
+        parts += panel(title, series, k * WIDTH)
+    return "\n".join(parts + ["</svg>"]) + "\n"
