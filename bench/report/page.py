@@ -171,7 +171,7 @@ def rank_table(run):
         rows.append([r.case, text.count(r.n), text.count(f["rank"]), text.count(f["expected"]),
                      text.count(f["plain_rank"]), text.number(f["largest_dropped"]),
                      text.number(f["smallest_accepted"])])
-    return text.table(["case", "n", "rank", "by construction", "of a plain factorization",
+    return text.table(["case", "n", "rank", "known", "of a plain factorization",
                        "largest dropped pivot / bound", "smallest accepted / bound"], rows)
 
 
