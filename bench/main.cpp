@@ -10,6 +10,7 @@
 #include <optional>
 
 #include "bench/cases.hpp"
+#include "bench/generators/matrix_file.hpp"
 #include "bench/harness/clock.hpp"
 #include "bench/machine.hpp"
 #include "bench/peers/lapack.hpp"
@@ -21,7 +22,7 @@ namespace {
 struct Options {
   Size size = Size::full;
   Clock clock = Clock::cpu;
-  std::vector<std::string> families, phases;
+  std::vector<std::string> families, phases, matrices;
   std::string output = "results.jsonl";
   int rounds = 5;
   double longest = 120.0;
@@ -36,10 +37,20 @@ bool wanted(const Options& options, const Case& c, const Phase& phase) {
                      [&](std::string_view name) { return wanted(options.phases, name) && wanted(c.phases, name); });
 }
 
+// The matrices of the command line take the place of the families unless these are asked for too.
+std::vector<Case> all_cases(const Options& options) {
+  std::vector<Case> cases;
+  if (options.matrices.empty() || !options.families.empty()) cases = cases_of(options.size);
+  std::erase_if(cases, [&](const Case& c) { return !wanted(options.families, c.family); });
+  for (const std::string& file : options.matrices) {
+    cases.push_back({"file", [file] { return read_matrix(file); }, {}});
+  }
+  return cases;
+}
+
 void run_cases(const Options& options, Module& module, Records& records) {
   Forecast forecast(options.longest);
-  for (const Case& c : cases_of(options.size)) {
-    if (!wanted(options.families, c.family)) continue;
+  for (const Case& c : all_cases(options)) {
     std::optional<Workbench> bench;  // made for the first phase that is wanted
     for (const Phase& phase : phases()) {
       if (!wanted(options, c, phase)) continue;
@@ -47,6 +58,7 @@ void run_cases(const Options& options, Module& module, Records& records) {
       phase.run(*bench);
     }
   }
+  if (!options.matrices.empty() && options.families.empty()) return;
   if (!wanted(options.families, "dense") || !wanted(options.phases, "dense")) return;
   for (const int n : dense_orders(options.size)) measure_dense(module, records, n, options.rounds);
 }
@@ -77,6 +89,8 @@ int main_of(int argc, char** argv) {
   app.add_option("--phase", options.phases,
                  "assembly, closing, ordering, symbolic, numeric, total, solve, inverse, trace, refactor, product, "
                  "iteration, memory, rank, dense; default all")
+      ->delimiter(',');
+  app.add_option("--matrix", options.matrices, "Matrix Market files, symmetric, instead of the families")
       ->delimiter(',');
   app.add_option("--rounds", options.rounds, "Runs of everybody; fewer where one takes long")
       ->check(CLI::Range(1, 100));

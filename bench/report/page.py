@@ -82,19 +82,29 @@ def shown(verdict, target):
     return f"{text.number(verdict.measured)} {target.unit}, {need}"
 
 
+def without_time(verdicts):
+    """How many have no time of ours, with the reason of the last: those must not look as if nobody had asked."""
+    missing = [v for v in verdicts if not v.known and OURS in v.result.times and v.result.ours() is None]
+    if not missing:
+        return ""
+    record = missing[-1].result.times[OURS]
+    return f"**no time** in {len(missing)} of {len(verdicts)} ({record.get('wrong') or record.get('not_run')})"
+
+
 def overview(run):
     rows = []
     for target in TARGETS:
         verdicts = target.judge(run)
         known = [v for v in verdicts if v.known]
         families = ", ".join(target.families)
+        missing = without_time(verdicts)
         if not known:
-            rows.append([target.phase, families, target.text, "not measured", ""])
+            rows.append([target.phase, families, target.text, missing or "not measured", ""])
             continue
         worst = max(known, key=lambda v: v.shortfall)
         met = sum(v.met for v in known)
         outcome = "met" if met == len(known) else f"**missed** in {len(known) - met} of {len(known)}"
-        rows.append([target.phase, families, target.text, outcome,
+        rows.append([target.phase, families, target.text, ", ".join(filter(None, (outcome, missing))),
                      f"{worst.result.family} {worst.result.case}: {shown(worst, target)}"])
     return text.table(["phase", "families", "target", "outcome", "worst case"], rows, left=5)
 
@@ -159,6 +169,9 @@ def memory_table(run):
     rows = []
     for r in run.of("memory"):
         f = r.facts
+        if "peak" not in f:
+            rows.append([r.family, r.case, text.count(r.n), "", "not run", "", ""])
+            continue
         rows.append([r.family, r.case, text.count(r.n), text.count(f["factor_entries"]), f"{f['peak'] / 1e6:,.1f}",
                      f"{f['bound'] / 1e6:,.1f}", text.number(f["peak"] / f["bound"])])
     return text.table(["family", "case", "n", "entries of U", "peak, MB", "bound, MB", "peak / bound"], rows, left=2)
@@ -168,10 +181,13 @@ def rank_table(run):
     rows = []
     for r in run.of("rank"):
         f = r.facts
+        if "rank" not in f:
+            rows.append([r.case, text.count(r.n), "not run", "", "", "", ""])
+            continue
         rows.append([r.case, text.count(r.n), text.count(f["rank"]), text.count(f["expected"]),
                      text.count(f["plain_rank"]), text.number(f["largest_dropped"]),
                      text.number(f["smallest_accepted"])])
-    return text.table(["case", "n", "rank", "by construction", "of a plain factorization",
+    return text.table(["case", "n", "rank", "known", "of a plain factorization",
                        "largest dropped pivot / bound", "smallest accepted / bound"], rows)
 
 

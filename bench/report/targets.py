@@ -181,5 +181,5 @@ TARGETS = [
     Target("dense inverse", ("dense",), "70 % of dpotrf + dpotri",
            dense_speed("dense inverse", "dpotrf + dpotri", 0.7)),
     Target("memory", tuple("abcdef"), "9.5 bytes per entry of U, 60 per entry of A, 120 per row", peak_memory),
-    Target("rank", ("c",), "exact", exact_rank),
+    Target("rank", ("c", "file"), "exact", exact_rank),
 ]

@@ -13,7 +13,9 @@ from results import OURS, Run, exponent
 from targets import TARGETS, Verdict, between
 
 RESULTS = sys.argv.pop() if len(sys.argv) > 1 else None
-MACHINE = {"machine": {"copy": 23e9, "dgemm": 80e9, "load": 0.0}}
+MACHINE = {"machine": {
+    "copy": 23e9, "dgemm": 80e9, "load": 0.0, "clock": "cpu", "processor": "p", "cores": 1, "memory": 1, "system": "s",
+    "compiler": "c", "commit": "0", "cholmod": "1", "metis": "1", "eigen": "1", "openblas": "o", "kernels": "k"}}
 
 
 def run_of(*records):
@@ -88,6 +90,26 @@ class Page(unittest.TestCase):
         self.assertIn("Short rows.", page.misses(run, {"numeric e": "short rows"}))
         self.assertIn("Not explained yet.", page.misses(run, {}))
         self.assertIn("**missed** in 1 of 1", page.overview(run))
+
+    def test_a_target_without_a_time_of_ours_is_not_passed_over(self):
+        run = run_of({**record("arrow", "50000", 50000, "ordering", {}),
+                      "times": [{"name": OURS, "not_run": "about 99 s"}, {"name": "AMD", "seconds": 1.0, "runs": 5}]},
+                     record("d", "x", 100, "numeric", {OURS: "garbage", "peer": 1.0}))
+        self.assertIn("**no time** in 1 of 1 (about 99 s)", page.overview(run))
+        self.assertIn("**no time** in 1 of 1 (garbage)", page.overview(run))
+
+    def test_what_was_not_run_has_a_place_on_the_page(self):
+        for phase, table in (("memory", page.memory_table), ("rank", page.rank_table)):
+            run = run_of(record("c", "x", 100, phase, {}))
+            self.assertIn("not run", table(run))
+            self.assertFalse(any(v.known for v in verdicts(run, phase, "")))
+
+    def test_a_page_is_written_from_one_job_that_was_not_run(self):
+        run = run_of({**record("a", "x", 100, "numeric", {}), "times": [{"name": OURS, "not_run": "about 99 s"}]})
+        with tempfile.TemporaryDirectory() as folder:
+            document.write(run, {}, folder)
+            with open(os.path.join(folder, "performance.md"), encoding="utf-8") as file:
+                self.assertIn("| not run |", file.read())
 
     @unittest.skipUnless(RESULTS, "no results were given")
     def test_a_run_makes_a_whole_page(self):

@@ -3,7 +3,11 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <cstdio>
+#include <fstream>
+#include <stdexcept>
 
+#include "bench/generators/matrix_file.hpp"
 #include "tests/bench/dense.hpp"
 
 namespace sm::bench::test {
@@ -84,6 +88,21 @@ TEST(Generators, insemination_bulls_have_many_offspring) {
   }
   const int fixed = 12 * 20;
   EXPECT_GT(*std::max_element(entries.begin() + fixed, entries.end()), 100);
+}
+
+TEST(MatrixFile, is_read_with_its_rank_and_refused_when_it_is_broken) {
+  const std::string file = testing::TempDir() + "bench_matrix.mtx";
+  const auto write = [&](const std::string& text) { std::ofstream(file) << text; };
+  const std::string head = "%%MatrixMarket matrix coordinate real symmetric\n% a comment\n";
+  write(head + "3 3 4\n1 1 1\n2 1 1\n2 2 1\n3 3 4\n");
+  EXPECT_EQ(read_matrix(file).rank, 2);  // the second pivot is 0
+  EXPECT_EQ(read_matrix(file).rhs, (std::vector<double>{2.0, 2.0, 4.0}));
+  for (const std::string& broken : {head + "3 3 2\n1 1 1\n", head + "2 2 1\n3 1 1\n", head + "2 3 1\n1 1 1\n",
+                                    std::string("%%MatrixMarket matrix coordinate real general\n1 1 1\n1 1 1\n")}) {
+    write(broken);
+    EXPECT_THROW((void)read_matrix(file), std::runtime_error) << broken;
+  }
+  std::remove(file.c_str());
 }
 
 TEST(Generators, shuffling_keeps_every_contribution) {
