@@ -23,8 +23,7 @@ class SelectedInverseTest : public ModuleTest {
   }
   SmMatrix* factored(const Problem& problem, bool natural) {
     SmMatrix* m = new_sparse(session(), problem);
-    EXPECT_EQ(qxsmmd(m), SM_OK);
-    if (natural) impose_order(m, natural_order(problem.n));
+    EXPECT_EQ(natural ? qxsmorder(m, natural_order(problem.n).data()) : qxsmmd(m), SM_OK);
     EXPECT_EQ(fn().qxsmfact(m, 0), SM_OK);
     return m;
   }
