@@ -29,3 +29,5 @@ extern "C" SmStatus qxsmsoldirect(SmMatrix* matrix, const double* b, double* x, 
 }
 
 extern "C" SmStatus qxsminvdiag(SmMatrix* matrix, double* x) { return sm::inverse_diagonal(*matrix, x); }
+
+extern "C" SmStatus qxsminvpattern(SmMatrix* matrix, double* values) { return sm::inverse_on_pattern(*matrix, values); }

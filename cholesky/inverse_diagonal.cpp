@@ -1,11 +1,9 @@
-// The diagonal of the generalized inverse, from the factor and without forming the inverse.
-//
-// With A^- = V D^- V', V = U^-1: element i of the diagonal is the sum over columns j of V[i][j]^2 / D[j]. Each column
-// of V D^(-1/2) is a back substitution that starts at row j.
+// The diagonal of the generalized inverse, from the factor and without forming the inverse: selected inversion
+// (selected_inverse.cpp), or column by column where there is no memory for that (inverse_columns.cpp).
 #include <algorithm>
-#include <cmath>
 
 #include "cholesky/packed_triangle.hpp"
+#include "cholesky/selected_inverse.hpp"
 #include "cholesky/steps.hpp"
 #include "store/checks.hpp"
 
@@ -13,29 +11,13 @@ namespace sm {
 
 namespace {
 
-// Row i of -U times w, up to column last; the columns of a row ascend.
-double row_product(const SmMatrix& m, const double* w, i64 i, i64 last) {
-  const i64* column = m.factor_ju + m.factor_iju[i] - m.factor_iu[i];
-  double sum = 0.0;
-  for (i64 p = m.factor_iu[i]; p < m.factor_iu[i + 1] && column[p] <= last; ++p) {
-    sum += m.factor_values[p] * w[column[p]];
+void sparse_diagonal(SmMatrix& m, double* x) {
+  SelectedInverse inverse(m);
+  if (inverse.compute() != SM_OK) {
+    diagonal_by_columns(m, x);
+    return;
   }
-  return sum;
-}
-
-void sparse_diagonal(const SmMatrix& m, double* x) {
-  double* w = reinterpret_cast<double*>(m.factor_scratch);
-  for (i64 j = m.rows - 1; j >= 0; --j) {
-    if (!(m.factor_diag[j] > 0.0)) continue;
-    std::fill_n(w, j + 1, 0.0);
-    w[j] = std::sqrt(m.factor_diag[j]);
-    x[m.perm[j]] += m.factor_diag[j];
-    for (i64 i = j - 1; i >= 0; --i) {
-      if (!(m.factor_diag[i] > 0.0)) continue;
-      w[i] = row_product(m, w, i, j);
-      x[m.perm[i]] += w[i] * w[i];
-    }
-  }
+  for (i64 k = 0; k < m.rows; ++k) x[m.perm[k]] = inverse.diagonal(k);
 }
 
 SmStatus packed_diagonal(SmMatrix& m, double* x) {

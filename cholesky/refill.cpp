@@ -9,18 +9,6 @@ namespace sm {
 
 namespace {
 
-SmStatus need_places(SmMatrix& m) {
-  if (m.factor_reserved) return SM_OK;
-  SM_TRY(need_pool(m));
-  Scratch<i64> place;
-  Scratch<i64> scratch;
-  SM_TRY(place.take(m.pool, m.nnz));
-  SM_TRY(scratch.take(m.pool, closing_places_scratch(m)));
-  find_closing_places(m, place.data(), scratch.data());
-  m.factor_reserved = place.release();
-  return SM_OK;
-}
-
 Gate may_refill(const SmMatrix& m) {
   SM_STOP_IF(m.nnz < 1, SM_OK);
   SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
@@ -37,7 +25,7 @@ SmStatus refill(SmMatrix& m, const double* values) {
   if (m.state < SM_STATE_REORDERED) {
     std::copy_n(values, m.nnz, m.nz_values);
   } else {
-    SM_TRY(need_places(m));
+    SM_TRY(need_closing_places(m));
     for (i64 p = 0; p < m.nnz; ++p) m.nz_values[m.factor_reserved[p]] = values[p];
   }
   if (m.state == SM_STATE_FACTORED) m.state = SM_STATE_SYMBOLIC;

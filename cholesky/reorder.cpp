@@ -122,6 +122,18 @@ void find_closing_places(const SmMatrix& m, i64* place, i64* scratch) {
   for (i64 s = 0; s < m.nnz; ++s) place[start[row[s]]++] = by_column[s];
 }
 
+SmStatus need_closing_places(SmMatrix& m) {
+  if (m.factor_reserved) return SM_OK;
+  SM_TRY(need_pool(m));
+  Scratch<i64> place;
+  Scratch<i64> scratch;
+  SM_TRY(place.take(m.pool, m.nnz));
+  SM_TRY(scratch.take(m.pool, closing_places_scratch(m)));
+  find_closing_places(m, place.data(), scratch.data());
+  m.factor_reserved = place.release();
+  return SM_OK;
+}
+
 void restore_order(SmMatrix& m) {
   const i64 n = m.rows;
   if (!m.row_start || !has_workspace(m, m.nnz + closing_places_scratch(m))) return;

@@ -12,4 +12,7 @@ void restore_order(SmMatrix& m);
 void find_closing_places(const SmMatrix& m, i64* place, i64* scratch);
 inline i64 closing_places_scratch(const SmMatrix& m) { return m.rows + 1 + 2 * m.nnz; }
 
+// The same in the record's reserved factor word, unless it has them already.
+[[nodiscard]] SmStatus need_closing_places(SmMatrix& m);
+
 }  // namespace sm

@@ -29,6 +29,9 @@ void substitute_sparse(const SmMatrix& m, const double* b, double* x, i64 count)
 [[nodiscard]] SmStatus substitute(SmMatrix& m, const double* b, double* x, std::int32_t count);
 [[nodiscard]] SmStatus apply_inverse(SmMatrix& m, const double* b, double* x, i64 count);
 [[nodiscard]] SmStatus inverse_diagonal(SmMatrix& m, double* x);
+// Adds the diagonal of A^- to x, from a sparse factor and without any memory, with the record's scratch.
+void diagonal_by_columns(const SmMatrix& m, double* x);
+[[nodiscard]] SmStatus inverse_on_pattern(SmMatrix& m, double* values);
 [[nodiscard]] SmStatus solve_direct(SmMatrix& m, const double* b, double* x, std::int32_t count);
 
 // The limits between which a pivot is dropped: accepted above |a| * tolerance, an error below the negative one.

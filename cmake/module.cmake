@@ -19,9 +19,16 @@ add_library(qxesm_objects OBJECT
   cholesky/factor.cpp
   cholesky/ginverse2.cpp
   cholesky/given_order.cpp
+  cholesky/inverse_columns.cpp
   cholesky/inverse_diagonal.cpp
+  cholesky/inverse_gather.cpp
+  cholesky/inverse_panels.cpp
+  cholesky/inverse_pattern.cpp
+  cholesky/inverse_square.cpp
+  cholesky/selected_inverse.cpp
   cholesky/block_factor.cpp
   cholesky/block_update.cpp
+  cholesky/block_tree.cpp
   cholesky/blocks.cpp
   cholesky/numeric.cpp
   cholesky/numeric_blocked.cpp
@@ -60,6 +67,7 @@ add_library(qxesm_objects OBJECT
   iterative/api.cpp
   iterative/conjugate_gradients.cpp
   trace/api.cpp
+  trace/inverse_pattern.cpp
   trace/product.cpp
   trace/trace.cpp)
 target_include_directories(qxesm_objects PUBLIC ${PROJECT_SOURCE_DIR}/include PRIVATE ${PROJECT_SOURCE_DIR})

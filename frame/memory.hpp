@@ -53,6 +53,7 @@ class Scratch {
     return SM_OK;
   }
   T* data() { return block_; }
+  const T* data() const { return block_; }
   std::span<T> span() { return {block_, static_cast<std::size_t>(count_)}; }
   T* release() {
     T* block = block_;

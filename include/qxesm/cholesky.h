@@ -99,7 +99,19 @@ QXESM_API SmStatus qxsmsoldirect(SmMatrix* matrix, const double* b, double* x, i
  * give 0. A diagonal matrix that has not been inverted answers its factor, the square roots of its elements, as it
  * stands.
  * Answers: 0 with nothing done (empty); 1; 113; 111; then, with x cleared: 124 (general); qxsmfact's; 101 (packed: n
- * doubles of work); 0. Cost: n partial back substitutions. Uses the record's factor_scratch. */
+ * doubles of work); 0. Cost of a sparse matrix: that of factoring its values, up to three times, with as many doubles
+ * as U has and up to 13 MB more while it runs; where that memory cannot be had, n partial back substitutions without
+ * any. Uses the record's factor_scratch. */
 QXESM_API SmStatus qxsminvdiag(SmMatrix* matrix, double* x);
+
+/* values <- the elements of A^- where A has stored entries, factoring when needed: prediction error variances and
+ * covariances of effects that the model correlates.
+ *   values  out  nnz doubles in closing order: the upper triangle row by row, columns ascending (as qxsmrefill takes
+ *                them); untouched on every answer but 0
+ * Rows and columns of dropped pivots give 0.
+ * Answers: 0 with nothing done (empty); 1; 113; 111; 124 (not symmetric sparse); 104 (values is null or the matrix's
+ * own array); qxsmfact's; 101; 0. Cost and memory: those of qxsminvdiag, and nnz doubles. The first call for a pattern
+ * finds the closing order and keeps it, as qxsmrefill does. Uses the record's factor_scratch. */
+QXESM_API SmStatus qxsminvpattern(SmMatrix* matrix, double* values);
 
 #endif

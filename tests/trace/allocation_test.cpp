@@ -127,12 +127,41 @@ TEST_P(TraceAllocation, the_trace_with_an_inverse_leaves_nothing_but_the_factor)
           return status;
         };
         const auto check = [&](Session& session, const Operands& o, SmStatus status, std::int64_t) {
-          EXPECT_EQ(status, SM_NO_MEMORY);
+          // Where selected inversion serves, solves take its place.
+          const bool gives_way = sa.kind == SM_KIND_SYMMETRIC && is_sparse(sa) && status == SM_OK;
+          EXPECT_EQ(status, gives_way ? SM_OK : SM_NO_MEMORY);
           // Missing before the sum began, and else what was summed before the work of a solve could not be had.
-          EXPECT_TRUE(is_missing(result) || o.a.matrix->state == SM_STATE_FACTORED);
+          EXPECT_TRUE(gives_way || is_missing(result) || o.a.matrix->state == SM_STATE_FACTORED);
           EXPECT_EQ(run(session, o), SM_OK) << "again";
         };
         EXPECT_GE(refuse_each_request(GetParam(), prepare, run, check), 2) << "two vectors at least";
+      }
+}
+
+TEST_P(TraceAllocation, without_memory_for_selected_inversion_the_trace_is_solved_for) {
+  for (const Shape sb : {kSymmetricSparse, kDiagonalColumns, kDiagonalRows})
+    for (const bool for_ever : {false, true})
+      for (std::int64_t k = 0; k <= 6; ++k) {
+        Session session(GetParam());
+        Random random(12);
+        const Filled a = filled_definite(session, kSymmetricSparse, 12, random);
+        Nonzeros elements;
+        for (const auto& [at, value] : a.stored) {
+          if (at.first == at.second || sb.kind == SM_KIND_SYMMETRIC) elements[at] = value + 1.0;
+        }
+        const Filled b = filled_with(session, sb, 12, 12, elements);
+        ASSERT_EQ(session.fn().qxsmfact(a.matrix, 0), SM_OK);
+        const double expected = trace_of_product(inverse(a.dense), b.dense);
+        const std::int64_t blocks = session.host().live_blocks();
+        double result = 0.0;
+        session.host().fail_request(k, for_ever);
+        EXPECT_EQ(qxsmtraceinvAB(a.matrix, b.matrix, 0, &result), k < 2 ? SM_NO_MEMORY : SM_OK) << k;
+        EXPECT_EQ(session.host().stop_failing() > 0, k < 6) << "two vectors, and four requests of selected inversion";
+        if (k >= 2) {
+          EXPECT_NEAR(result, expected, 1e-10) << k;
+        }
+        EXPECT_EQ(session.host().live_blocks(), blocks) << k;
+        EXPECT_EQ(session.host().violations(), 0);
       }
 }
 

@@ -167,6 +167,34 @@ TEST_P(InverseTrace, a_generalized_inverse_times_its_matrix_has_the_rank_as_its_
   EXPECT_NEAR(trace_of(a, new_diagonal(session(), {4.0, 0.0, 2.0}), 0), 2.0, 1e-12);
 }
 
+TEST_P(InverseTrace, on_and_off_the_pattern_of_the_factor_it_is_the_same_sum) {
+  for (std::uint64_t seed = 0; seed < 60; ++seed) {
+    Random random(seed);
+    const std::int64_t n = 2 + random.below(30);
+    const Problem pa = positive_definite(random_graph(random, n, 8), random);
+    SmMatrix* a = new_sparse(session(), pa);
+    // A part of the entries of A, and in half of the cases one that may be anywhere.
+    Problem pb{"part", n, {}};
+    const std::int64_t stray = random.chance(50) ? random.below(n) : n;
+    for (const Entry& e : pa.upper) {
+      if (e.row == e.col || random.chance(60)) pb.upper.push_back({e.row, e.col, random.dyadic()});
+      if (e.row == stray && e.col == stray && stray + 1 < n) pb.upper.push_back({stray, n - 1, 3.0});
+    }
+    for (std::int32_t state = SM_STATE_CLOSED; state <= SM_STATE_REORDERED; ++state) {
+      SmMatrix* b = new_sparse(session(), pb);
+      ASSERT_EQ(bring_to(b, state), SM_OK);
+      Output out(1);
+      const SmStatus status = qxsmtraceinvAB(a, b, 0, out.data());
+      ASSERT_EQ(status, state <= SM_STATE_ORDERED ? SM_OK : SM_REORDERED) << "seed " << seed;
+      if (status != SM_OK) continue;
+      const Dense p = product(inverse(pa.dense()), dense_of_rows(b));
+      long double sum = 0.0L;
+      for (std::int64_t i = 0; i < n; ++i) sum += p(i, i);
+      EXPECT_NEAR(out.values()[0], static_cast<double>(sum), 1e-10) << "seed " << seed << " state " << state;
+    }
+  }
+}
+
 TEST_P(InverseTrace, a_second_matrix_without_entries_gives_0) {
   Random random(8);
   SmMatrix* trees = new_sized(session(), kGeneralSparse, 4, 4);

@@ -1,0 +1,42 @@
+// The generalized inverse at the stored positions of a matrix.
+#include <algorithm>
+
+#include "cholesky/reorder.hpp"
+#include "cholesky/selected_inverse.hpp"
+#include "cholesky/steps.hpp"
+#include "store/checks.hpp"
+
+namespace sm {
+
+namespace {
+
+Gate may_read_inverse(const SmMatrix& m) {
+  SM_STOP_IF(m.nnz < 1, SM_OK);
+  SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
+  SM_STOP_IF(!is_closed(m), SM_NOT_CLOSED);
+  SM_STOP_IF(m.rows != m.cols, SM_NOT_SQUARE);
+  SM_STOP_IF(!is_symmetric_sparse(m), SM_UNAVAILABLE);
+  return {};
+}
+
+}  // namespace
+
+// Every stored entry is on the pattern of the factor.
+SmStatus inverse_on_pattern(SmMatrix& m, double* values) {
+  SM_PASS(may_read_inverse(m));
+  if (!values || values == m.nz_values) return SM_BAD_ARGUMENT;
+  SM_TRY(factor(m, false));
+  SM_TRY(need_closing_places(m));
+  SelectedInverse inverse(m);
+  SM_TRY(inverse.compute());
+  Scratch<double> stored;
+  SM_TRY(stored.take(m.pool, m.nnz));
+  double* z = stored.data();
+  for (i64 i = 0; i < m.rows; ++i) {
+    for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) z[p] = *inverse.find(i, m.col_index[p]);
+  }
+  for (i64 p = 0; p < m.nnz; ++p) values[p] = z[m.factor_reserved[p]];
+  return SM_OK;
+}
+
+}  // namespace sm

@@ -1,0 +1,16 @@
+// Structures whose factors have blocks of rows of chosen widths.
+#pragma once
+
+#include "cholesky/cholesky_support.hpp"
+
+namespace sm::test {
+
+// Cliques one behind the other, each with edges to some vertices of some later ones.
+Graph linked_cliques(Random& random, const Indices& sizes, std::int64_t percent);
+// A clique whose every vertex touches `tail` vertices that follow it, after `gap` others that touch those only.
+Graph bordered_clique(std::int64_t width, std::int64_t gap, std::int64_t tail);
+// Counts of a design with an intercept and every level of two crossed factors: of rank 1 less than its order for each
+// factor, when the design is connected.
+Problem crossed_counts(Random& random, std::int64_t a, std::int64_t b);
+
+}  // namespace sm::test

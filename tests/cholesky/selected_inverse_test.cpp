@@ -1,0 +1,151 @@
+// The inverse on the pattern of the factor, held to solves with unit vectors and to the column method, with each set of
+// tile kernels that the CPU has.
+#include "cholesky/selected_inverse.hpp"
+
+#include <algorithm>
+#include <cmath>
+
+#include "cholesky/block_cases.hpp"
+#include "cholesky/inverse_work.hpp"
+#include "cholesky/steps.hpp"
+#include "cholesky/tiles.hpp"
+
+namespace sm::test {
+namespace {
+
+constexpr TileSet kSets[] = {TileSet::avx512, TileSet::avx2, TileSet::portable};
+
+class SelectedInverseTest : public ModuleTest {
+ protected:
+  void TearDown() override {
+    if (!use_tiles(TileSet::avx512) && !use_tiles(TileSet::avx2)) use_tiles(TileSet::portable);
+    ModuleTest::TearDown();
+  }
+  SmMatrix* factored(const Problem& problem, bool natural) {
+    SmMatrix* m = new_sparse(session(), problem);
+    EXPECT_EQ(natural ? qxsmorder(m, natural_order(problem.n).data()) : qxsmmd(m), SM_OK);
+    EXPECT_EQ(fn().qxsmfact(m, 0), SM_OK);
+    return m;
+  }
+  // Every element of U's pattern, and only those, beside A^- from solves.
+  static void expect_inverse(SmMatrix* m, const Dense& want, double tolerance) {
+    SelectedInverse z(*m);
+    ASSERT_EQ(z.compute(), SM_OK);
+    const double bound = tolerance * static_cast<double>(largest(want));
+    const std::vector<Indices> rows = stored_structure(m);
+    for (std::int64_t k = 0; k < m->rows; ++k) {
+      const std::int64_t i = m->perm[k];
+      ASSERT_NEAR(z.diagonal(k), static_cast<double>(want(i, i)), bound) << "row " << k;
+      ASSERT_EQ(*z.find(i, i), z.diagonal(k));
+      for (const std::int64_t c : rows[at(k)]) {
+        const double* element = z.find(m->perm[c], i);
+        ASSERT_NE(element, nullptr);
+        ASSERT_EQ(z.find(i, m->perm[c]), element);
+        ASSERT_NEAR(*element, static_cast<double>(want(i, m->perm[c])), bound) << "row " << k << " column " << c;
+      }
+    }
+  }
+  // Answers the rank.
+  std::int64_t check(const Problem& problem, bool natural, double tolerance = 1e-11) {
+    SmMatrix* m = factored(problem, natural);
+    const std::int64_t rank = m->rank;
+    const Dense want = solved_identity(m);
+    for (const TileSet set : kSets) {
+      if (!use_tiles(set)) continue;
+      SCOPED_TRACE(tile_kernels().name);
+      expect_inverse(m, want, tolerance);
+    }
+    std::vector<double> columns(at(m->rows), 0.0);
+    diagonal_by_columns(*m, columns.data());
+    const double bound = tolerance * static_cast<double>(largest(want));
+    for (std::int64_t i = 0; i < m->rows; ++i) EXPECT_NEAR(columns[at(i)], static_cast<double>(want(i, i)), bound) << i;
+    EXPECT_EQ(fn().qxsmDestroyMatrix(instance(), &m), SM_OK);
+    return rank;
+  }
+};
+INSTANTIATE_BOTH_HOSTS(SelectedInverseTest);
+
+TEST_P(SelectedInverseTest, agrees_with_solves_on_small_matrices_of_every_structure) {
+  for (std::uint64_t seed = 0; seed < 800; ++seed) {
+    Random random(seed);
+    const Problem problem = positive_definite(any_graph(random, 50), random);
+    if (problem.n == 0) continue;
+    EXPECT_EQ(check(problem, random.chance(50)), problem.n);
+    if (HasFailure()) FAIL() << "seed " << seed;
+  }
+}
+
+TEST_P(SelectedInverseTest, agrees_with_solves_on_all_structures_of_up_to_three_rows) {
+  Random random(1);
+  for (std::int64_t n = 1; n <= 3; ++n)
+    for (int edges = 0; edges < 8; ++edges) {
+      Graph g{n, {}};
+      int bit = 1;
+      for (std::int64_t i = 0; i < n; ++i)
+        for (std::int64_t j = i + 1; j < n; ++j, bit *= 2)
+          if (edges & bit) g.edges.emplace_back(i, j);
+      check(positive_definite(g, random), true);
+    }
+}
+
+TEST_P(SelectedInverseTest, agrees_with_solves_on_linked_cliques) {
+  for (std::uint64_t seed = 0; seed < 60; ++seed) {
+    Random random(seed);
+    Indices sizes;
+    const std::int64_t count = 2 + random.below(14);
+    for (std::int64_t k = 0; k < count; ++k) sizes.push_back(1 + random.below(random.chance(30) ? 40 : 9));
+    check(positive_definite(linked_cliques(random, sizes, 20 + random.below(60)), random), random.chance(70));
+    if (HasFailure()) FAIL() << "seed " << seed;
+  }
+}
+
+TEST_P(SelectedInverseTest, agrees_with_solves_at_the_edges_of_strips_and_tiles) {
+  Random random(2);
+  for (const std::int64_t width : {1, 2, 3, 4, 5, 7, 8, 9, 12, 15, 16, 17, 24, 25, 33})
+    for (const std::int64_t tail : {0, 1, 3, 4, 5, 8, 9, 11, 12, 13, 23, 24, 25})
+      check(positive_definite(bordered_clique(width, width % 3 == 0 ? 2 : 0, tail), random), true);
+}
+
+TEST_P(SelectedInverseTest, agrees_with_solves_on_blocks_larger_than_every_front_and_panel) {
+  Random random(3);
+  for (const std::int64_t n : Indices{127, 129, 256, kMostFrontOrder - 1, kMostFrontOrder, kMostFrontOrder + 1, 450})
+    check(positive_definite(clique(n), random), true);
+  for (const std::int64_t n : {1, 9, 120, 128, 140}) {
+    check(positive_definite(bordered_clique(n, 2, kMostFrontOrder + 3), random), true);
+    check(positive_definite(linked_cliques(random, {n, 5, 300, 1, 130}, 95), random), true);
+  }
+}
+
+TEST_P(SelectedInverseTest, agrees_with_solves_on_grids_trees_and_hubs) {
+  Random random(4);
+  check(positive_definite(grid(19, 23), random), false);
+  check(positive_definite(grid(16, 16), random), true);
+  check(positive_definite(random_tree(random, 300), random), false);
+  check(positive_definite(random_tree(random, 200), random), true);
+  check(positive_definite(star(300, 0), random), false);
+  check(positive_definite(arrowhead(400, 3), random), false);
+  check(positive_definite(arrowhead(200, 60), random), true);
+  check(positive_definite(multiplied(random, grid(9, 9)), random), false);
+  check(positive_definite(elements(random, 200, 60, 12), random), false);
+}
+
+TEST_P(SelectedInverseTest, leaves_zeros_where_pivots_were_dropped) {
+  for (std::uint64_t seed = 0; seed < 150; ++seed) {
+    Random random(seed);
+    const Semidefinite s = cross_product(random, 1 + random.below(50), random.below(20), random.below(8));
+    EXPECT_EQ(check(s.problem, random.chance(50), 1e-9), s.rank);
+    if (HasFailure()) FAIL() << "seed " << seed;
+  }
+}
+
+TEST_P(SelectedInverseTest, serves_crossed_effects_of_which_all_levels_are_kept) {
+  for (std::uint64_t seed = 0; seed < 30; ++seed) {
+    Random random(seed);
+    const Problem problem = crossed_counts(random, 2 + random.below(60), 2 + random.below(60));
+    EXPECT_EQ(check(problem, random.chance(30), 1e-9), problem.n - 2);
+    if (HasFailure()) FAIL() << "seed " << seed;
+  }
+}
+
+}  // namespace
+}  // namespace sm::test
