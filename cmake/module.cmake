@@ -18,8 +18,10 @@ add_library(qxesm_objects OBJECT
   cholesky/dense.cpp
   cholesky/factor.cpp
   cholesky/ginverse2.cpp
+  cholesky/ginverse2_blocked.cpp
   cholesky/given_order.cpp
   cholesky/inverse_diagonal.cpp
+  cholesky/band_solver.cpp
   cholesky/block_factor.cpp
   cholesky/block_update.cpp
   cholesky/blocks.cpp
@@ -29,6 +31,7 @@ add_library(qxesm_objects OBJECT
   cholesky/ordering.cpp
   cholesky/refill.cpp
   cholesky/reorder.cpp
+  cholesky/slabs.cpp
   cholesky/solve.cpp
   cholesky/sparse_solve.cpp
   cholesky/substitution_avx2.cpp
