@@ -1,8 +1,8 @@
 // The blocked road of ginverse2, band after band in slabs, with the tile kernels of the sparse factorization:
-//   A -> R       left-looking: a band takes the updates of all rows above it, is factored, and its rows are solved for.
-//   R -> M       M = R'^-, a lower triangle, by forward substitution: the rows of band B of M need of R only the columns
-//                of band B, whose place they take.
-//   M -> M'M     the generalized inverse: band S adds M(S, i)'M(S, j) to the bands before it, then becomes its own part.
+//   A -> R    left-looking: a band takes the updates of all rows above it, is factored, and its rows are solved for.
+//   R -> M    M = R'^-, a lower triangle, by forward substitution: the rows of band B of M need of R only the columns of
+//             band B, whose place they take.
+//   M -> M'M  the generalized inverse: band S adds M(S, i)'M(S, j) to the bands before it, then becomes its own part.
 // A dropped pivot has a row of zeros in R and in M.
 //
 // Blocked Cholesky and its inverse: Anderson et al., "LAPACK Users' Guide", 3rd ed., SIAM (1999). Panels for each level
@@ -21,9 +21,14 @@ constexpr i64 kDepth = 2 * kBand;  // rows whose coefficients for a band fit in 
 
 class DenseWork {
  public:
-  // `coefficients`: kBand * kDepth for the factor, what inverse_size says for the inverse.
+  // `coefficients`: as many doubles as `coefficient_count` says.
   DenseWork(const Slabs& slabs, double* coefficients) : slabs_(slabs), coefficient_(coefficients), solver_(tiles_) {}
-  static i64 inverse_size(i64 n) { return kBand * (Slabs::rounded(n) + kBand); }
+  static i64 coefficient_count(i64 n, bool inverse) {
+    const i64 order = Slabs::rounded(n);
+    const i64 width = std::min(kBand, order);
+    // The inverse keeps a whole band and its diagonal block, the factor what lies above a band, kDepth rows at a time.
+    return width * (inverse ? order + width : std::min(kDepth, order - width));
+  }
 
   [[nodiscard]] SmStatus factor(const PackedPivots& pivots);
   void invert();
@@ -143,7 +148,7 @@ SmStatus ginverse2_in_slabs(MemoryPool* pool, const PackedJob& job, PackedReport
   constexpr i64 kLine = 64 / sizeof(double);
   const i64 size = Slabs::size(job.n);
   Scratch<double> work;
-  const i64 coefficients = job.mode == kPackedFactor ? kBand * kDepth : DenseWork::inverse_size(job.n);
+  const i64 coefficients = DenseWork::coefficient_count(job.n, job.mode != kPackedFactor);
   SM_TRY(work.take(pool, size + coefficients + kLine));
   const auto past = static_cast<i64>(reinterpret_cast<std::uintptr_t>(work.data()) / sizeof(double)) % kLine;
   double* data = work.data() + (kLine - past) % kLine;  // vectors that cross no cache line

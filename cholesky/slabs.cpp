@@ -1,5 +1,5 @@
-// Between the packed layouts and the slabs, a square of 24 at a time: its rows lie far apart in a packed triangle, and
-// a page of each serves the next squares too.
+// Between the packed layouts and the slabs, a square of 24 at a time in the order of the packed layout: 24 of its
+// columns, or rows, lie on as many pages, which serve the next squares too.
 #include "cholesky/slabs.hpp"
 
 #include "store/layouts.hpp"
@@ -8,22 +8,39 @@ namespace sm {
 
 namespace {
 
-// Calls f(packed position, slab element) for the upper triangle, down the columns or along the rows of each square,
-// whichever is contiguous in the packed layout.
-template <class Layout, class F>
-void for_each_element(const Layout& layout, const Slabs& slabs, i64 row, i64 column, F&& f) {
-  const i64 n = slabs.n();
+// Calls f(packed position, slab element) for the upper triangle's part of a square, along what is contiguous in the
+// packed layout.
+template <class F>
+void for_each_element(const PackedColumns& layout, const Slabs& slabs, i64 row, i64 column, F&& f) {
   double* square = slabs.upper(row, column);
-  const i64 columns = std::min(kSlab, n - column);
-  for (i64 r = 0; r < std::min(kSlab, n - row); ++r) {
-    for (i64 c = row == column ? r : 0; c < columns; ++c) f(layout.at(row + r, column + c), square[r * kSlab + c]);
+  const i64 columns = std::min(kSlab, layout.n - column);
+  for (i64 c = 0; c < columns; ++c) {
+    const i64 position = layout.at(row, column + c);
+    const i64 rows = row == column ? c + 1 : kSlab;
+    for (i64 r = 0; r < rows; ++r) f(position + r, square[r * kSlab + c]);
+  }
+}
+template <class F>
+void for_each_element(const PackedRows& layout, const Slabs& slabs, i64 row, i64 column, F&& f) {
+  double* square = slabs.upper(row, column);
+  const i64 columns = std::min(kSlab, layout.n - column);
+  const i64 rows = std::min(kSlab, layout.n - row);
+  for (i64 r = 0; r < rows; ++r) {
+    const i64 position = layout.at(row + r, column);
+    for (i64 c = row == column ? r : 0; c < columns; ++c) f(position + c, square[r * kSlab + c]);
   }
 }
 
 template <class F>
-void for_each_square(const Slabs& slabs, F&& f) {
-  for (i64 row = 0; row < slabs.order(); row += kSlab) {
-    for (i64 column = row; column < slabs.order(); column += kSlab) f(row, column);
+void for_each_square(const PackedColumns&, i64 order, F&& f) {
+  for (i64 column = 0; column < order; column += kSlab) {
+    for (i64 row = 0; row <= column; row += kSlab) f(row, column);
+  }
+}
+template <class F>
+void for_each_square(const PackedRows&, i64 order, F&& f) {
+  for (i64 row = 0; row < order; row += kSlab) {
+    for (i64 column = row; column < order; column += kSlab) f(row, column);
   }
 }
 
@@ -31,7 +48,7 @@ void for_each_square(const Slabs& slabs, F&& f) {
 
 void Slabs::load(const double* array, std::int32_t format) const {
   with_packed(format, n_, [&](auto layout) {
-    for_each_square(*this, [&](i64 row, i64 column) {
+    for_each_square(layout, order_, [&](i64 row, i64 column) {
       if (row == column || column + kSlab > n_) std::fill_n(upper(row, column), kSlab * kSlab, 0.0);
       for_each_element(layout, *this, row, column, [&](i64 position, double& element) { element = array[position]; });
     });
@@ -40,7 +57,7 @@ void Slabs::load(const double* array, std::int32_t format) const {
 
 void Slabs::store(double* array, std::int32_t format) const {
   with_packed(format, n_, [&](auto layout) {
-    for_each_square(*this, [&](i64 row, i64 column) {
+    for_each_square(layout, order_, [&](i64 row, i64 column) {
       for_each_element(layout, *this, row, column, [&](i64 position, double element) { array[position] = element; });
     });
   });
