@@ -1,13 +1,12 @@
-// Everything happens in a copy of the triangle by columns, whatever the format: column k of R, of its inverse and of
-// the result are contiguous there, and the caller's array is written when nothing can fail any more.
+// The plain road: everything happens in a copy of the triangle by columns, whatever the format: column k of R, of its
+// inverse and of the result are contiguous there, and the caller's array is written when nothing can fail any more.
 //
 // Inversion by R^-1 R^-T as in LAPACK's packed routines: Anderson et al., "LAPACK Users' Guide", 3rd ed., SIAM (1999).
 #include "cholesky/ginverse2.hpp"
 
 #include <algorithm>
-#include <cmath>
 
-#include "cholesky/steps.hpp"
+#include "cholesky/packed_roads.hpp"
 #include "forms/kernels.hpp"
 #include "frame/memory.hpp"
 #include "store/layouts.hpp"
@@ -43,28 +42,9 @@ SmStatus to_factor(double* t, i64 n, double tolerance) {
       const double* ri = column(t, i);
       rk[i] = ri[i] > 0.0 ? (rk[i] - hzvdot11(ri, rk, i)) / ri[i] : 0.0;
     }
-    const PivotLimits limits(rk[k], tolerance);
-    const double d = rk[k] - hzvdot11(rk, rk, k);
-    if (d > limits.accept) {
-      rk[k] = std::sqrt(d);
-    } else if (d < limits.refuse) {
-      return SM_NOT_DEFINITE;
-    } else {
-      rk[k] = 0.0;
-    }
+    SM_TRY(find_root(rk[k], tolerance, rk[k] - hzvdot11(rk, rk, k), rk[k]));
   }
   return SM_OK;
-}
-
-void report(const double* t, i64 n, double& log_det, i64& rank) {
-  log_det = 0.0;
-  rank = 0;
-  for (i64 k = 0; k < n; ++k) {
-    const double r = t[k * (k + 1) / 2 + k];
-    if (!(r > 0.0)) continue;
-    log_det += 2.0 * std::log(r);
-    ++rank;
-  }
 }
 
 // R -> T, the inverse of its accepted block in place; rows and columns of dropped pivots become 0. Column k of T is
@@ -102,27 +82,35 @@ void multiply_by_transpose(double* t, i64 n) {
 
 }  // namespace
 
-SmStatus ginverse2(SmInstance* instance, double* array, i64 n, double* log_det, i64* rank, std::int32_t mode,
-                   double tolerance, std::int32_t format, std::int16_t* definite) {
+SmStatus ginverse2_by_columns(MemoryPool* pool, const PackedJob& job, PackedReport& report) {
+  const i64 n = job.n;
   // Order 1 is what a diagonal preconditioner asks for, once a row: it costs no allocation.
   double single = 0.0;
   Scratch<double> work;
-  if (n > 1) SM_TRY(work.take(instance->pool, n * (n + 1) / 2));
+  if (n > 1) SM_TRY(work.take(pool, n * (n + 1) / 2));
   double* t = n > 1 ? work.data() : &single;
-  load(array, format, n, t);
-  if (mode != kPackedFactorToInverse) {
-    if (const SmStatus status = to_factor(t, n, tolerance); status != SM_OK) {
-      *definite = 0;
-      return status;
-    }
-  }
-  report(t, n, *log_det, *rank);
-  *definite = 1;
-  if (mode != kPackedFactor) {
+  load(job.array, job.format, n, t);
+  if (job.mode != kPackedFactorToInverse) SM_TRY(to_factor(t, n, job.tolerance));
+  for (i64 k = 0; k < n; ++k) report.take(column(t, k)[k]);
+  if (job.mode != kPackedFactor) {
     invert_triangle(t, n);
     multiply_by_transpose(t, n);
   }
-  store(t, format, n, array);
+  store(t, job.format, n, job.array);
+  return SM_OK;
+}
+
+SmStatus ginverse2(SmInstance* instance, double* array, i64 n, double* log_det, i64* rank, std::int32_t mode,
+                   double tolerance, std::int32_t format, std::int16_t* definite) {
+  const PackedJob job = {array, n, format, mode, tolerance};
+  PackedReport report;
+  const auto road = n < kLeastSlabOrder ? ginverse2_by_columns : ginverse2_in_slabs;
+  const SmStatus status = road(instance->pool, job, report);
+  if (status == SM_NOT_DEFINITE) *definite = 0;
+  SM_TRY(status);
+  *log_det = report.log_det;
+  *rank = report.rank;
+  *definite = 1;
   return SM_OK;
 }
 

@@ -15,7 +15,7 @@ inline constexpr std::int32_t kPackedFactorToInverse = 6;  // R -> A^-
 //   R: a dropped pivot has r_kk = 0 and zeros in the rest of its row; its column above stays.
 //   A^-: the inverse of the accepted block, zeros elsewhere; the same from A and from R.
 // log_det, rank and definite describe the accepted pivots. 103 (definite 0) and 101 leave the array, log_det and rank
-// as they were. Work: one more triangle, from the instance's pool.
+// as they were. Work, from the instance's pool: one more triangle, and up to 300 doubles a row.
 [[nodiscard]] SmStatus ginverse2(SmInstance* instance, double* array, i64 n, double* log_det, i64* rank,
                                  std::int32_t mode, double tolerance, std::int32_t format, std::int16_t* definite);
 

@@ -15,9 +15,15 @@ add_library(qxesm_objects OBJECT
   store/nodes.cpp
   store/sizing.cpp
   cholesky/api.cpp
+  cholesky/band_solver.cpp
+  cholesky/block_factor.cpp
+  cholesky/block_tree.cpp
+  cholesky/block_update.cpp
+  cholesky/blocks.cpp
   cholesky/dense.cpp
   cholesky/factor.cpp
   cholesky/ginverse2.cpp
+  cholesky/ginverse2_blocked.cpp
   cholesky/given_order.cpp
   cholesky/inverse_columns.cpp
   cholesky/inverse_diagonal.cpp
@@ -25,11 +31,6 @@ add_library(qxesm_objects OBJECT
   cholesky/inverse_panels.cpp
   cholesky/inverse_pattern.cpp
   cholesky/inverse_square.cpp
-  cholesky/selected_inverse.cpp
-  cholesky/block_factor.cpp
-  cholesky/block_update.cpp
-  cholesky/block_tree.cpp
-  cholesky/blocks.cpp
   cholesky/numeric.cpp
   cholesky/numeric_blocked.cpp
   cholesky/numeric_rows.cpp
@@ -37,6 +38,8 @@ add_library(qxesm_objects OBJECT
   cholesky/ordering_plain.cpp
   cholesky/refill.cpp
   cholesky/reorder.cpp
+  cholesky/selected_inverse.cpp
+  cholesky/slabs.cpp
   cholesky/solve.cpp
   cholesky/sparse_solve.cpp
   cholesky/substitution_avx2.cpp
