@@ -3,9 +3,9 @@
 // Every degree is then the same, and what the general step would do comes down to this: the next pivot is the last
 // vertex of the boundary, being the last to enter the degree lists; the new boundary is the old one without it; the
 // vertices that have no element left go, in the order of the boundary; and of those that have a single one left the
-// first with each such element moves to the end, in that order. So only vertices whose elements were absorbed, and those
-// with a single one, have to be looked at: in designs with dense ends (all levels of a factor linked through the records)
-// the rest of the boundary is long.
+// first with each such element moves to the end, in that order. So only vertices whose elements were absorbed, and
+// those with a single one, have to be looked at: in designs with dense ends (all levels of a factor linked through the
+// records) the rest of the boundary is long.
 #pragma once
 
 #include <algorithm>
@@ -106,8 +106,8 @@ void OrderingGraph<Index>::finish(Index all) {
     absorb_elements(pivot, all, gone, fresh);
     std::sort(gone.items, gone.items + gone.count, earlier);
     for (Index k = 0; k < gone.count; ++k) number(gone.items[k]);
-    Index* const end = std::remove_if(fresh.items, fresh.items + fresh.count,
-                                      [this](Index v) { return vertex(v).mark == kGone; });
+    Index* const end =
+        std::remove_if(fresh.items, fresh.items + fresh.count, [this](Index v) { return vertex(v).mark == kGone; });
     fresh.count = static_cast<Index>(end - fresh.items);
     std::sort(fresh.items, end, earlier);
     std::for_each(fresh.items, end, keep_single);

@@ -17,15 +17,20 @@
 // - Absorbed elements stay on the lists, marked, until a list is walked for another reason or full. How many elements
 //   of a vertex are left is counted while their boundaries are read, for the last time, into the new one.
 // - The two counts tell what the plain road reads off a list: a vertex without any is interior, one with a single
-//   element and nothing else is a prototype or a duplicate. So the list of a vertex in very many elements (a hub) need
-//   not be walked at all. Other lists are, to count for each of their elements how much of its boundary is outside the
-//   new one (Amestoy, Davis, Duff, "An approximate minimum degree ordering algorithm", SIAM J. Matrix Anal. Appl. 17
-//   (1996) 886-905). With k hubs passed over, that number may be too large by k.
+//   element and nothing else is a prototype or a duplicate. So the list of a vertex in very many elements need not be
+//   walked at all. Other lists are, to count for each of their elements how much of its boundary is outside the new one
+//   (Amestoy, Davis, Duff, "An approximate minimum degree ordering algorithm", SIAM J. Matrix Anal. Appl. 17 (1996)
+//   886-905). Of the hubs, up to 64 vertices of the highest degrees, every element knows which are on its boundary, so
+//   that those passed over are counted all the same. With k other vertices passed over the number may be too large by
+//   k.
+// - An element whose boundary is contained in that of a newer one leads to nothing that the newer one does not lead to
+//   before. It still counts as one, but is set apart from the list.
 // - Degrees are bounded: from above by the sum of these numbers, from below by their maximum and by the former bound
-//   less what has been eliminated since. Where the bounds meet the degree is known. Else the lower one enters the degree
-//   lists, with the time when the degree was due, and the count waits until it is the least of all.
+//   less what has been eliminated since. Where the bounds meet the degree is known. Else the lower one enters the
+//   degree lists, with the time when the degree was due, and the count waits until it is the least of all.
 // - A vertex that a prototype outmatches has at least its degree and an earlier time, so that it is never taken before
 //   the prototype, which touches it: whether it is in the lists makes no difference.
+// - Once an element bounds all that is left, only the order of its boundary matters (ordering_finish.hpp).
 //
 // Everything is in one block: a node for each vertex (and the element that it becomes), both directions of the edges,
 // 3/2 cells for each neighbour of a vertex for its elements, so that making room by dropping the absorbed ones is paid
