@@ -5,16 +5,33 @@
 
 namespace sm {
 
+namespace {
+
+template <int kRows>
+void full_strip(const double* const* from, i64 columns, double* out) {
+  for (i64 c = 0; c < columns; ++c, out += kRows) {
+    for (int i = 0; i < kRows; ++i) out[i] = from[i][c];
+  }
+}
+
+}  // namespace
+
 double* strip_coefficients(const Block& u, const double* diag, i64 r, i64 rows, i64 begin, i64 end, double* out) {
   const i64 height = tile_kernels().strip_rows;
+  const double* from[kMostStripRows];
+  bool all = rows == height;
   for (i64 i = 0; i < rows; ++i) {
-    const i64 row = r + rows - 1 - i;
-    const double* from = u.row(row);
-    double* to = out + i;
-    if (is_accepted(diag[row])) {
-      for (i64 c = begin; c < end; ++c, to += height) *to = from[c];
-    } else {
-      for (i64 c = begin; c < end; ++c, to += height) *to = 0.0;
+    from[i] = u.row(r + rows - 1 - i) + begin;
+    all = all && is_accepted(diag[r + i]);
+  }
+  if (all && height == 8) {
+    full_strip<8>(from, end - begin, out);
+  } else if (all && height == 4) {
+    full_strip<4>(from, end - begin, out);
+  } else {
+    for (i64 i = 0; i < rows; ++i) {
+      const bool accepted = is_accepted(diag[r + rows - 1 - i]);
+      for (i64 c = 0; c < end - begin; ++c) out[c * height + i] = accepted ? from[i][c] : 0.0;
     }
   }
   return out + (end - begin) * height;

@@ -7,9 +7,9 @@
 // Row i needs Z where the columns of its own row meet, all of which is on the pattern. A row whose pivot was dropped is
 // zero, and so is its column.
 //
-// As in the factorization the unit is a block of rows with one tail (blocks.hpp): Z on the tail, as a full square, times
-// -U of the block, by the tile kernels. Blocks are walked down their tree. The columns of a block's tail are among the
-// columns of its parent, so that the square is copied from the parent's one, the front, which is kept until the last
+// As in the factorization the unit is a block of rows with one tail (blocks.hpp): Z on the tail, as a full square,
+// times -U of the block, by the tile kernels. Blocks are walked down their tree. The columns of a block's tail are among
+// the columns of its parent, so that the square is copied from the parent's one, the front, which is kept until the last
 // child has been served; where it was too large to keep, it is collected from the rows.
 //
 //   block_tree.hpp      the tree, and the walk
@@ -29,6 +29,7 @@ namespace {
 constexpr i64 kMostFronts = 512;
 constexpr i64 kMostFrontValues = 3 << 19;  // 12 MB
 constexpr i64 kShortTail = 12;             // below, a kernel's overhead is larger than its gain
+constexpr i64 kLongLeaf = 100;             // above, a row without a front to read is better off with a square
 
 // Z on the columns of a block, its own ones first.
 struct Front {
@@ -88,7 +89,7 @@ class Inversion {
   void invert(i64 first);
   void copy_tail(const Block& u, const Front* parent, const Square& z);
   void invert_row(const Block& u, const Square& z);
-  void invert_leaf(const Block& u, const Front& parent);
+  void invert_leaf(const Block& u, const Front* parent);
   void store(const Block& u, const Square& z);
 
   const InverseRows& z_;
@@ -135,19 +136,24 @@ void Inversion::invert_row(const Block& u, const Square& z) {
   for (i64 i = 0; i < tail; ++i) z.row(i + 1)[0] = y[i];
 }
 
-// A single row without children, straight from its parent's front.
-void Inversion::invert_leaf(const Block& u, const Front& parent) {
+// A single row without children, straight from its parent's front, or else from the rows of its columns.
+void Inversion::invert_leaf(const Block& u, const Front* parent) {
   const i64 tail = u.length;
-  const i64* place = work_.place;
-  double* y = z_.values + z_.u.iu[u.first];
   const double* v = u.values;
-  find_places(z_.tree.at(parent.block), u.tail, 0, tail, work_.place);
+  double* y = z_.values + z_.u.iu[u.first];
+  i64* place = work_.place;
+  if (parent) find_places(z_.tree.at(parent->block), u.tail, 0, tail, place);
+  Block b = {-1, 0, 0, nullptr, nullptr};
   std::fill_n(y, tail, 0.0);
   double diagonal = 0.0;
   for (i64 i = 0; i < tail; ++i) {
-    const double* from = parent.z.row(place[i]);
+    if (!parent && u.tail[i] >= b.first + b.width) {
+      b = z_.at(z_.tree.block_of(u.tail[i]));
+      find_places(b, u.tail, i + 1, tail, place + i + 1);
+    }
+    const double* from = parent ? parent->z.row(place[i]) : b.row(u.tail[i] - b.first);
     const double vi = v[i];
-    double sum = y[i] + vi * from[place[i]];
+    double sum = y[i] + vi * (parent ? from[place[i]] : z_.diag[u.tail[i]]);
     for (i64 j = i + 1; j < tail; ++j) {
       const double element = from[place[j]];
       sum += v[j] * element;
@@ -173,8 +179,9 @@ void Inversion::invert(i64 first) {
   const i64 order = u.length + 1;
   const Front* parent = fronts_.find(z_.tree.parent(u));
   const bool keep = z_.tree.child(first) >= 0;
-  if (u.width == 1 && parent && !keep && is_accepted(z_.u.diag[first])) {
-    invert_leaf(u, *parent);
+  const bool single = u.width == 1 && is_accepted(z_.u.diag[first]);
+  if (single && !keep && order <= kMostFrontOrder && (parent || u.length <= kLongLeaf)) {
+    invert_leaf(u, parent);
     return;
   }
   double* room = order <= kMostFrontOrder ? fronts_.room(order) : nullptr;
@@ -185,7 +192,7 @@ void Inversion::invert(i64 first) {
   const Square z = {room, order};
   std::fill_n(room, u.width * order, 0.0);
   copy_tail(u, parent, z);
-  if (u.width == 1 && is_accepted(z_.u.diag[first])) {
+  if (single) {
     invert_row(u, z);
   } else {
     solve_square(u, z_.u.diag + first, z, order, work_);

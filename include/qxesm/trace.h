@@ -32,7 +32,9 @@ QXESM_API SmStatus qxsmtraceAB(SmMatrix* a, SmMatrix* b, double* result);
  * Answers: 100 (both empty, or either of kind none); 113; 111 (A not square, or its order is not B's row count); 124 (A
  * neither symmetric nor diagonal, or inverted); those of qxsmfact; 101; then, *result the sum so far: 117 (start < 0),
  * those of qxsmrow (118 for a reordered symmetric sparse B) and qxsmsubst; 0 (0.0 when start >= n).
- * Cost: a row of B and a solve for each j. */
+ * Cost: a row of B and a solve for each j. For a symmetric sparse A, start 0 and B diagonal, or symmetric in state 1 or
+ * 2 with all its entries where the factor of A has some (as those of A are): that of qxsminvdiag, and a search for each
+ * entry of B; when the memory for it cannot be had, solves. */
 QXESM_API SmStatus qxsmtraceinvAB(SmMatrix* a, SmMatrix* b, int64_t start, double* result);
 
 #endif
