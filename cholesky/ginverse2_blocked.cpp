@@ -1,7 +1,7 @@
 // The blocked road of ginverse2, band after band in slabs, with the tile kernels of the sparse factorization:
 //   A -> R    left-looking: a band takes the updates of all rows above it, is factored, and its rows are solved for.
-//   R -> M    M = R'^-, a lower triangle, by forward substitution: the rows of band B of M need of R only the columns of
-//             band B, whose place they take.
+//   R -> M    M = R'^-, a lower triangle, by forward substitution: the rows of band B of M need of R only the columns
+//             of band B, whose place they take.
 //   M -> M'M  the generalized inverse: band S adds M(S, i)'M(S, j) to the bands before it, then becomes its own part.
 // A dropped pivot has a row of zeros in R and in M.
 //
