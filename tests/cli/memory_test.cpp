@@ -59,11 +59,12 @@ TEST_F(Memory, every_subcommand_ends_with_3_under_some_ceilings_and_never_badly)
     ASSERT_EQ(free.code, 0) << command[0] << free.err;
     const auto peak = free.json().at("peak_pool_bytes").get<std::uint64_t>();
     int refused = 0;
-    for (std::uint64_t step = 1; step <= 9; ++step) {
+    // Far below the peak: what is only quicker with memory does with less.
+    for (const std::uint64_t part : {1, 2, 3, 4, 6, 8, 16, 32, 64, 128}) {
       std::vector<std::string> limited = command;
-      limited.insert(limited.end(), {"--memory", std::to_string(peak * step / 8), "--quiet"});
+      limited.insert(limited.end(), {"--memory", std::to_string(peak / part), "--quiet"});
       const Outcome run = qxsm(limited);
-      EXPECT_TRUE(run.code == 3 || run.code == 0) << command[0] << step << run.err;
+      EXPECT_TRUE(run.code == 3 || run.code == 0) << command[0] << part << run.err;
       refused += run.code == 3 ? 1 : 0;
     }
     EXPECT_GE(refused, 3) << command[0];
