@@ -11,9 +11,7 @@ namespace sm {
 namespace {
 
 Gate may_read_inverse(const SmMatrix& m) {
-  SM_STOP_IF(m.nnz < 1, SM_OK);
-  SM_STOP_IF(m.kind == SM_KIND_NONE, SM_UNTYPED);
-  SM_STOP_IF(!is_closed(m), SM_NOT_CLOSED);
+  SM_STOP_WITH(may_read(m));
   SM_STOP_IF(m.rows != m.cols, SM_NOT_SQUARE);
   SM_STOP_IF(!is_symmetric_sparse(m), SM_UNAVAILABLE);
   return {};

@@ -1,5 +1,7 @@
 #include "cholesky/block_cases.hpp"
 
+#include <utility>
+
 namespace sm::test {
 
 Graph linked_cliques(Random& random, const Indices& sizes, std::int64_t percent) {
@@ -19,6 +21,27 @@ Graph linked_cliques(Random& random, const Indices& sizes, std::int64_t percent)
         if (random.chance(keep)) g.edges.emplace_back(first[a] + random.below(sizes[a]), j);
     }
   return relabelled(g, natural_order(g.n));  // sorted, each edge once
+}
+
+Graph any_linked_cliques(Random& random) {
+  Indices sizes;
+  const std::int64_t count = 2 + random.below(14);
+  for (std::int64_t k = 0; k < count; ++k) sizes.push_back(1 + random.below(random.chance(30) ? 40 : 9));
+  return linked_cliques(random, sizes, 20 + random.below(60));
+}
+
+std::vector<Graph> smallest_graphs() {
+  std::vector<Graph> graphs;
+  for (std::int64_t n = 1; n <= 3; ++n)
+    for (int edges = 0; edges < 1 << (n * (n - 1) / 2); ++edges) {
+      Graph g{n, {}};
+      int bit = 1;
+      for (std::int64_t i = 0; i < n; ++i)
+        for (std::int64_t j = i + 1; j < n; ++j, bit *= 2)
+          if (edges & bit) g.edges.emplace_back(i, j);
+      graphs.push_back(std::move(g));
+    }
+  return graphs;
 }
 
 Graph bordered_clique(std::int64_t width, std::int64_t gap, std::int64_t tail) {

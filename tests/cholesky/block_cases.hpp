@@ -7,6 +7,10 @@ namespace sm::test {
 
 // Cliques one behind the other, each with edges to some vertices of some later ones.
 Graph linked_cliques(Random& random, const Indices& sizes, std::int64_t percent);
+// The same of a few sizes, mostly below ten.
+Graph any_linked_cliques(Random& random);
+// Every graph of one to three vertices.
+std::vector<Graph> smallest_graphs();
 // A clique whose every vertex touches `tail` vertices that follow it, after `gap` others that touch those only.
 Graph bordered_clique(std::int64_t width, std::int64_t gap, std::int64_t tail);
 // Counts of a design with an intercept and every level of two crossed factors: of rank 1 less than its order for each

@@ -77,24 +77,14 @@ TEST_P(SelectedInverseTest, agrees_with_solves_on_small_matrices_of_every_struct
 
 TEST_P(SelectedInverseTest, agrees_with_solves_on_all_structures_of_up_to_three_rows) {
   Random random(1);
-  for (std::int64_t n = 1; n <= 3; ++n)
-    for (int edges = 0; edges < 8; ++edges) {
-      Graph g{n, {}};
-      int bit = 1;
-      for (std::int64_t i = 0; i < n; ++i)
-        for (std::int64_t j = i + 1; j < n; ++j, bit *= 2)
-          if (edges & bit) g.edges.emplace_back(i, j);
-      check(positive_definite(g, random), true);
-    }
+  for (const Graph& g : smallest_graphs()) check(positive_definite(g, random), true);
 }
 
 TEST_P(SelectedInverseTest, agrees_with_solves_on_linked_cliques) {
   for (std::uint64_t seed = 0; seed < 60; ++seed) {
     Random random(seed);
-    Indices sizes;
-    const std::int64_t count = 2 + random.below(14);
-    for (std::int64_t k = 0; k < count; ++k) sizes.push_back(1 + random.below(random.chance(30) ? 40 : 9));
-    check(positive_definite(linked_cliques(random, sizes, 20 + random.below(60)), random), random.chance(70));
+    const Graph g = any_linked_cliques(random);
+    check(positive_definite(g, random), random.chance(70));
     if (HasFailure()) FAIL() << "seed " << seed;
   }
 }

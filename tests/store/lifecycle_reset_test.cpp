@@ -33,17 +33,7 @@ void expect_reset(const SmMatrix* m) {
   EXPECT_EQ(m->values, nullptr);
   EXPECT_EQ(m->row_start, nullptr);
   EXPECT_EQ(m->owns_values, 0);
-  EXPECT_EQ(m->perm, nullptr);
-  EXPECT_EQ(m->inv_perm, nullptr);
-  EXPECT_EQ(m->nz_values, nullptr);
-  EXPECT_EQ(m->work, nullptr);
-  EXPECT_EQ(m->factor_scratch, nullptr);
-  EXPECT_EQ(m->factor_diag, nullptr);
-  EXPECT_EQ(m->factor_values, nullptr);
-  EXPECT_EQ(m->factor_iju, nullptr);
-  EXPECT_EQ(m->factor_iu, nullptr);
-  EXPECT_EQ(m->factor_ju, nullptr);
-  EXPECT_EQ(m->factor_reserved, nullptr);
+  expect_no_factor(m);
   EXPECT_EQ(m->sym_roots, nullptr);
 }
 

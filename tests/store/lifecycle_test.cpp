@@ -39,16 +39,7 @@ void expect_fresh(const SmMatrix* m, Shape shape) {
   EXPECT_EQ(m->values, nullptr);
   EXPECT_EQ(m->row_start, nullptr);
   EXPECT_EQ(m->tree != nullptr, is_sparse(shape));
-  EXPECT_EQ(m->perm, nullptr);
-  EXPECT_EQ(m->inv_perm, nullptr);
-  EXPECT_EQ(m->nz_values, nullptr);
-  EXPECT_EQ(m->work, nullptr);
-  EXPECT_EQ(m->factor_scratch, nullptr);
-  EXPECT_EQ(m->factor_diag, nullptr);
-  EXPECT_EQ(m->factor_values, nullptr);
-  EXPECT_EQ(m->factor_iju, nullptr);
-  EXPECT_EQ(m->factor_iu, nullptr);
-  EXPECT_EQ(m->factor_ju, nullptr);
+  expect_no_factor(m);
   EXPECT_EQ(m->sym_roots, nullptr);
   if (shape.kind == SM_KIND_SYMMETRIC && is_sparse(shape)) {
     EXPECT_EQ(m->col_index, nullptr);

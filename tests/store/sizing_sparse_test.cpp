@@ -27,17 +27,8 @@ class SizingSparse : public StoreTest {
   static void expect_no_factor_fields(const SmMatrix* m) {
     EXPECT_EQ(m->row_start, nullptr);
     EXPECT_EQ(m->col_index, nullptr);
-    EXPECT_EQ(m->nz_values, nullptr);
     EXPECT_EQ(m->work_capacity, 0);
-    EXPECT_EQ(m->perm, nullptr);
-    EXPECT_EQ(m->inv_perm, nullptr);
-    EXPECT_EQ(m->work, nullptr);
-    EXPECT_EQ(m->factor_scratch, nullptr);
-    EXPECT_EQ(m->factor_diag, nullptr);
-    EXPECT_EQ(m->factor_values, nullptr);
-    EXPECT_EQ(m->factor_iju, nullptr);
-    EXPECT_EQ(m->factor_iu, nullptr);
-    EXPECT_EQ(m->factor_ju, nullptr);
+    expect_no_factor(m);
     EXPECT_EQ(m->factor_block, 1);
   }
 

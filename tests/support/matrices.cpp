@@ -202,6 +202,20 @@ void expect_voided(const SmMatrix* m) {
   EXPECT_TRUE(is_missing(m->log_det));
 }
 
+void expect_no_factor(const SmMatrix* m) {
+  EXPECT_EQ(m->perm, nullptr);
+  EXPECT_EQ(m->inv_perm, nullptr);
+  EXPECT_EQ(m->nz_values, nullptr);
+  EXPECT_EQ(m->work, nullptr);
+  EXPECT_EQ(m->factor_scratch, nullptr);
+  EXPECT_EQ(m->factor_diag, nullptr);
+  EXPECT_EQ(m->factor_values, nullptr);
+  EXPECT_EQ(m->factor_iju, nullptr);
+  EXPECT_EQ(m->factor_iu, nullptr);
+  EXPECT_EQ(m->factor_ju, nullptr);
+  EXPECT_EQ(m->factor_reserved, nullptr);
+}
+
 Indices words(const std::int64_t* array, std::int64_t count) { return {array, array + count}; }
 
 std::vector<double> doubles(const double* array, std::int64_t count) { return {array, array + count}; }

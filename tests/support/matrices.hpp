@@ -59,6 +59,8 @@ std::vector<double> laid_out(Shape shape, const Dense& a);
 
 // Expects that rank and log-determinant are those of a matrix whose entries have changed.
 void expect_voided(const SmMatrix* m);
+// No compressed values, no permutations and nothing of a factor.
+void expect_no_factor(const SmMatrix* m);
 
 Indices words(const std::int64_t* array, std::int64_t count);
 std::vector<double> doubles(const double* array, std::int64_t count);
