@@ -226,7 +226,7 @@ SmStatus SelectedInverse::compute() {
   const NumericArrays u(m_, m_.factor_scratch - m_.work);
   SM_TRY(need_pool(m_));
   SM_TRY(diag_.take(m_.pool, u.n));
-  SM_TRY(values_.take(m_.pool, u.iu[u.n]));
+  SM_TRY(values_.take(m_.pool, std::max<i64>(u.iu[u.n], 1)));  // rows are addressed even where none has entries
   BlockTree tree(u);
   tree.build();
   const i64 capacity = front_values(tree);
