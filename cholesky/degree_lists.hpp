@@ -7,8 +7,6 @@
 // and a vertex leaves it from anywhere without a comparison, because its children take its place.
 #pragma once
 
-#include <type_traits>
-
 #include "frame/core.hpp"
 
 namespace sm {
@@ -30,7 +28,6 @@ class DegreeLists {
 
   bool holds(Index v) const { return at(v).before != kOutside; }
   Known known(Index v) const { return static_cast<Known>(time_[v] & 1); }
-  Index least() const { return least_; }
 
   void insert_newest(Index v, Index degree, Known known) {
     time_[v] = clock_ | static_cast<i64>(known);
