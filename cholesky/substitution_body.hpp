@@ -34,35 +34,17 @@ SM_PASS_INLINE Strip<kRows> strip_of(const FactorRows& f, i64 block, i64 first) 
   return s;
 }
 
-// Within the strip, w being its components of one vector or, lane by lane, of several.
-template <int kRows, class Component>
-SM_PASS_INLINE void eliminate_inside(const Strip<kRows>& s, Component* w) {
-#pragma GCC unroll 8
-  for (int i = 0; i < kRows; ++i) {
-#pragma GCC unroll 8
-    for (int j = i + 1; j < kRows; ++j) w[j] += s.row[i][s.inside + j] * w[i];
-  }
-}
-
-// w holds what the columns behind the strip give.
-template <int kRows, class Component>
-SM_PASS_INLINE void finish_inside(const Strip<kRows>& s, Component* w, Component* y) {
-#pragma GCC unroll 8
-  for (int i = kRows - 1; i >= 0; --i) {
-#pragma GCC unroll 8
-    for (int j = i + 1; j < kRows; ++j) w[i] += s.row[i][s.inside + j] * w[j];
-    w[i] += y[i];
-    y[i] = w[i];
-  }
-}
-
 // One vector. Behind the strip eight columns are taken together.
 struct Single {
   template <int kRows>
   SM_PASS_INLINE static void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
     double w[kRows];
     for (int i = 0; i < kRows; ++i) w[i] = y[first + i];
-    eliminate_inside(s, w);
+#pragma GCC unroll 8
+    for (int i = 0; i < kRows; ++i) {
+#pragma GCC unroll 8
+      for (int j = i + 1; j < kRows; ++j) w[j] += s.row[i][s.inside + j] * w[i];
+    }
     i64 c = 0;
     if constexpr (kRows > 1) {
       for (; c + kLanes <= s.count; c += kLanes) {
@@ -105,7 +87,12 @@ struct Single {
 #pragma GCC unroll 8
       for (int i = 0; i < kRows; ++i) w[i] += s.row[i][s.behind + c] * z;
     }
-    finish_inside(s, w, y + first);
+#pragma GCC unroll 8
+    for (int i = kRows - 1; i >= 0; --i) {
+#pragma GCC unroll 8
+      for (int j = i + 1; j < kRows; ++j) w[i] += s.row[i][s.inside + j] * w[j];
+      y[first + i] = w[i] += y[first + i];
+    }
   }
 };
 
@@ -118,7 +105,11 @@ struct Several {
     Lanes w[kRows];
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) w[i] = at(y, first + i);
-    eliminate_inside(s, w);
+#pragma GCC unroll 8
+    for (int i = 0; i < kRows; ++i) {
+#pragma GCC unroll 8
+      for (int j = i + 1; j < kRows; ++j) w[j] += s.row[i][s.inside + j] * w[i];
+    }
     for (i64 c = 0; c < s.count; ++c) {
       Lanes sum = s.row[0][s.behind + c] * w[0];
 #pragma GCC unroll 8
@@ -139,7 +130,13 @@ struct Several {
 #pragma GCC unroll 8
       for (int i = 0; i < kRows; ++i) w[i] += s.row[i][s.behind + c] * z;
     }
-    finish_inside(s, w, &at(y, first));
+#pragma GCC unroll 8
+    for (int i = kRows - 1; i >= 0; --i) {
+#pragma GCC unroll 8
+      for (int j = i + 1; j < kRows; ++j) w[i] += s.row[i][s.inside + j] * w[j];
+      w[i] += at(y, first + i);
+      at(y, first + i) = w[i];
+    }
   }
 };
 
