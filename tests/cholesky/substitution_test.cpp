@@ -18,12 +18,12 @@ class SubstitutionTest : public ModuleTest {
     ModuleTest::TearDown();
   }
   std::vector<double> solve(SmMatrix* m, const std::vector<double>& b) {
-    // One more column, to see that nothing is written behind the last.
-    std::vector<double> x(b.size() + at(m->rows), 0.25);
-    EXPECT_EQ(qxsmsubst(m, b.data(), x.data(), static_cast<std::int32_t>(b.size() / at(m->rows))), SM_OK);
-    for (std::size_t i = b.size(); i < x.size(); ++i) EXPECT_EQ(x[i], 0.25) << "behind the last vector";
-    x.resize(b.size());
-    return x;
+    // One more column, to see that nothing is written behind the last; and at an odd address, since callers may.
+    std::vector<double> x(b.size() + at(m->rows) + 1, 0.25);
+    EXPECT_EQ(qxsmsubst(m, b.data(), x.data() + 1, static_cast<std::int32_t>(b.size() / at(m->rows))), SM_OK);
+    EXPECT_EQ(x.front(), 0.25) << "before the first vector";
+    for (std::size_t i = b.size() + 1; i < x.size(); ++i) EXPECT_EQ(x[i], 0.25) << "behind the last vector";
+    return {x.begin() + 1, x.begin() + 1 + static_cast<std::ptrdiff_t>(b.size())};
   }
   // U'DU X = B by plain loops over the stored factor, in long double.
   static std::vector<double> by_loops(const SmMatrix* m, const std::vector<double>& b) {
