@@ -5,6 +5,7 @@ option(QXESM_COVERAGE "Line and branch coverage (gcov)" OFF)
 option(QXESM_BUILD_TESTS "Build the tests" ${PROJECT_IS_TOP_LEVEL})
 option(QXESM_BUILD_CLI "Build the qxsm command" ON)
 option(QXESM_BUILD_FUZZERS "Build the libFuzzer targets (clang only)" OFF)
+option(QXESM_PRECOMPILE "Precompile the headers of the larger test programs" OFF)
 option(QXESM_BUILD_BENCH "Build the benchmarks" OFF)
 
 if(NOT CMAKE_BUILD_TYPE AND NOT CMAKE_CONFIGURATION_TYPES)
@@ -22,8 +23,12 @@ if(QXESM_WERROR)
   target_compile_options(qxesm_options INTERFACE -Werror)
 endif()
 if(QXESM_SANITIZE)
-  target_compile_options(qxesm_options INTERFACE -fsanitize=address,undefined -fno-sanitize-recover=undefined
-    -fno-omit-frame-pointer -g)
+  # Test programs are not instrumented themselves, which would take most of the time of such a build; what they call is.
+  define_property(TARGET PROPERTY PLAIN_CODE INITIALIZE_FROM_VARIABLE QXESM_PLAIN_CODE
+    BRIEF_DOCS "Compile without the sanitizers")
+  set(instrumented $<NOT:$<BOOL:$<TARGET_PROPERTY:PLAIN_CODE>>>)
+  target_compile_options(qxesm_options INTERFACE -fno-omit-frame-pointer -g
+    "$<${instrumented}:-fsanitize=address,undefined;-fno-sanitize-recover=undefined>")
   target_link_options(qxesm_options INTERFACE -fsanitize=address,undefined)
 endif()
 if(QXESM_COVERAGE)
