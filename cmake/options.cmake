@@ -5,7 +5,6 @@ option(QXESM_COVERAGE "Line and branch coverage (gcov)" OFF)
 option(QXESM_BUILD_TESTS "Build the tests" ${PROJECT_IS_TOP_LEVEL})
 option(QXESM_BUILD_CLI "Build the qxsm command" ON)
 option(QXESM_BUILD_FUZZERS "Build the libFuzzer targets (clang only)" OFF)
-option(QXESM_PRECOMPILE "Precompile the headers of the larger test programs" OFF)
 option(QXESM_BUILD_BENCH "Build the benchmarks" OFF)
 
 if(NOT CMAKE_BUILD_TYPE AND NOT CMAKE_CONFIGURATION_TYPES)
