@@ -79,7 +79,7 @@ void substitute_sparse(const SmMatrix& m, const double* b, double* x, i64 count)
   const SparseSolve solve(m);
   const i64 group = kLanes * m.rows;
   for (; count >= kLanes; count -= kLanes, b += group, x += group) {
-    solve.several(b, x, count >= 2 * kLanes ? x + group : x);
+    solve.several(b, x, count - kLanes >= kLanes ? x + group : x);
   }
   for (; count > 0; --count, b += m.rows, x += m.rows) solve.one(b, x);
 }
