@@ -1,6 +1,4 @@
 // The generalized inverse at the stored positions of a matrix.
-#include <algorithm>
-
 #include "cholesky/reorder.hpp"
 #include "cholesky/selected_inverse.hpp"
 #include "cholesky/steps.hpp"
