@@ -1,0 +1,26 @@
+#include "mixed/error.hpp"
+
+#include <gtest/gtest.h>
+
+namespace sm::mixed::test {
+namespace {
+
+TEST(Fault, names_file_line_column_variable_cause_and_remedy) {
+  EXPECT_EQ(describe({.file = "milk.csv",
+                      .line = 17,
+                      .column = 9,
+                      .variable = "yield",
+                      .what = "found \"12,5\"",
+                      .expected = "a number",
+                      .advice = "write a decimal point"}),
+            "milk.csv:17:9: 'yield': found \"12,5\", expected a number; write a decimal point");
+}
+
+TEST(Fault, leaves_out_what_it_does_not_know) {
+  EXPECT_EQ(describe({.what = "no observation is left"}), "no observation is left");
+  EXPECT_EQ(describe({.column = 5, .what = "found ')'"}), "column 5: found ')'");
+  EXPECT_EQ(describe({.file = "a.csv", .variable = "g", .what = "has one level"}), "a.csv: 'g': has one level");
+}
+
+}  // namespace
+}  // namespace sm::mixed::test
