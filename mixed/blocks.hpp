@@ -26,7 +26,7 @@ struct Block {
 
 // Calls visit(block) for each block of the upper triangle, row by row.
 template <class Visit>
-void walk_blocks(const Design& design, const Gram& gram, Part part, Visit visit) {
+void walk_blocks(const ScaledDesign& design, const Gram& gram, Part part, Visit visit) {
   const std::size_t terms = design.terms().size();
   const std::int64_t nodes = part == Part::all ? gram.nodes() : gram.random_nodes();
   std::vector<std::size_t> row_place;

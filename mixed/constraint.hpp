@@ -11,7 +11,7 @@ namespace sm::mixed {
 // A' x = 0, A the null vectors of the precisions, one for each coefficient.
 class Constraint {
  public:
-  explicit Constraint(const Design& design);
+  explicit Constraint(const ScaledDesign& design);
   bool empty() const { return vectors_.empty(); }
 
   // For the factor that the equations have now: a few solves for each null vector.
@@ -31,7 +31,7 @@ class Constraint {
   };
   std::vector<double> products(std::span<const double> x) const;  // A' x for one vector
 
-  const Design& design_;
+  const ScaledDesign& design_;
   std::vector<NullVector> vectors_;
   double log_det_ = 0.0;
   std::size_t order_ = 0;

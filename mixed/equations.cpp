@@ -17,7 +17,7 @@ std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
 }  // namespace
 
-Equations::Equations(Module& module, const Design& design, const Gram& gram, Part part)
+Equations::Equations(Module& module, const ScaledDesign& design, const Gram& gram, Part part)
     : module_(module), design_(design), gram_(gram), part_(part) {
   order_ = part == Part::all ? design.unknowns() : design.random_count();
   if (part == Part::all) {

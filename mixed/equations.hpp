@@ -24,7 +24,7 @@ class Constraint;
 class Equations {
  public:
   // Throws through Module::expect_ok. Keeps references to all three.
-  Equations(Module& module, const Design& design, const Gram& gram, Part part);
+  Equations(Module& module, const ScaledDesign& design, const Gram& gram, Part part);
   ~Equations();
   Equations(const Equations&) = delete;
   Equations& operator=(const Equations&) = delete;
@@ -69,7 +69,7 @@ class Equations {
   bool pivots_as_expected();
 
   Module& module_;
-  const Design& design_;
+  const ScaledDesign& design_;
   const Gram& gram_;
   Part part_;
   std::int64_t order_ = 0;

@@ -53,7 +53,7 @@ class BlockRow {
 
 }  // namespace
 
-void Gram::number_nodes(const Design& design) {
+void Gram::number_nodes(const ScaledDesign& design) {
   for (const DesignTerm& term : design.terms()) {
     first_node_.push_back(random_nodes_);
     first_unknown_.push_back(term.first);
@@ -75,7 +75,7 @@ namespace {
 // Fills block rows from the observations.
 class Accumulator {
  public:
-  Accumulator(const Design& design, const Gram& gram)
+  Accumulator(const ScaledDesign& design, const Gram& gram)
       : design_(design), gram_(gram), next_(design.row_start().begin(), design.row_start().end() - 1) {
     for (const DesignTerm& term : design.terms()) occurrences_.emplace_back(term);
   }
@@ -137,7 +137,7 @@ class Accumulator {
     }
   }
 
-  const Design& design_;
+  const ScaledDesign& design_;
   const Gram& gram_;
   std::vector<Occurrences> occurrences_;
   std::vector<std::int64_t> next_;
@@ -145,7 +145,7 @@ class Accumulator {
 
 }  // namespace
 
-Gram::Gram(const Design& design) {
+Gram::Gram(const ScaledDesign& design) {
   number_nodes(design);
   const std::int64_t count = random_nodes_ + design.fixed_count();
   start_.assign(at(count) + 1, 0);

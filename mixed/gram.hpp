@@ -7,13 +7,13 @@
 #include <span>
 #include <vector>
 
-#include "mixed/design.hpp"
+#include "mixed/scaled_design.hpp"
 
 namespace sm::mixed {
 
 class Gram {
  public:
-  explicit Gram(const Design& design);
+  explicit Gram(const ScaledDesign& design);
 
   std::int64_t nodes() const { return static_cast<std::int64_t>(start_.size()) - 1; }
   std::int64_t random_nodes() const { return random_nodes_; }
@@ -39,7 +39,7 @@ class Gram {
 
  private:
   static std::size_t index(std::int64_t i) { return static_cast<std::size_t>(i); }
-  void number_nodes(const Design& design);
+  void number_nodes(const ScaledDesign& design);
 
   std::int64_t random_nodes_ = 0;
   std::vector<std::int64_t> first_node_;

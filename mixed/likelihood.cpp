@@ -10,7 +10,7 @@ std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
 }  // namespace
 
-Likelihood::Likelihood(Module& module, const Design& design, bool reml)
+Likelihood::Likelihood(Module& module, const ScaledDesign& design, bool reml)
     : module_(module),
       design_(design),
       gram_(design),

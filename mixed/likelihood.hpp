@@ -24,7 +24,7 @@ struct CriterionParts {
 
 class Likelihood {
  public:
-  Likelihood(Module& module, const Design& design, bool reml);
+  Likelihood(Module& module, const ScaledDesign& design, bool reml);
 
   // The last evaluation leaves its factor and its solution.
   CriterionParts evaluate(const Factors& factors, bool with_gradient);
@@ -32,7 +32,7 @@ class Likelihood {
   double profiled(const CriterionParts& parts) const;
   double at_variance(const CriterionParts& parts, double variance) const;
 
-  const Design& design() const { return design_; }
+  const ScaledDesign& design() const { return design_; }
   const Gram& gram() const { return gram_; }
   bool reml() const { return reml_; }
   const std::vector<double>& solution() const { return solution_; }  // b and transformed beta
@@ -50,7 +50,7 @@ class Likelihood {
   Factors gradient_of_squares(const Factors& factors);
 
   Module& module_;
-  const Design& design_;
+  const ScaledDesign& design_;
   Gram gram_;
   bool reml_;
   double degrees_;

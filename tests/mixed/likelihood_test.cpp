@@ -13,7 +13,7 @@ namespace {
 
 std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
-Factors random_factors(const Design& design, Random& random) {
+Factors random_factors(const ScaledDesign& design, Random& random) {
   Factors factors;
   for (const DesignTerm& term : design.terms()) {
     const auto k = at(term.k);
@@ -27,7 +27,7 @@ Factors random_factors(const Design& design, Random& random) {
 }
 
 // The covariances that factors and a residual variance stand for, in the order of the oracle.
-VectorL covariances(const Design& design, const Factors& factors, Real variance) {
+VectorL covariances(const ScaledDesign& design, const Factors& factors, Real variance) {
   std::vector<Real> all;
   for (std::size_t t = 0; t < factors.size(); ++t) {
     const Eigen::Index k = design.terms()[t].k;
@@ -82,7 +82,7 @@ TEST_P(Criterion, equals_that_of_dense_matrices) {
   LoadedModule loaded;
   for (std::uint64_t seed = 1; seed <= 3; ++seed) {
     const Model model = random_model(GetParam().shape, seed);
-    const Design design(model);
+    const ScaledDesign design(model);
     const DenseOracle oracle(model);
     Random random(seed + 100);
     for (const bool reml : {true, false}) {
@@ -107,7 +107,7 @@ TEST_P(Criterion, equals_that_of_dense_matrices) {
 TEST_P(Criterion, has_the_gradient_of_dense_differences) {
   LoadedModule loaded;
   const Model model = random_model(GetParam().shape, 4);
-  const Design design(model);
+  const ScaledDesign design(model);
   const DenseOracle oracle(model);
   Random random(7);
   const Factors factors = random_factors(design, random);

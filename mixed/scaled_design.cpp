@@ -1,4 +1,4 @@
-#include "mixed/design.hpp"
+#include "mixed/scaled_design.hpp"
 
 #include <algorithm>
 #include <cmath>
@@ -33,7 +33,7 @@ std::vector<double> FixedBasis::solve_transposed(std::span<const double> combina
   return {x.begin(), x.end()};
 }
 
-Design::Design(const Model& model) : model_(model) {
+ScaledDesign::ScaledDesign(const Model& model) : model_(model) {
   for (const RandomTerm& term : model.random) transform_term(term);
   for (const double w : model.weights) log_weights_ += std::log(w);
   transform_fixed();
@@ -41,7 +41,7 @@ Design::Design(const Model& model) : model_(model) {
 }
 
 // Gram and Schmidt on the coefficients' covariates, so that the mean square of each is 1.
-void Design::transform_term(const RandomTerm& term) {
+void ScaledDesign::transform_term(const RandomTerm& term) {
   DesignTerm made;
   made.k = term.coef_count();
   made.levels = term.level_count();
@@ -90,7 +90,7 @@ namespace {
 // Columns of X as they are made orthogonal, one at a time, in a dense vector of extended precision.
 class Orthogonalizer {
  public:
-  explicit Orthogonalizer(const Design& design, SparseColumns& made) : design_(design), made_(made) {
+  explicit Orthogonalizer(const ScaledDesign& design, SparseColumns& made) : design_(design), made_(made) {
     column_.resize(at(made.rows));
   }
 
@@ -140,7 +140,7 @@ class Orthogonalizer {
     rows_.swap(merged_);
   }
 
-  const Design& design_;
+  const ScaledDesign& design_;
   SparseColumns& made_;
   std::vector<long double> column_;
   std::vector<std::int64_t> rows_;
@@ -157,7 +157,7 @@ bool is_indicator(const SparseColumns& x, std::int64_t j) {
 
 }  // namespace
 
-void Design::transform_fixed() {
+void ScaledDesign::transform_fixed() {
   constexpr std::size_t kTargets = 256;  // columns that others are made orthogonal to; more would take too long
   const SparseColumns& x = model_.fixed.x;
   const std::int64_t n = rows();
@@ -185,7 +185,7 @@ void Design::transform_fixed() {
   take_fit_out(well_filled);
 }
 
-void Design::take_fit_out(const std::vector<std::int64_t>& well_filled) {
+void ScaledDesign::take_fit_out(const std::vector<std::int64_t>& well_filled) {
   std::vector<long double> left(model_.y.begin(), model_.y.end());
   offset_.assign(at(fixed_count()), 0.0);
   for (const std::int64_t j : well_filled) {
@@ -200,7 +200,7 @@ void Design::take_fit_out(const std::vector<std::int64_t>& well_filled) {
   y_.assign(left.begin(), left.end());
 }
 
-void Design::store_rows() {
+void ScaledDesign::store_rows() {
   const std::size_t n = at(rows());
   row_start_.assign(n + 1, 0);
   for (const std::int64_t row : x_.row) ++row_start_[at(row) + 1];
@@ -217,7 +217,7 @@ void Design::store_rows() {
   }
 }
 
-void Design::subtract_product(std::span<const double> v, std::span<double> r) const {
+void ScaledDesign::subtract_product(std::span<const double> v, std::span<double> r) const {
   for (const DesignTerm& term : terms_) {
     const auto k = at(term.k);
     for (std::size_t i = 0; i < r.size(); ++i) {
@@ -235,12 +235,12 @@ void Design::subtract_product(std::span<const double> v, std::span<double> r) co
   }
 }
 
-void Design::weigh(std::span<double> r) const {
+void ScaledDesign::weigh(std::span<double> r) const {
   if (model_.weights.empty()) return;
   for (std::size_t i = 0; i < r.size(); ++i) r[i] *= model_.weights[i];
 }
 
-std::vector<double> Design::transposed_product(std::span<const double> r) const {
+std::vector<double> ScaledDesign::transposed_product(std::span<const double> r) const {
   std::vector<double> out(at(unknowns()), 0.0);
   for (const DesignTerm& term : terms_) {
     const auto k = at(term.k);
@@ -261,7 +261,7 @@ namespace {
 
 // v_l <- T v_l for each level of each term, or T' v_l.
 template <bool transposed>
-void multiply_levels(const Design& design, const Factors& factors, std::span<double> v) {
+void multiply_levels(const ScaledDesign& design, const Factors& factors, std::span<double> v) {
   std::vector<double> result;
   for (std::size_t t = 0; t < factors.size(); ++t) {
     const DesignTerm& term = design.terms()[t];
@@ -281,15 +281,15 @@ void multiply_levels(const Design& design, const Factors& factors, std::span<dou
 
 }  // namespace
 
-void multiply_factors(const Design& design, const Factors& factors, std::span<double> v) {
+void multiply_factors(const ScaledDesign& design, const Factors& factors, std::span<double> v) {
   multiply_levels<false>(design, factors, v);
 }
 
-void multiply_factors_transposed(const Design& design, const Factors& factors, std::span<double> v) {
+void multiply_factors_transposed(const ScaledDesign& design, const Factors& factors, std::span<double> v) {
   multiply_levels<true>(design, factors, v);
 }
 
-void add_precision_product(const Design& design, std::span<const double> v, double scale, std::span<double> y) {
+void add_precision_product(const ScaledDesign& design, std::span<const double> v, double scale, std::span<double> y) {
   for (const DesignTerm& term : design.terms()) {
     const auto k = at(term.k);
     const std::size_t first = at(term.first);

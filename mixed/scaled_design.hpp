@@ -41,9 +41,9 @@ struct FixedBasis {
   std::vector<double> solve_transposed(std::span<const double> combination) const;  // R^-T of a linear function
 };
 
-class Design {
+class ScaledDesign {
  public:
-  explicit Design(const Model& model);  // keeps a reference to the model
+  explicit ScaledDesign(const Model& model);  // keeps a reference to the model
 
   const Model& model() const { return model_; }
   std::int64_t rows() const { return model_.rows(); }
@@ -90,10 +90,10 @@ class Design {
 };
 
 // Lambda v: each level's part of v times its term's factor; what follows the random effects stays. And its transpose.
-void multiply_factors(const Design& design, const Factors& factors, std::span<double> v);
-void multiply_factors_transposed(const Design& design, const Factors& factors, std::span<double> v);
+void multiply_factors(const ScaledDesign& design, const Factors& factors, std::span<double> v);
+void multiply_factors_transposed(const ScaledDesign& design, const Factors& factors, std::span<double> v);
 
 // y <- y + scale * K v for the random part of v, K the precisions of the terms, identity where a term has none.
-void add_precision_product(const Design& design, std::span<const double> v, double scale, std::span<double> y);
+void add_precision_product(const ScaledDesign& design, std::span<const double> v, double scale, std::span<double> y);
 
 }  // namespace sm::mixed
