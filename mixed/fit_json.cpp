@@ -124,7 +124,7 @@ Json contrasts(const Fit& fit) {
                   {"estimable", c.estimable},
                   {"estimate", if_estimable(number(c.estimate))},
                   {"se", if_estimable(number(c.se))},
-                  {"df_satterthwaite", if_estimable(number(c.df))},
+                  {"df", if_estimable(number(c.df))},
                   {"t", if_estimable(number(c.t))}};
     if (!c.estimable) contrast["reason"] = c.reason;
     out.push_back(std::move(contrast));

@@ -86,7 +86,7 @@ std::string residual_quantiles(const Model& model, const Fit& fit) {
   TextTable table{.head = {}, .rows = {{}}, .names = 0};
   constexpr std::array<std::pair<const char*, double>, 5> kQuantiles{
       {{"Min", 0.0}, {"1Q", 0.25}, {"Median", 0.5}, {"3Q", 0.75}, {"Max", 1.0}}};
-  for (const auto& [name, p] : kQuantiles) table.add_column(name, {fmt::format("{:7.4f}", quantile(scaled, p))});
+  for (const auto& [name, p] : kQuantiles) table.add_column(name, {fmt::format("{:.4f}", quantile(scaled, p))});
   return "Scaled residuals:\n" + table.text();
 }
 

@@ -15,21 +15,17 @@
 namespace sm::mixed {
 namespace {
 
-constexpr int kDigits = 6;
+constexpr int kVarianceDigits = 6;
+constexpr int kErrorDigits = 5;
 constexpr int kRatioDigits = 4;
 constexpr double kNaN = std::numeric_limits<double>::quiet_NaN();
-
-std::string decimals_text(double value, int decimals, double largest) {
-  if (!std::isfinite(value)) return kNoNumber;
-  return std::fabs(value) < largest ? fmt::format("{:.{}f}", value, decimals) : fmt::format("{:.4g}", value);
-}
 
 std::string df_text(std::optional<double> df) { return decimals_text(df.value_or(kNaN), 2, 1e7); }
 std::string t_text(double t) { return decimals_text(t, 3, 1e5); }
 
 std::string p_text(double t, std::optional<double> df) {
   constexpr double kSmallest = 2e-16;
-  constexpr double kFixedFrom = 1e-4;
+  constexpr double kFixedFrom = 1e-3;
   const double p = student_two_sided(t, df.value_or(kNaN));
   if (std::isnan(p)) return kNoNumber;
   if (p < kSmallest) return "< 2e-16";
@@ -61,8 +57,8 @@ TextTable effect_table(const std::vector<Effect>& effects) {
     ts.push_back(effect.known ? t_text(effect.t) : kNoNumber);
     ps.push_back(effect.known ? p_text(effect.t, effect.df) : kNoNumber);
   }
-  table.add_column("Estimate", number_column(estimates, kDigits, errors));
-  table.add_column("Std. Error", number_column(errors, kDigits));
+  table.add_column("Estimate", number_column(estimates, kErrorDigits, errors));
+  table.add_column("Std. Error", number_column(errors, kErrorDigits));
   table.add_column("df", dfs);
   table.add_column("t value", ts);
   table.add_column("Pr(>|t|)", ps);
@@ -115,9 +111,9 @@ std::string variance_table(const Fit& fit) {
       widest = std::max(widest, triangle.back().size());
     }
   }
-  table.add_column("Variance", number_column(variances, kDigits));
-  if (!fit.variances_given) table.add_column("Std. Error", number_column(errors, kDigits));
-  table.add_column("Std. Dev.", number_column(sds, kDigits));
+  table.add_column("Variance", number_column(variances, kVarianceDigits));
+  if (!fit.variances_given) table.add_column("Std. Error", number_column(errors, kVarianceDigits, variances));
+  table.add_column("Std. Dev.", number_column(sds, kVarianceDigits));
   std::vector<std::string> titles(widest);
   if (widest > 0) titles[0] = "Corr.";
   add_triangle(table, titles, triangle);
@@ -158,7 +154,7 @@ std::string correlation_table(const Fit& fit, std::size_t most) {
   std::vector<std::vector<std::string>> triangle;
   for (std::size_t i = 0; i < count; ++i) {
     const std::string name = cut(names[i], kWidestName);
-    table.rows.push_back({numbered ? fmt::format("[{}] {}", i + 1, name) : name});
+    table.rows.push_back({numbered ? fmt::format("{:>4} {}", fmt::format("[{}]", i + 1), name) : name});
     triangle.emplace_back();
     for (std::size_t j = 0; j < i; ++j) {
       const double scale = std::sqrt(fit.vcov_fixef[i * count + i] * fit.vcov_fixef[j * count + j]);

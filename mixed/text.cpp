@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <array>
 #include <cmath>
+#include <limits>
 #include <utility>
 
 namespace sm::mixed {
@@ -29,6 +30,10 @@ std::size_t cells_of(char32_t character) {
   if (std::any_of(kNoWidth.begin(), kNoWidth.end(), in)) return 0;
   return std::any_of(kWide.begin(), kWide.end(), in) ? 2 : 1;
 }
+
+constexpr double kInfinite = std::numeric_limits<double>::infinity();
+
+int exponent_of(double size) { return static_cast<int>(std::floor(std::log10(size))); }
 
 // How many bytes the first character announces; 0 for a byte that begins none.
 std::size_t announced(unsigned char first) {
@@ -140,27 +145,33 @@ std::vector<std::string> number_column(std::span<const double> values, int digit
   int decimals = 0;
   int places = 1;  // before the point
   for (std::size_t i = 0; i < values.size(); ++i) {
-    double size = std::fabs(values[i]);
-    if (!std::isfinite(size)) continue;
-    if (i < scales.size() && scales[i] > size) size = scales[i];
-    if (size == 0.0 || !std::isfinite(size)) continue;
-    const int exponent = static_cast<int>(std::floor(std::log10(size)));
-    places = std::max(places, exponent + 1);
-    decimals = std::max(decimals, digits - 1 - exponent);
+    const double value = std::fabs(values[i]);
+    if (!std::isfinite(value)) continue;
+    const bool scaled = i < scales.size() && std::isfinite(scales[i]) && scales[i] != 0.0;
+    const double size = scaled ? std::fabs(scales[i]) : value;
+    if (size > 0.0) decimals = std::max(decimals, digits - 1 - exponent_of(size));
+    if (value > 0.0) places = std::max(places, exponent_of(value) + 1);
   }
   const bool fixed = places + decimals <= kWidest;
   std::vector<std::string> out;
   for (const double value : values) {
-    std::string text = kNoNumber;
-    if (value == 0.0) {
-      text = "0";
-    } else if (std::isfinite(value)) {
-      text = fixed ? fmt::format("{:.{}f}", value, decimals) : fmt::format("{:.{}g}", value, digits);
-      if (text.starts_with('-') && text.find_first_of("123456789") == std::string::npos) text.erase(0, 1);
+    if (!std::isfinite(value)) {
+      out.emplace_back(kNoNumber);
+    } else if (value == 0.0) {
+      out.emplace_back("0");
+    } else {
+      out.push_back(fixed ? decimals_text(value, decimals, kInfinite) : fmt::format("{:.{}g}", value, digits + 2));
     }
-    out.push_back(text);
   }
   return out;
+}
+
+std::string decimals_text(double value, int decimals, double largest) {
+  if (!std::isfinite(value)) return kNoNumber;
+  if (std::fabs(value) >= largest) return fmt::format("{:.4g}", value);
+  std::string text = fmt::format("{:.{}f}", value, decimals);
+  if (text.starts_with('-') && text.find_first_of("123456789") == std::string::npos) text.erase(0, 1);
+  return text;
 }
 
 void TextTable::add_column(std::string title, const std::vector<std::string>& texts) {

@@ -27,10 +27,13 @@ std::string cut(std::string_view text, std::size_t width);        // at most so 
 // Ends in a newline.
 std::string wrapped(std::string_view text, std::size_t width, std::size_t indent);
 
-// Every number with as many decimals as the smallest needs to show `digits` significant digits; where that is more than
-// a column bears, each by itself in the shorter of fixed and scientific notation. What is not finite is a dash. A number
-// below its scale, such as its standard error, counts as that: nobody reads it to more digits.
+// Every number with as many decimals as it takes to show `digits` significant digits of the smallest of them, or of the
+// smallest of their scales, such as standard errors, where those are given. Where that is more than a column bears, each
+// by itself in the shorter of fixed and scientific notation. What is not finite is a dash.
 std::vector<std::string> number_column(std::span<const double> values, int digits, std::span<const double> scales = {});
+
+// With so many decimals; "0.000" without a sign. Shorter in scientific notation from `largest` on.
+std::string decimals_text(double value, int decimals, double largest);
 
 constexpr const char* kNoNumber = "—";
 
