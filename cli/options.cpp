@@ -13,6 +13,7 @@
 #include "cli/fields.hpp"
 #include "cli/format.hpp"
 #include "cli/help.hpp"
+#include "cli/model_options.hpp"
 
 namespace sm::cli {
 namespace {
@@ -264,6 +265,13 @@ void add_grid(CLI::App& app, Options& options) {
   add_reports(*command, options);
 }
 
+template <auto run>
+void add_model(CLI::App& app, Options& options, const char* name, const char* help, ModelCommand which) {
+  CLI::App* command = add_command<run, &Options::model>(app, options, name, help);
+  add_model_options(*command, options.model, which);
+  add_common(*command, options);
+}
+
 void add_subcommands(CLI::App& app, Options& options) {
   add_info(app, options);
   add_factor(app, options);
@@ -274,6 +282,9 @@ void add_subcommands(CLI::App& app, Options& options) {
   add_hermite(app, options);
   add_estimable(app, options);
   add_convert(app, options);
+  add_model<run_lmm>(app, options, "lmm", help::kLmm, ModelCommand::lmm);
+  add_model<run_reml>(app, options, "reml", help::kReml, ModelCommand::reml);
+  add_model<run_blup>(app, options, "blup", help::kBlup, ModelCommand::blup);
   add_grid(app, options);
 }
 

@@ -50,6 +50,12 @@ void Progress::phase(std::string name) {
   iteration(0, 0.0);
 }
 
+void Progress::keep(const std::string& text) {
+  if (!thread_.joinable()) return;
+  const std::lock_guard lock(mutex_);
+  put(file_, std::string(kEraseLine) + text + "\n");
+}
+
 std::string Progress::line(const std::string& phase, double fraction, double seconds) {
   if (fraction < 0.0) return fmt::format("{} ... {:.0f} s", phase, seconds);
   const double share = std::min(fraction, 1.0);

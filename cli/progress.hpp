@@ -33,6 +33,8 @@ class Progress {
     residual_.store(residual, std::memory_order_relaxed);
     step_.store(step, std::memory_order_relaxed);
   }
+  // A line that stays, above the one that is redrawn; where progress is shown.
+  void keep(const std::string& text);
 
   // The line itself: a bar, or the time so far where the share is unknown (negative).
   static std::string line(const std::string& phase, double fraction, double seconds);
