@@ -5,10 +5,8 @@
 #include <algorithm>
 #include <array>
 #include <cmath>
-#include <limits>
-#include <optional>
+#include <utility>
 
-#include "mixed/distributions.hpp"
 #include "mixed/summary_tables.hpp"
 #include "mixed/text.hpp"
 #include "mixed/variance_blocks.hpp"

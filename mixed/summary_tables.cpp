@@ -69,6 +69,7 @@ TextTable effect_table(const std::vector<Effect>& effects) {
 std::vector<std::string> short_names(const std::vector<std::string>& names, bool& numbered) {
   constexpr std::size_t kShort = 7;
   std::vector<std::string> out;
+  out.reserve(names.size());
   for (const std::string& name : names) out.push_back(name == "(Intercept)" ? "(Intr)" : cut(name, kShort));
   numbered = std::set<std::string>(out.begin(), out.end()).size() < out.size();
   for (std::size_t i = 0; numbered && i < out.size(); ++i) out[i] = fmt::format("[{}]", i + 1);
@@ -80,6 +81,7 @@ void add_triangle(TextTable& table, const std::vector<std::string>& titles,
                   const std::vector<std::vector<std::string>>& rows) {
   for (std::size_t j = 0; j < titles.size(); ++j) {
     std::vector<std::string> column;
+    column.reserve(rows.size());
     for (const auto& row : rows) column.push_back(j < row.size() ? row[j] : "");
     table.add_column(titles[j], column);
   }
