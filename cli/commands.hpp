@@ -67,6 +67,16 @@ struct ConvertOptions {
   std::string to;
 };
 
+// Each of them a path, or empty: not asked for.
+struct PedigreeOptions {
+  std::string pedigree;
+  std::string a;
+  std::string ainv;
+  std::string inbreeding;
+  std::string mendelian;
+  std::string ids;
+};
+
 struct GridOptions {
   std::int64_t nx = 0;
   std::int64_t ny = 0;
@@ -83,6 +93,7 @@ Report run_trace(const TraceOptions& options, const CommonOptions& common, Progr
 Report run_hermite(const HermiteOptions& options, const CommonOptions& common, Progress& progress);
 Report run_estimable(const EstimableOptions& options, const CommonOptions& common, Progress& progress);
 Report run_convert(const ConvertOptions& options, const CommonOptions& common, Progress& progress);
+Report run_pedigree(const PedigreeOptions& options, const CommonOptions& common, Progress& progress);
 Report run_grid(const GridOptions& options, const CommonOptions& common, Progress& progress);
 
 // A b is called inconsistent with a singular A when its relative residual is above this.
