@@ -68,6 +68,16 @@ struct ConvertOptions {
   std::string to;
 };
 
+// Each of them a path, or empty: not asked for.
+struct PedigreeOptions {
+  std::string pedigree;
+  std::string a;
+  std::string ainv;
+  std::string inbreeding;
+  std::string mendelian;
+  std::string ids;
+};
+
 // A mixed model. Lists have an element for each time that an option was given.
 struct ModelOptions {
   std::string data;
@@ -108,6 +118,7 @@ Report run_trace(const TraceOptions& options, const CommonOptions& common, Progr
 Report run_hermite(const HermiteOptions& options, const CommonOptions& common, Progress& progress);
 Report run_estimable(const EstimableOptions& options, const CommonOptions& common, Progress& progress);
 Report run_convert(const ConvertOptions& options, const CommonOptions& common, Progress& progress);
+Report run_pedigree(const PedigreeOptions& options, const CommonOptions& common, Progress& progress);
 Report run_lmm(const ModelOptions& options, const CommonOptions& common, Progress& progress);
 Report run_reml(const ModelOptions& options, const CommonOptions& common, Progress& progress);
 Report run_blup(const ModelOptions& options, const CommonOptions& common, Progress& progress);

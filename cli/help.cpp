@@ -219,6 +219,27 @@ Example: a stiffness matrix as a packed triangle, and back.
   ...
 )";
 
+const char* const kPedigree =
+    R"(Find inbreeding and the inverse relationship matrix of a pedigree
+
+Reads who descends from whom: a table with the columns id, sire and dam (by these names, else its first three), rows in
+any order. Empty fields, NA, 0 and . are unknown parents; a parent without a row of its own is added as a founder. Of A,
+the numerator relationship matrix, the inverse with inbreeding follows from the pedigree alone by Henderson's rules; it
+is sparse, and a million animals take seconds. Animals that descend from themselves are refused and named.
+
+Example: six animals, two of them inbred.
+
+  $ qxsm pedigree data/six_animals.csv --ainv ainv.mtx --inbreeding f.csv
+  animals          6
+  founders         2
+  inbred           2
+  mean F           0.0416667
+  largest F        0.125
+  log-determinant  -2.431662135269186 (of A)
+  A-inverse        16 entries in its lower triangle
+  ...
+)";
+
 const char* const kGrid =
     R"(Write the matrix of a five-point grid, for trials of any size
 

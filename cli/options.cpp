@@ -244,6 +244,24 @@ void add_convert(CLI::App& app, Options& options) {
   add_common(*command, options);
 }
 
+void add_pedigree(CLI::App& app, Options& options) {
+  CLI::App* command = add_command<run_pedigree, &Options::pedigree>(app, options, "pedigree", help::kPedigree);
+  PedigreeOptions& pedigree = options.pedigree;
+  add_file(*command, pedigree.pedigree, "PEDIGREE.csv", "CSV or TSV file, plain or gzip;\n- is standard input");
+  const auto add = [&](const char* name, std::string& path, const char* type, const char* text) {
+    command->add_option(name, path, text)->type_name(type);
+  };
+  add("--ainv", pedigree.ainv, "AINV.mtx", "Write the inverse of A as coordinates, rows in\nthe order of the file");
+  add("--a", pedigree.a, "A.mtx", "Write A itself as a symmetric array; for small\npedigrees");
+  add("--inbreeding", pedigree.inbreeding, "F.csv", "Write the inbreeding coefficient of each animal");
+  add("--mendelian", pedigree.mendelian, "D.csv",
+      "Write the Mendelian sampling variance of each\nanimal, as a part of the additive variance");
+  add("--ids", pedigree.ids, "IDS.txt",
+      "Write the animals in the order of the rows of A,\none a line. Each result is compressed when its\n"
+      "name ends in .gz; - is standard output for one\nof them, and the report then goes to standard\nerror");
+  add_common(*command, options);
+}
+
 void add_grid(CLI::App& app, Options& options) {
   CLI::App* command = add_command<run_grid, &Options::grid>(app, options, "grid", help::kGrid);
   command->add_option("NX", options.grid.nx, "Points in the first direction")
@@ -282,6 +300,7 @@ void add_subcommands(CLI::App& app, Options& options) {
   add_hermite(app, options);
   add_estimable(app, options);
   add_convert(app, options);
+  add_pedigree(app, options);
   add_model<run_lmm>(app, options, "lmm", help::kLmm, ModelCommand::lmm);
   add_model<run_reml>(app, options, "reml", help::kReml, ModelCommand::reml);
   add_model<run_blup>(app, options, "blup", help::kBlup, ModelCommand::blup);
@@ -321,6 +340,11 @@ void settle(const CLI::App& app, Options& options) {
   }
   options.filter = app.got_subcommand("convert") || app.got_subcommand("grid");
   if (app.got_subcommand("grid") && options.common.output.empty()) options.common.output = "-";
+  const PedigreeOptions& pedigree = options.pedigree;
+  for (const std::string* path :
+       {&pedigree.a, &pedigree.ainv, &pedigree.inbreeding, &pedigree.mendelian, &pedigree.ids}) {
+    if (*path == "-") options.common.output = "-";
+  }
   options.common.ceiling =
       options.common.memory.empty() ? machine_memory() : parse_memory(options.common.memory).value_or(0);
 }

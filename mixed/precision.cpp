@@ -4,8 +4,7 @@
 
 #include <algorithm>
 #include <cmath>
-#include <string_view>
-#include <unordered_map>
+#include <utility>
 
 namespace sm::mixed {
 namespace {
@@ -15,12 +14,6 @@ namespace {
 constexpr double kDependent = 1e-8;
 
 std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
-
-std::string_view trimmed(std::string_view text) {
-  constexpr std::string_view kBlanks = " \t\r\v\f";
-  const std::size_t begin = text.find_first_not_of(kBlanks);
-  return begin == std::string_view::npos ? "" : text.substr(begin, text.find_last_not_of(kBlanks) + 1 - begin);
-}
 
 std::string row_text(const MatrixNames& names, std::int64_t row) {
   return fmt::format("row {} ({})", row + 1, names.ids[at(row)]);
@@ -208,42 +201,6 @@ std::vector<double> null_vectors(const SparseColumns& k, const MatrixNames& name
 }
 
 }  // namespace
-
-std::vector<std::string> row_ids(const std::vector<std::string>& lines, std::int64_t order, const std::string& file) {
-  std::vector<std::string> ids;
-  ids.reserve(at(order));
-  for (const std::string& line : lines) ids.emplace_back(trimmed(line));
-  if (lines.empty()) {
-    for (std::int64_t i = 1; i <= order; ++i) ids.push_back(std::to_string(i));
-  }
-  std::unordered_map<std::string_view, std::int64_t> seen;
-  for (std::size_t i = 0; i < ids.size(); ++i) {
-    const auto line = static_cast<std::int64_t>(i + 1);
-    if (ids[i].empty()) {
-      throw ModelError({.file = file,
-                        .line = line,
-                        .what = "the line is empty",
-                        .expected = "an id",
-                        .advice = "write one id a line, in the order of the rows of the matrix"});
-    }
-    const auto [first, is_new] = seen.try_emplace(ids[i], line);
-    if (!is_new) {
-      throw ModelError({.file = file,
-                        .line = line,
-                        .variable = ids[i],
-                        .what = fmt::format("the id is in line {} already", first->second),
-                        .expected = "an id of its own for each row",
-                        .advice = "correct one of the two"});
-    }
-  }
-  if (static_cast<std::int64_t>(ids.size()) != order) {
-    throw ModelError({.file = file,
-                      .what = fmt::format("found {} ids", ids.size()),
-                      .expected = fmt::format("{}, one for each row of the matrix", order),
-                      .advice = "write one id a line, without a heading"});
-  }
-  return ids;
-}
 
 Precision matrix_precision(const Module& module, const SparseColumns& k, const MatrixNames& names) {
   require_symmetric(k, names);

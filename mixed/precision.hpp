@@ -17,10 +17,6 @@ class NotSemidefinite : public ModelError {
   using ModelError::ModelError;
 };
 
-// The lines of a file of ids, one for each row of a matrix of that order; blanks around an id do not count. Throws
-// ModelError for an empty line, an id that is there twice, and another number of ids. Without lines the ids are 1 to n.
-std::vector<std::string> row_ids(const std::vector<std::string>& lines, std::int64_t order, const std::string& file);
-
 // How the messages name a matrix.
 struct MatrixNames {
   std::string file;

@@ -40,13 +40,13 @@ class UpperSum {
       const auto begin = entries.begin() + start_[at(i)];
       const auto end = entries.begin() + start_[at(i) + 1];
       std::sort(begin, end);
-      for (auto entry = begin; entry != end; ++entry) {
-        if (entry != begin && entry->first == precision.col.back()) {
-          precision.value.back() += entry->second;
-        } else {
-          precision.col.push_back(entry->first);
-          precision.value.push_back(entry->second);
-        }
+      for (auto entry = begin; entry != end;) {
+        const std::int64_t col = entry->first;
+        double value = 0.0;
+        for (; entry != end && entry->first == col; ++entry) value += entry->second;
+        if (value == 0.0) continue;  // a parent's share as a mate may cancel that as an offspring
+        precision.col.push_back(col);
+        precision.value.push_back(value);
       }
       precision.row_start.push_back(static_cast<std::int64_t>(precision.col.size()));
     }

@@ -7,6 +7,7 @@
 #include <random>
 
 #include "cli/module_session.hpp"
+#include "mixed/row_ids.hpp"
 
 namespace sm::mixed::test {
 namespace {
@@ -188,32 +189,6 @@ TEST_F(MatrixPrecision, that_is_no_symmetric_square_or_zero_is_refused) {
   EXPECT_NE(refusal<ModelError>(m).find("found 0.5 at (3, 1) and 0 at (1, 3), expected a symmetric matrix"),
             std::string::npos);
   EXPECT_NE(refusal<ModelError>(MatrixXd::Zero(3, 3)).find("k.mtx: the matrix is zero"), std::string::npos);
-}
-
-std::string id_refusal(const std::vector<std::string>& lines, std::int64_t order) {
-  try {
-    row_ids(lines, order, "ids.txt");
-  } catch (const ModelError& error) {
-    return error.what();
-  }
-  ADD_FAILURE() << "the ids were taken";
-  return {};
-}
-
-TEST(RowIds, are_the_lines_or_the_numbers_of_the_rows) {
-  EXPECT_EQ(row_ids({"a", " b c\r", "d"}, 3, "ids.txt"), (std::vector<std::string>{"a", "b c", "d"}));
-  EXPECT_EQ(row_ids({}, 3, ""), (std::vector<std::string>{"1", "2", "3"}));
-}
-
-TEST(RowIds, that_do_not_name_each_row_once_are_refused) {
-  EXPECT_EQ(
-      id_refusal({"a", "  ", "b"}, 3),
-      "ids.txt:2: the line is empty, expected an id; write one id a line, in the order of the rows of the matrix");
-  EXPECT_EQ(id_refusal({"a", "b", "a"}, 3),
-            "ids.txt:3: 'a': the id is in line 1 already, expected an id of its own for each row; correct one of the "
-            "two");
-  EXPECT_EQ(id_refusal({"id", "a", "b"}, 2),
-            "ids.txt: found 3 ids, expected 2, one for each row of the matrix; write one id a line, without a heading");
 }
 
 }  // namespace
