@@ -3,12 +3,18 @@
 namespace sm::cli::help {
 
 const char* const kMain =
-    R"(qxsm - inspect, factor and solve with sparse symmetric matrices
+    R"(qxsm - fit mixed models, and inspect, factor and solve with sparse symmetric matrices
 
-Reads Matrix Market files and works on them through the qxesm module: a fill-reducing order, the factorization
-A = U'DU with rank and log-determinant, solutions of A x = b, and what else is made of a matrix and its inverse.
-Singular matrices are welcome: a pivot that is zero to tolerance is dropped, and what is solved with is then a
-generalized inverse.
+Fits linear mixed models, animal models and Gaussian fields to a table of data (lmm, reml, blup, pedigree). Reads Matrix
+Market files and works on them through the qxesm module: a fill-reducing order, the factorization A = U'DU with rank and
+log-determinant, solutions of A x = b, and what else is made of a matrix and its inverse. Singular matrices are welcome:
+a pivot that is zero to tolerance is dropped, and what is solved with is then a generalized inverse.
+
+Example: reaction times of 18 subjects, each with an intercept and a slope of its own.
+
+  $ qxsm lmm examples/sleepstudy.csv 'reaction ~ days + (days | subject)'
+  REML criterion at convergence: 1743.6283
+  ...
 
 Example: solve A x = b for a stiffness matrix, with b = A * 1.
 
@@ -240,6 +246,60 @@ Example: six animals, two of them inbred.
   ...
 )";
 
+const char* const kLmm =
+    R"(Fit a linear mixed model to a table of data
+
+Fits by restricted maximum likelihood (or --ml): fixed effects, variances and covariances of random effects, and the
+random effects themselves. The formula is written as for lme4: (1 | g) is an intercept for each level of g, (x | g) an
+intercept and a slope with their covariance, (x || g) the same without it, (1 | a/b) means (1 | a) + (1 | a:b). A
+variance that is estimated as zero is said in words, and so is every column of X that depends on those before it; what
+is not estimable gets no number. On a terminal a line for each iteration shows criterion, largest scaled score and step.
+Ctrl-C stops, writes what there is, and ends with exit code 1; --start goes on from there.
+
+Example: does sleep deprivation slow reactions, and how much do subjects differ?
+
+  $ qxsm lmm examples/sleepstudy.csv 'reaction ~ days + (days | subject)' --test 'day 9: 1*(Intercept) + 9*days'
+  Linear mixed model fit by REML
+  REML criterion at convergence: 1743.6283
+  ...
+  $ qxsm lmm examples/penicillin.csv 'diameter ~ 1 + (1 | plate) + (1 | sample)' --out fit --plot plots
+  REML criterion at convergence: 330.8606
+  ...
+  $ qxsm lmm examples/sleepstudy.csv 'reaction ~ days + (days | subject)' --dry-run
+  observations    180
+  fixed effects   2 columns, rank 2
+  equations       38 unknowns
+  ...
+)";
+
+const char* const kReml =
+    R"(Fit a model with a pedigree or another known precision
+
+As 'qxsm lmm', for terms whose levels are related: (1 | animal; pedigree) has the variance times the relationship matrix
+of --pedigree, (1 | g; name) the variance times the (Moore-Penrose) inverse of the matrix of --kinv name=K.mtx, which may
+be singular, as that of an intrinsic autoregression is. Each variance over their total is printed with its standard
+error, or what --ratio asks for.
+
+Example: gains of five calves out of eight in the pedigree (far too few for an answer: the additive variance is 0).
+
+  $ qxsm reml examples/calves.csv 'gain ~ sex + (1 | calf; pedigree)' --pedigree examples/calves_pedigree.csv
+  Linear mixed model fit by REML
+  ...
+)";
+
+const char* const kBlup =
+    R"(Predict random effects with given variances
+
+As 'qxsm reml', with the variances told and not estimated: solves the mixed-model equations for fixed and random effects,
+their standard errors, and the prediction error variances and reliabilities (--pev prints them).
+
+Example: breeding values of eight calves, with a ratio of variances of 2.
+
+  $ qxsm blup examples/calves.csv 'gain ~ 0 + sex + (1 | calf; pedigree)' --pedigree examples/calves_pedigree.csv --var calf=20 --var residual=40 --pev
+  Linear mixed model with given variances
+  ...
+)";
+
 const char* const kGrid =
     R"(Write the matrix of a five-point grid, for trials of any size
 
@@ -260,7 +320,7 @@ const char* const kExitCodes =
   0  done
   1  a numerical "no": not positive semidefinite, an inconsistent right-hand side, not converged, a row that is not
      estimable, or a result that overflows
-  2  wrong usage, or a file that cannot be read, understood or written
+  2  wrong usage, a file that cannot be read, understood or written, or a model that does not suit its data
   3  out of memory (see --memory), or the module cannot be loaded)";
 
 }  // namespace sm::cli::help

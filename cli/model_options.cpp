@@ -101,8 +101,7 @@ void add_question_options(CLI::App& command, ModelOptions& options, bool ratios)
                  "'h2 = animal / (animal + residual)'. Default: each\n"
                  "variance over their total. May be given again");
   }
-  command
-      .add_option("--predict", options.predict, "Predict the rows of another table, into\npredicted.csv of --out")
+  command.add_option("--predict", options.predict, "Predict the rows of another table, into\npredicted.csv of --out")
       ->type_name("NEW.csv");
   command.add_flag("--pev", options.pev,
                    "Print the random effects, with their conditional\n"
