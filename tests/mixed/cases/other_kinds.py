@@ -3,7 +3,7 @@
 import math
 
 from command import run
-from tables import read_matrix, write_rows
+from tables import Table, read_matrix, write_rows
 
 
 def compare_blup(case, fit, data, ledger):
@@ -44,26 +44,24 @@ def compare_blup(case, fit, data, ledger):
 
 def compare_pedigree(case, program, pedigree, ids, work, ledger):
     """A, its inverse and the inbreeding of a pedigree; `ids` are the animals in the order of the answers."""
-    a, inverse = str(work / "a.mtx"), str(work / "ainv.mtx")
-    facts = run(
-        program,
-        ["pedigree", str(pedigree), "--a", a, "--ainv", inverse, "--inbreeding", "--mendelian", "--json"],
-    )
+    paths = {name: str(work / name) for name in ("a", "ainv", "inbreeding", "mendelian", "ids")}
+    given = [word for name, path in paths.items() for word in (f"--{name}", path)]
+    facts = run(program, ["pedigree", str(pedigree), *given, "--json"])
     answers, allowed = case["answers"], case["tolerance"]["abs"]
-    order = [animal["id"] for animal in facts["per_animal"]]
+    order = (work / "ids").read_text(encoding="utf-8").split()
     places = [order.index(animal) for animal in ids]
-    for name, path in (("A", a), ("Ainv", inverse)):
-        matrix = read_matrix(path)
+    for name in ("A", "Ainv"):
+        matrix = read_matrix(paths[name.lower()])
         for i, row in enumerate(answers[name]):
             for j, value in enumerate(row):
                 # The answers are printed with 15 digits.
                 ledger.number(name, matrix[places[i]][places[j]], value, 1e-14 * abs(value) + allowed, f"{i}, {j}")
-    for k, place in enumerate(places):
-        animal = facts["per_animal"][place]
-        ledger.number("inbreeding", animal["inbreeding"], answers["inbreeding"][k], allowed, ids[k])
-        ledger.number("mendelian", animal["mendelian_variance"], answers["mendelian_sampling_d"][k], allowed, ids[k])
-    ledger.number("log det A", facts["log_det_a"], answers["logdet_A"], 1e-11, "")
-    ledger.same("entries", facts["nnz_ainv_lower"], answers["nnz_Ainv_lower"], "")
+    for name, key in (("inbreeding", "inbreeding"), ("mendelian", "mendelian_sampling_d")):
+        ours = dict(Table.read(paths[name]).rows)
+        for animal, value in zip(ids, answers[key]):
+            ledger.number(name, float(ours[animal]), value, allowed, animal)
+    ledger.number("log det A", facts["log_determinant"], answers["logdet_A"], 1e-11, "")
+    ledger.same("entries", facts["inverse_entries"], answers["nnz_Ainv_lower"], "")
 
 
 def compare_field(case, program, matrix, work, ledger):
