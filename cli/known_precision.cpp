@@ -1,5 +1,6 @@
 #include "cli/known_precision.hpp"
 
+#include <memory>
 #include <utility>
 
 #include "cli/loading.hpp"
@@ -45,23 +46,19 @@ mixed::SparseColumns columns_of(const LoadedMatrix& matrix) {
 
 }  // namespace
 
-KnownPrecision load_precision(const std::string& matrix, const std::string& ids, const mixed::Module& module,
-                              std::uint64_t limit, Progress& progress) {
+mixed::KnownPrecision load_precision(const std::string& matrix, const std::string& ids, const mixed::Module& module,
+                                     std::uint64_t limit, Progress& progress) {
   const LoadedMatrix loaded = load_matrix(matrix, limit, progress);
-  KnownPrecision known;
-  known.ids = mixed::read_row_ids(ids, loaded.header.rows);
-  known.precision = std::make_shared<const mixed::Precision>(
-      mixed::matrix_precision(module, columns_of(loaded), {.file = loaded.name, .ids = known.ids}));
-  return known;
+  const mixed::MatrixNames names{.file = loaded.name, .ids = mixed::read_row_ids(ids, loaded.header.rows)};
+  auto precision = std::make_shared<const mixed::Precision>(mixed::matrix_precision(module, columns_of(loaded), names));
+  return {.labels = names.ids, .precision = std::move(precision)};
 }
 
-KnownPrecision load_pedigree(const std::string& path) {
+mixed::KnownPrecision load_pedigree(const std::string& path, std::vector<std::string>& notes) {
   mixed::Pedigree pedigree = mixed::read_pedigree(path);
-  KnownPrecision known;
-  known.precision = std::make_shared<const mixed::Precision>(mixed::pedigree_precision(pedigree, path));
-  known.ids = std::move(pedigree.ids);
-  known.notes = std::move(pedigree.notes);
-  return known;
+  notes.insert(notes.end(), pedigree.notes.begin(), pedigree.notes.end());
+  auto precision = std::make_shared<const mixed::Precision>(mixed::pedigree_precision(pedigree, path));
+  return {.labels = std::move(pedigree.ids), .precision = std::move(precision)};
 }
 
 }  // namespace sm::cli

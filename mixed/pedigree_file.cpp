@@ -18,9 +18,8 @@ constexpr std::array<std::string_view, 3> kNames{"id", "sire", "dam"};
 constexpr const char* kHeading = "begin the file with a line id,sire,dam";
 
 bool same_letters(std::string_view a, std::string_view b) {
-  return std::equal(a.begin(), a.end(), b.begin(), b.end(), [](unsigned char x, unsigned char y) {
-    return std::tolower(x) == std::tolower(y);
-  });
+  return std::equal(a.begin(), a.end(), b.begin(), b.end(),
+                    [](unsigned char x, unsigned char y) { return std::tolower(x) == std::tolower(y); });
 }
 
 bool is_number(std::string_view text) {

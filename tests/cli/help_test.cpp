@@ -8,8 +8,8 @@
 namespace sm::test {
 namespace {
 
-const std::vector<std::string> kSubcommands{"info",  "factor",  "solve",     "invdiag", "quad",
-                                            "trace", "hermite", "estimable", "convert", "grid"};
+const std::vector<std::string> kSubcommands{"info",    "factor",    "solve",   "invdiag",  "quad", "trace",
+                                            "hermite", "estimable", "convert", "pedigree", "grid"};
 
 class Help : public CommandTest {
  protected:
@@ -100,7 +100,8 @@ TEST_F(Help, lists_the_subcommands_with_their_purpose) {
        {"  info       Show what a file holds", "  factor     Order and factor", "  solve      Solve A x = b",
         "  invdiag    Compute the diagonal", "  quad       Compute the form", "  trace      Compute the trace",
         "  hermite    Compute the Hermite form", "  estimable  Tell which rows",
-        "  convert    Write a matrix in another form", "  grid       Write the matrix", "Exit codes:"}) {
+        "  convert    Write a matrix in another form", "  pedigree   Find inbreeding", "  grid       Write the matrix",
+        "Exit codes:"}) {
     EXPECT_NE(run.out.find(part), std::string::npos) << part << " in\n" << run.out;
   }
 }
