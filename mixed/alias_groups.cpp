@@ -42,7 +42,7 @@ class Grouping {
       support = (support ^ row) * 1099511628211u;
       constant = constant && value == column.value.front();
     });
-    const double size = norm_of(column.value);
+    column.size = norm_of(column.value);
     const bool wide = x_.entries(j) * kWide > x_.rows();
     if (wide && (!constant || static_cast<std::int64_t>(dense_.size()) * x_.rows() < kMostDummies)) {
       make_dense(column);
@@ -56,7 +56,7 @@ class Grouping {
       }
     }
     column.scale = norm_of(column.value);
-    column.nothing = column.scale <= kNothing * size;
+    column.nothing = column.scale <= kNothing * column.size;
     if (column.nothing) column.scale = 1.0;
     for (double& value : column.value) value = column.nothing ? 0.0 : value / column.scale;
     made_.push_back(std::move(column));

@@ -15,6 +15,7 @@ struct GroupedColumn {
   bool dense = false;
   std::vector<std::int32_t> row;  // of the entries, ascending; empty when dense
   std::vector<double> value;      // of norm 1, or all 0
+  double size = 0.0;              // the norm of the column itself
   double scale = 0.0;             // value * scale = column - sum of share * (grouped column as it stands)
   std::vector<std::pair<std::int64_t, double>> shares;
   bool nothing = false;  // what is left is rounding: the column depends on the shares alone

@@ -265,7 +265,8 @@ class NullSpace {
       Vector left;
       Vector combination = residual(static_cast<std::size_t>(j), left);
       const double rest = std::sqrt(dot(left, left));
-      if (rest <= kNothing) {
+      const GroupedColumn& column = columns_[static_cast<std::size_t>(j)];
+      if (rest * column.scale <= kNothing * column.size) {
         found.push_back(std::move(combination));
         continue;
       }
