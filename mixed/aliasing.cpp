@@ -7,26 +7,28 @@
 #include <cmath>
 #include <numeric>
 
+#include "mixed/alias_roads.hpp"
+
 namespace sm::mixed {
 namespace {
 
-// What is left of a column, relative to the column, when it counts as nothing. Squares and fourth powers of years stay
-// above it, sums of columns with 15 digits below.
-constexpr double kNothing = 1e-10;
 constexpr double kSlack = 1e-11;
 constexpr int kLargestDenominator = 60;
+// Beyond these the columns are not held as a dense array.
+constexpr double kMostNumbers = 2e7;
+constexpr double kMostWork = 4e9;
 
 using Vector = std::vector<double>;
 
 double dot(const Vector& a, const Vector& b) { return std::inner_product(a.begin(), a.end(), b.begin(), 0.0); }
-double norm(const Vector& a) { return std::sqrt(dot(a, a)); }
+double norm_of(const Vector& a) { return std::sqrt(dot(a, a)); }
 
 void subtract(double factor, const Vector& b, Vector& a) {
   for (std::size_t i = 0; i < a.size(); ++i) a[i] -= factor * b[i];
 }
 
 // The nearest fraction of small denominator, when there is one that rounding explains.
-double tidy(double value) {
+double nearest_fraction(double value) {
   for (int q = 1; q <= kLargestDenominator; ++q) {
     const double p = std::round(value * q);
     if (std::fabs(value * q - p) <= 1e-8 * std::max(1.0, std::fabs(value)) && std::fabs(p) < 1e6) return p / q;
@@ -34,38 +36,25 @@ double tidy(double value) {
   return value;
 }
 
-class Elimination {
- public:
-  Elimination(const FixedDesign& design, const Vector& weights) : x_(design.x), weights_(weights) {}
+double residual_norm(const WeightedColumns& x, std::int64_t j, const std::vector<std::int64_t>& kept, const Vector& b) {
+  Vector left = x.column(j);
+  for (std::size_t k = 0; k < b.size(); ++k) {
+    if (b[k] != 0.0) x.add(-b[k], kept[k], left);
+  }
+  return norm_of(left);
+}
 
-  void run(FixedDesign& design) {
+class GramSchmidt {
+ public:
+  explicit GramSchmidt(const WeightedColumns& x) : x_(x) {}
+
+  Dependences run() {
     for (std::int64_t j = 0; j < x_.cols(); ++j) take(j);
-    design.kept = std::move(kept_);
-    design.aliased = std::move(aliased_);
-    const std::size_t rank = design.kept.size();
-    design.dependence.assign(rank * design.aliased.size(), 0.0);
-    for (std::size_t a = 0; a < design.aliased.size(); ++a) {
-      std::copy(dependences_[a].begin(), dependences_[a].end(),
-                design.dependence.begin() + static_cast<std::ptrdiff_t>(a * rank));
-    }
+    for (Vector& dependence : found_.dependence) dependence.resize(found_.kept.size(), 0.0);
+    return std::move(found_);
   }
 
  private:
-  // A column, times the square roots of the weights.
-  Vector column(std::int64_t j) const {
-    Vector values(static_cast<std::size_t>(x_.rows), 0.0);
-    add_column(1.0, j, values);
-    return values;
-  }
-
-  void add_column(double factor, std::int64_t j, Vector& values) const {
-    for (auto p = static_cast<std::size_t>(x_.start[static_cast<std::size_t>(j)]);
-         p < static_cast<std::size_t>(x_.start[static_cast<std::size_t>(j) + 1]); ++p) {
-      const auto row = static_cast<std::size_t>(x_.row[p]);
-      values[row] += factor * x_.value[p] * (weights_.empty() ? 1.0 : std::sqrt(weights_[row]));
-    }
-  }
-
   // Projections of `values` on the directions so far, which are taken off it.
   Vector project(Vector& values) const {
     Vector parts(directions_.size(), 0.0);
@@ -80,17 +69,16 @@ class Elimination {
   }
 
   void take(std::int64_t j) {
-    Vector left = column(j);
-    const double size = norm(left);
+    Vector left = x_.column(j);
+    const double size = norm_of(left);
     Vector parts = project(left);
-    const double rest = norm(left);
+    const double rest = norm_of(left);
     if (rest <= kNothing * size) {
-      aliased_.push_back(j);
-      dependences_.push_back(dependence(j, size, parts));
+      found_.aliased.push_back(j);
+      found_.dependence.push_back(dependence(j, std::move(parts)));
       return;
     }
-    kept_.push_back(j);
-    sizes_.push_back(size);
+    found_.kept.push_back(j);
     for (double& value : left) value /= rest;
     directions_.push_back(std::move(left));
     parts.push_back(rest);
@@ -106,42 +94,80 @@ class Elimination {
     return parts;
   }
 
-  Vector residual(std::int64_t j, const Vector& b) const {
-    Vector left = column(j);
-    for (std::size_t k = 0; k < b.size(); ++k) {
-      if (b[k] != 0.0) add_column(-b[k], kept_[k], left);
-    }
-    return left;
-  }
-
-  Vector dependence(std::int64_t j, double size, const Vector& parts) const {
-    Vector b = solve(parts);
-    if (size == 0.0) return Vector(b.size(), 0.0);
-    Vector left = residual(j, b);
+  Vector dependence(std::int64_t j, Vector parts) const {
+    Vector b = solve(std::move(parts));
+    Vector left = x_.column(j);
+    for (std::size_t k = 0; k < b.size(); ++k) x_.add(-b[k], found_.kept[k], left);
     const Vector correction = solve(project(left));
     for (std::size_t k = 0; k < b.size(); ++k) b[k] += correction[k];
-    for (std::size_t k = 0; k < b.size(); ++k) {
-      if (std::fabs(b[k]) * sizes_[k] <= kNothing * size) b[k] = 0.0;
-    }
-    // Fractions, if the column is met by them as well as by what was computed.
-    Vector clean = b;
-    for (double& value : clean) value = tidy(value);
-    const double before = norm(residual(j, b));
-    return norm(residual(j, clean)) <= std::max(10.0 * before, kSlack * size) ? clean : b;
+    return b;
   }
 
-  const SparseColumns& x_;
-  const Vector& weights_;
-  std::vector<std::int64_t> kept_;
-  std::vector<std::int64_t> aliased_;
-  std::vector<Vector> dependences_;
+  const WeightedColumns& x_;
+  Dependences found_;
   std::vector<Vector> directions_;  // orthonormal
   std::vector<Vector> triangle_;    // column k: the parts of kept column k
-  Vector sizes_;
 };
 
 }  // namespace
 
-void find_aliased(FixedDesign& design, const std::vector<double>& weights) { Elimination(design, weights).run(design); }
+WeightedColumns::WeightedColumns(const SparseColumns& x, const std::vector<double>& weights) : x_(x) {
+  roots_.reserve(weights.size());
+  for (const double weight : weights) roots_.push_back(std::sqrt(weight));
+}
+
+std::int64_t WeightedColumns::entries(std::int64_t j) const {
+  return x_.start[static_cast<std::size_t>(j) + 1] - x_.start[static_cast<std::size_t>(j)];
+}
+
+double WeightedColumns::norm(std::int64_t j) const {
+  double sum = 0.0;
+  for_each(j, [&](std::size_t, double value) { sum += value * value; });
+  return std::sqrt(sum);
+}
+
+std::vector<double> WeightedColumns::column(std::int64_t j) const {
+  Vector values(static_cast<std::size_t>(x_.rows), 0.0);
+  add(1.0, j, values);
+  return values;
+}
+
+void WeightedColumns::add(double factor, std::int64_t j, std::vector<double>& values) const {
+  for_each(j, [&](std::size_t row, double value) { values[row] += factor * value; });
+}
+
+Dependences dense_dependences(const WeightedColumns& x) { return GramSchmidt(x).run(); }
+
+void tidy(const WeightedColumns& x, Dependences& found) {
+  Vector sizes;
+  for (const std::int64_t k : found.kept) sizes.push_back(x.norm(k));
+  for (std::size_t a = 0; a < found.aliased.size(); ++a) {
+    Vector& b = found.dependence[a];
+    const double size = x.norm(found.aliased[a]);
+    for (std::size_t k = 0; k < b.size(); ++k) {
+      if (std::fabs(b[k]) * sizes[k] <= kNothing * size) b[k] = 0.0;
+    }
+    Vector clean = b;
+    for (double& value : clean) value = nearest_fraction(value);
+    if (clean == b) continue;
+    const double before = residual_norm(x, found.aliased[a], found.kept, b);
+    const double after = residual_norm(x, found.aliased[a], found.kept, clean);
+    if (after <= std::max(10.0 * before, kSlack * size)) b = std::move(clean);
+  }
+}
+
+void find_aliased(FixedDesign& design, const std::vector<double>& weights) {
+  const WeightedColumns x(design.x, weights);
+  const double numbers = static_cast<double>(x.rows()) * static_cast<double>(x.cols());
+  const bool small = numbers <= kMostNumbers && numbers * static_cast<double>(x.cols()) <= kMostWork;
+  Dependences found = small ? dense_dependences(x) : sparse_dependences(x, design.term);
+  tidy(x, found);
+  design.kept = std::move(found.kept);
+  design.aliased = std::move(found.aliased);
+  design.dependence.clear();
+  for (const Vector& dependence : found.dependence) {
+    design.dependence.insert(design.dependence.end(), dependence.begin(), dependence.end());
+  }
+}
 
 }  // namespace sm::mixed
