@@ -106,6 +106,24 @@ void Constraint::apply(std::span<double> solutions) const {
   }
 }
 
+void Constraint::apply_transposed(std::span<double> right) const {
+  if (empty()) return;
+  for (std::size_t first = 0; first < right.size(); first += order_) {
+    std::vector<double> products;
+    for (std::size_t v = 0; v < vectors_.size(); ++v) {
+      double sum = 0.0;
+      for (std::size_t i = 0; i < order_; ++i) sum += shift_[v * order_ + i] * right[first + i];
+      products.push_back(sum);
+    }
+    for (std::size_t v = 0; v < vectors_.size(); ++v) {
+      const NullVector& vector = vectors_[v];
+      for (std::size_t l = 0; l < vector.value.size(); ++l) {
+        right[first + vector.first + l * vector.stride] -= vector.value[l] * products[v];
+      }
+    }
+  }
+}
+
 double Constraint::covariance(std::size_t i, std::size_t j) const {
   double sum = 0.0;
   const std::size_t count = vectors_.size();

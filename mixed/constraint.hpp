@@ -18,8 +18,10 @@ class Constraint {
   void prepare(Equations& equations);
   // What to add to the log-determinant of the accepted pivots for that of the constrained equations.
   double log_det() const { return log_det_; }
-  // Moves solutions of the equations.
+  // Moves solutions of the equations, x - F A'x.
   void apply(std::span<double> solutions) const;
+  // b - A F'b: right-hand sides for which the moved solutions are the covariances with b'x of the moved solution.
+  void apply_transposed(std::span<double> right) const;
   // What to add to element (i, j) of C^- for the covariance of the moved solution.
   double covariance(std::size_t i, std::size_t j) const;
 

@@ -30,22 +30,32 @@ class Likelihood {
   CriterionParts evaluate(const Factors& factors, bool with_gradient);
   double degrees() const { return degrees_; }
   double profiled(const CriterionParts& parts) const;
+  Factors profiled_gradient(const CriterionParts& parts) const;
   double at_variance(const CriterionParts& parts, double variance) const;
+
+  // For another response in place of y, at the last factors: unknowns and residuals.
+  struct Solution {
+    std::vector<double> unknowns;
+    std::vector<double> residual;
+  };
+  Solution solve_response(std::span<const double> response, const Factors& factors);
 
   const ScaledDesign& design() const { return design_; }
   const Gram& gram() const { return gram_; }
   bool reml() const { return reml_; }
-  const std::vector<double>& solution() const { return solution_; }  // b and transformed beta
-  const std::vector<double>& residual() const { return residual_; }  // of each observation
+  const std::vector<double>& solution() const { return solved_.unknowns; }  // b and transformed beta
+  const std::vector<double>& residual() const { return solved_.residual; }  // of each observation
   Equations& equations() { return all_; }
-  // Those of the random effects alone; made on demand.
-  Equations& random_equations();
-  Constraint& constraint() { return constraint_; }
+  Equations& random_equations() { return *random_; }  // after factor_random
+  const Constraint& constraint() const { return constraint_; }
+  // Of the random effects alone, with what constrains them: the fixed effects are given. Made on demand; false when
+  // there is no factor.
+  bool factor_random(const Factors& factors);
+  const Constraint& random_constraint() const { return random_constraint_; }
   const std::string& doubt() const { return doubt_; }
   std::int64_t evaluations() const { return evaluations_; }
 
  private:
-  void solve(const Factors& factors);
   double sum_of_squares() const;
   Factors gradient_of_squares(const Factors& factors);
 
@@ -58,9 +68,8 @@ class Likelihood {
   Equations all_;
   std::unique_ptr<Equations> random_;
   Constraint constraint_;
-  std::vector<double> cross_product_;  // M'Wy
-  std::vector<double> solution_;
-  std::vector<double> residual_;
+  Constraint random_constraint_;
+  Solution solved_;
   std::string doubt_;
   std::int64_t evaluations_ = 0;
 };
