@@ -15,6 +15,7 @@
 #include "cli/model_report.hpp"
 #include "mixed/fit_files.hpp"
 #include "mixed/fit_json.hpp"
+#include "mixed/plots.hpp"
 #include "mixed/summary.hpp"
 
 namespace sm::cli {
@@ -163,6 +164,7 @@ void ModelFit::predict() {
 void ModelFit::write() {
   progress_.phase("writing");
   if (!options_.folder.empty()) mixed::write_fit(options_.folder, model_, fit_);
+  if (!options_.plots.empty()) mixed::write_plots(options_.plots, model_, fit_);
 }
 
 std::string ModelFit::text() const {

@@ -101,11 +101,11 @@ mixed::KnownPrecision KnownPrecisions::get(const std::string& name, const mixed:
     refuse(fmt::format("the formula asks for the precision {}, which no option gives", quote(name)),
            name == kPedigreeName ? "--pedigree P.csv" : fmt::format("--kinv {}=K.mtx", name), "add it");
   }
-  KnownPrecision loaded = source->second.pedigree
-                              ? load_pedigree(source->second.path)
-                              : load_precision(source->second.path, source->second.ids, module, limit, progress);
-  notes_.insert(notes_.end(), loaded.notes.begin(), loaded.notes.end());
-  return read_.emplace(name, mixed::KnownPrecision{std::move(loaded.ids), std::move(loaded.precision)}).first->second;
+  const Source& from = source->second;
+  return read_
+      .emplace(name, from.pedigree ? load_pedigree(from.path, notes_)
+                                   : load_precision(from.path, from.ids, module, limit, progress))
+      .first->second;
 }
 
 mixed::DesignOptions design_options(const ModelOptions& options) {
