@@ -177,7 +177,8 @@ class FitComparison:
         if not theirs:
             return
         free = [place - 1 for place in fit["information"]["free"]]
-        rows = [free.index(places[k - 1]) if places[k - 1] in free else None for k in theirs["free"]]
+        free_theirs = theirs.get("free", range(1, len(places) + 1))
+        rows = [free.index(places[k - 1]) if places[k - 1] in free else None for k in free_theirs]
         for kind in ("observed", "average"):
             matrix = theirs[kind]
             for i, row in enumerate(matrix):
