@@ -19,6 +19,10 @@ from other_kinds import compare_blup, compare_field, compare_map, compare_pedigr
 from tables import Table, permutation
 
 SKIPPED = 77
+COLUMNS = (
+    *("criterion", "varcomp", "se_observed", "se_average", "ratio se"),
+    *("fixef", "se", "df", "contrast", "ranef", "pev_sd"),
+)
 SEED = 20240
 
 STARTS = {
@@ -36,6 +40,7 @@ class Suite:
         self.bad = 0
         self.runs = 0
         self.numbers = 0
+        self.worst = {}  # {case: {quantity: error as a part of its tolerance}}
 
     def attempt(self, name, compare):
         """Runs compare(ledger) and prints a line."""
@@ -48,6 +53,10 @@ class Suite:
             print(f"FAIL {name}: {type(error).__name__}: {error}", flush=True)
             return
         self.numbers += ledger.count
+        row = self.worst.setdefault(name.split()[0], {})
+        for quantity, ratio in ledger.worst.items():
+            column = quantity if quantity in COLUMNS else "other"
+            row[column] = max(row.get(column, 0.0), ratio)
         failed = ledger.failed()
         if not ledger.count or failed:
             self.bad += 1
@@ -56,6 +65,16 @@ class Suite:
         print(f"{'FAIL' if failed else 'ok  '} {name}: {ledger.count} numbers; {worst}", flush=True)
         for quantity in failed:
             print(f"       {quantity}: {ledger.worst[quantity]:.3g} times what is allowed at {ledger.places[quantity]}")
+
+    def table(self):
+        """The worst errors of each case over all of its runs."""
+        columns = (*COLUMNS, "other")
+        print("\nworst error / tolerance over all runs of a case")
+        print(f"{'case':<18}" + "".join(f"{column:>12}" for column in columns))
+        for case, row in self.worst.items():
+            cells = [f"{row[c]:.1e}" if c in row else "" for c in columns]
+            print(f"{case:<18}" + "".join(f"{cell:>12}" for cell in cells))
+        print()
 
     def fits(self, case):
         for method in case["fits"]:
@@ -153,6 +172,7 @@ def main(arguments):
             else:
                 left_out += 1
                 print(f"left out {case['id']}: no command answers cases of kind {case['kind']}")
+        suite.table()
     print(
         f"{len(cases) - left_out} cases, {left_out} left out; {suite.runs} runs, {suite.numbers} numbers compared; "
         f"{suite.bad} runs failed"

@@ -119,16 +119,22 @@ class Data:
         return ":".join(self.renaming.get(c, {}).get(p, p) for c, p in zip(columns, parts))
 
 
+def signed(weight, what):
+    return f"{'- ' if weight < 0 else '+ '}{abs(weight)!r}*{what}"
+
+
 def contrast_arguments(fit, columns, data):
-    """--test for each contrast of a fit, named by its number."""
+    """--test for each contrast of a fit, first all of them by columns of X, then all by cells."""
     given = []
     for k, contrast in enumerate(fit.get("contrasts", [])):
-        terms = [
-            f"{'- ' if weight < 0 else '+ '}{abs(weight)!r}*{data.coefficient(name)}"
-            for weight, name in zip(contrast["L"], columns)
-            if weight != 0
-        ]
+        terms = [signed(w, data.coefficient(name)) for w, name in zip(contrast["L"], columns) if w != 0]
         given += ["--test", f"c{k}: " + " ".join(terms).removeprefix("+ ")]
+    for k, contrast in enumerate(fit.get("contrasts", [])):
+        cells = []
+        for cell in contrast["cells"]:
+            at = ", ".join(f"{column}={data.level(column, str(value))}" for column, value in cell["at"].items())
+            cells.append(signed(cell["weight"], f"at({at})"))
+        given += ["--test", f"d{k}: " + " ".join(cells).removeprefix("+ ")]
     return given
 
 

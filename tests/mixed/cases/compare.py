@@ -99,9 +99,13 @@ class FitComparison:
         self.fixed(fit)
         terms = match_terms(self.case, fit, self.answers, self.data)
         self.variances(fit, terms)
+        self.relative_factors(fit, terms)
         self.effects(terms)
-        for k, contrast in enumerate(self.answers.get("contrasts", [])):
-            self.contrast(fit["contrasts"][k], contrast)
+        asked = self.answers.get("contrasts", [])
+        for k, contrast in enumerate(asked):
+            # Each was asked for twice, by columns and by cells.
+            for ours in (fit["contrasts"][k], fit["contrasts"][len(asked) + k]):
+                self.contrast(fit, ours, contrast)
 
     def summary(self, fit):
         allowed = self.tolerance["criterion_abs"]
@@ -160,6 +164,17 @@ class FitComparison:
         self.information(fit, places)
         for (group, _, term), answer in zip(terms, self.answers.get("ratios", [])):
             self.ratio(fit["ratios"][self.ratio_place(fit, term)], answer, group)
+
+    def relative_factors(self, fit, terms):
+        # On the boundary several factors make one covariance matrix.
+        if "theta" not in self.answers or self.answers["singular"]:
+            return
+        theirs = self.answers["theta"]
+        places = [place for _, _, term in terms for place in term["components"]]
+        self.ledger.same("theta count", len(fit["theta"]), len(theirs))
+        allowed = self.tolerance["varcomp_rel"] * max(theirs)
+        for place, theta in zip(places, theirs):
+            self.ledger.number("theta", fit["theta"][place], theta, allowed, str(place))
 
     @staticmethod
     def ratio_place(fit, term):
@@ -220,7 +235,11 @@ class FitComparison:
         for kind in ("sum_of_squares", "sum_pev"):
             self.ledger.number(kind, ours.get(kind), effects[kind], 2.0 * relative * effects[kind], name)
 
-    def contrast(self, ours, answer):
+    def contrast(self, fit, ours, answer):
+        combination = dict(zip(fit["fixed_columns"], ours["L"]))
+        for name, weight in zip(self.case["model"]["fixed_columns"], answer["L"]):
+            value = combination.get(self.data.coefficient(name))
+            self.ledger.number("L", value, weight, 1e-12 * (1.0 + abs(weight)), f"{answer['name']}: {name}")
         self.ledger.same("verdict", ours["estimable"], answer["estimable"], answer["name"])
         if not answer["estimable"]:
             self.ledger.same("made up", [ours["estimate"], ours["se"]], [None, None], answer["name"])
