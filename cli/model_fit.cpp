@@ -61,6 +61,7 @@ class ModelFit {
   void refuse_large(const mixed::EquationFacts& facts) const;
   mixed::FitOptions fit_options();
   bool note(const mixed::Iteration& iteration);
+  void begin(const std::string& doing, double flops);
   void predict();
   void write();
   Report plan_report(const mixed::EquationFacts& facts) const;
@@ -81,6 +82,9 @@ class ModelFit {
   mixed::Fit fit_;
   std::vector<std::string> notes_;
   std::size_t iterations_ = 0;
+  double flops_ = 0.0;  // of the step under way
+  double rate_ = 2e9;   // operations a second, as met last
+  std::chrono::steady_clock::time_point step_begin_;
 };
 
 void ModelFit::read() {
@@ -90,6 +94,7 @@ void ModelFit::read() {
   const mixed::Table table = mixed::Table::read(options_.data);
   session_ = std::make_unique<ModuleSession>(pool_ceiling(common_));
   module_ = mixed_module(*session_);
+  module_.begin = [this](const std::string& doing, double flops) { begin(doing, flops); };
   mixed::DesignOptions design = design_options(options_);
   design.variances_given = kind_ == Kind::blup;
   design.known = [&](const std::string& name) { return precisions.get(name, module_, common_.ceiling, progress_); };
@@ -105,6 +110,17 @@ bool ModelFit::note(const mixed::Iteration& iteration) {
   return !InterruptWatch::interrupted();
 }
 
+// The last long step tells how fast this machine is today.
+void ModelFit::begin(const std::string& doing, double flops) {
+  const auto now = std::chrono::steady_clock::now();
+  const double seconds = std::chrono::duration<double>(now - step_begin_).count();
+  if (flops_ > 0.0 && seconds > 0.01) rate_ = flops_ / seconds;
+  flops_ = flops;
+  step_begin_ = now;
+  progress_.phase(flops > 1e8 ? fmt::format("{} ({:.3g} Gflop)", doing, flops / 1e9) : doing);
+  progress_.expect(flops / rate_);
+}
+
 mixed::FitOptions ModelFit::fit_options() {
   mixed::FitOptions options;
   options.reml = !options_.ml;
@@ -116,7 +132,6 @@ mixed::FitOptions ModelFit::fit_options() {
   options.ratios = ratio_requests(options_.ratios, model_, kind_ == Kind::reml);
   options.spy = !options_.plots.empty();
   options.progress = [this](const mixed::Iteration& iteration) { return note(iteration); };
-  options.phase = [this](const std::string& doing) { progress_.phase(doing); };
   return options;
 }
 
