@@ -121,17 +121,28 @@ DenseOracle::Answer DenseOracle::answer(const VectorL& parameters, bool reml) co
   const std::size_t count = derivatives_.size();
   a.average.resize(index(count), index(count));
   a.observed = a.expected = a.average;
-  const MatrixL& trace = reml ? a.p : a.v_inverse;
+  std::vector<VectorL> forms;
+  std::vector<MatrixL> products;
+  for (const MatrixL& derivative : derivatives_) {
+    forms.push_back(derivative * a.py);
+    products.push_back((reml ? a.p : a.v_inverse) * derivative);
+  }
   for (std::size_t i = 0; i < count; ++i) {
+    const VectorL projected = a.p * forms[i];
     for (std::size_t j = 0; j < count; ++j) {
-      const Real form = (derivatives_[i] * a.py).dot(a.p * (derivatives_[j] * a.py));
-      const Real product = (trace * derivatives_[i] * trace * derivatives_[j]).trace();
+      const Real form = projected.dot(forms[j]);
+      const Real product = products[i].cwiseProduct(products[j].transpose()).sum();
       a.average(index(i), index(j)) = 0.5L * form;
       a.expected(index(i), index(j)) = 0.5L * product;
       a.observed(index(i), index(j)) = form - 0.5L * product;
     }
   }
   return a;
+}
+
+Real DenseOracle::slope(const Answer& a, std::size_t parameter, bool reml) const {
+  const MatrixL& derivative = derivatives_[parameter];
+  return (reml ? a.p : a.v_inverse).cwiseProduct(derivative).sum() - a.py.dot(derivative * a.py);
 }
 
 Real DenseOracle::satterthwaite(const Answer& a, const VectorL& l, const std::vector<std::size_t>& free) const {

@@ -35,6 +35,8 @@ class DenseOracle {
     MatrixL expected;
   };
   Answer answer(const VectorL& parameters, bool reml) const;
+  // Of the criterion along one parameter.
+  Real slope(const Answer& answer, std::size_t parameter, bool reml) const;
   Real satterthwaite(const Answer& answer, const VectorL& l, const std::vector<std::size_t>& free) const;
 
   const MatrixL& x() const { return x_; }  // kept columns
