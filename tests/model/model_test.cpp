@@ -18,7 +18,7 @@ constexpr std::uint64_t kOnceFailed[] = {212, 5200};
 
 struct Seeds {
   unsigned long long first = 1;
-  unsigned long long last = 100;
+  unsigned long long last = QXESM_MODEL_LAST_SEED;
   bool ordinary = true;
 };
 
