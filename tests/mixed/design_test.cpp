@@ -80,9 +80,10 @@ TEST(Design, computes_expressions_on_both_sides) {
 
 TEST(Design, sorts_levels_as_integers_or_bytewise_or_as_given) {
   const std::string table = "y,g,h\n1,10,z\n2,9,B\n3,10,a\n4,-1,a\n5,9,z\n";
-  EXPECT_EQ(model_of(table, "y ~ g + h", {.factors = {"g"}}).fixed.names,
+  EXPECT_EQ(model_of(table, "y ~ g + h", {.factors = {"g"}, .variances_given = true}).fixed.names,
             (Strings{"(Intercept)", "g9", "g10", "ha", "hz"}));
-  const DesignOptions given{.levels = {{"h", {"z", "unseen", "a", "B"}}, {"g", {"9", "10", "-1"}}}};
+  const DesignOptions given{.levels = {{"h", {"z", "unseen", "a", "B"}}, {"g", {"9", "10", "-1"}}},
+                            .variances_given = true};
   const Model model = model_of(table, "y ~ h + g", given);
   EXPECT_EQ(model.fixed.names, (Strings{"(Intercept)", "ha", "hB", "g10", "g-1"}));
   ASSERT_EQ(model.notes.size(), 1u);
@@ -223,7 +224,7 @@ TEST(Design, refuses_a_slip_in_a_column_of_numbers_unless_it_is_called_a_factor)
   EXPECT_EQ(fault.line, 14);
   EXPECT_EQ(fault.what, "found \"1O\"");
   EXPECT_NE(fault.advice.find("--factor x"), std::string::npos);
-  EXPECT_EQ(model_of(table, "y ~ x", {.factors = {"x"}}).fixed.x.cols(), 20);
+  EXPECT_EQ(model_of(table, "y ~ x", {.factors = {"x"}, .variances_given = true}).fixed.x.cols(), 20);
 }
 
 TEST(Design, refuses_unknown_columns_and_names_the_nearest) {
@@ -259,6 +260,13 @@ TEST(Design, refuses_factors_of_one_level_and_tables_without_a_complete_row) {
   const Fault none = fault_of([] { model_of("y,x\n1,\nNA,2\n", "y ~ x"); });
   EXPECT_NE(none.what.find("no observation is left"), std::string::npos);
   EXPECT_NE(none.what.find("'y' 1, 'x' 1"), std::string::npos);
+}
+
+TEST(Design, refuses_as_many_independent_columns_as_observations) {
+  const std::string table = "y,x,z\n1,2,1\n2,3,5\n5,1,1\n";
+  EXPECT_NE(fault_of([&] { model_of(table, "y ~ x + z"); }).what.find("3 independent columns for 3 observations"),
+            std::string::npos);
+  EXPECT_EQ(model_of(table, "y ~ x + z", {.variances_given = true}).fixed.rank(), 3);
 }
 
 TEST(Design, reads_names_in_backquotes) {

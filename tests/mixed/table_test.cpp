@@ -122,6 +122,7 @@ TEST(Table, refuses_ragged_rows_with_their_place) {
 TEST(Table, refuses_headers_without_a_name_of_its_own_for_each_column) {
   expect_fault("a,,c\n1,2,3\n", 1, 3, "column 2 has no name");
   expect_fault("a,b,a\n1,2,3\n", 1, 5, "columns 1 and 3 have the same name");
+  expect_fault("\n1,2.5,-3\n4,5,6\n", 2, 1, "nothing but numbers");
 }
 
 TEST(Table, refuses_quotes_that_are_open_or_misplaced) {
