@@ -51,6 +51,8 @@ TEST(Design, gives_the_first_factor_all_its_dummies_without_an_intercept) {
   EXPECT_EQ(names("y ~ 0 + f + g"), (Strings{"fa", "fb", "gq", "gr"}));
   EXPECT_EQ(names("y ~ 0 + x + f + g"), (Strings{"x", "fa", "fb", "gq", "gr"}));
   EXPECT_EQ(names("y ~ 0 + f:g"), (Strings{"fa:gp", "fb:gp", "fa:gq", "fb:gq", "fa:gr", "fb:gr"}));
+  EXPECT_EQ(names("y ~ 0 + x + x:f"), (Strings{"x", "x:fa", "x:fb"}));
+  EXPECT_EQ(model_of(kCrossed, "y ~ 0 + x + x:f").fixed.dependence, (Numbers{1, -1}));
   EXPECT_EQ(names("y ~ 0 + f*g"), (Strings{"fa", "fb", "gq", "gr", "fb:gq", "fb:gr"}));
 }
 
