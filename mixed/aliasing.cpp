@@ -36,13 +36,36 @@ double nearest_fraction(double value) {
   return value;
 }
 
-double residual_norm(const WeightedColumns& x, std::int64_t j, const std::vector<std::int64_t>& kept, const Vector& b) {
-  Vector left = x.column(j);
-  for (std::size_t k = 0; k < b.size(); ++k) {
-    if (b[k] != 0.0) x.add(-b[k], kept[k], left);
+// The norm of column j less a combination of the kept ones, at the cost of the entries of those that take part.
+class Residual {
+ public:
+  explicit Residual(const WeightedColumns& x) : x_(x), work_(static_cast<std::size_t>(x.rows()), 0.0) {}
+
+  double norm(std::int64_t j, const std::vector<std::int64_t>& kept, const Vector& b) {
+    x_.add(1.0, j, work_);
+    for (std::size_t k = 0; k < b.size(); ++k) {
+      if (b[k] != 0.0) x_.add(-b[k], kept[k], work_);
+    }
+    double sum = take(j);
+    for (std::size_t k = 0; k < b.size(); ++k) {
+      if (b[k] != 0.0) sum += take(kept[k]);
+    }
+    return std::sqrt(sum);
   }
-  return norm_of(left);
-}
+
+ private:
+  double take(std::int64_t j) {
+    double sum = 0.0;
+    x_.for_each(j, [&](std::size_t row, double) {
+      sum += work_[row] * work_[row];
+      work_[row] = 0.0;
+    });
+    return sum;
+  }
+
+  const WeightedColumns& x_;
+  Vector work_;
+};
 
 class GramSchmidt {
  public:
@@ -139,6 +162,7 @@ void WeightedColumns::add(double factor, std::int64_t j, std::vector<double>& va
 Dependences dense_dependences(const WeightedColumns& x) { return GramSchmidt(x).run(); }
 
 void tidy(const WeightedColumns& x, Dependences& found) {
+  Residual residual(x);
   Vector sizes;
   for (const std::int64_t k : found.kept) sizes.push_back(x.norm(k));
   for (std::size_t a = 0; a < found.aliased.size(); ++a) {
@@ -150,9 +174,8 @@ void tidy(const WeightedColumns& x, Dependences& found) {
     Vector clean = b;
     for (double& value : clean) value = nearest_fraction(value);
     if (clean == b) continue;
-    const double before = residual_norm(x, found.aliased[a], found.kept, b);
-    const double after = residual_norm(x, found.aliased[a], found.kept, clean);
-    if (after <= std::max(10.0 * before, kSlack * size)) b = std::move(clean);
+    const double after = residual.norm(found.aliased[a], found.kept, clean);
+    if (after <= kSlack * size || after <= 10.0 * residual.norm(found.aliased[a], found.kept, b)) b = std::move(clean);
   }
 }
 

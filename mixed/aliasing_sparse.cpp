@@ -24,6 +24,7 @@ constexpr Eigen::Index kPanel = 64;
 constexpr std::int64_t kBlockRows = 512;
 constexpr std::int64_t kMostDense = 8000;
 constexpr int kRefinements = 3;
+constexpr double kUnfelt = 1e-14;
 constexpr double kSmallPart = 1e-8;  // of a null vector: rounding
 
 double dot(const Vector& a, const Vector& b) { return std::inner_product(a.begin(), a.end(), b.begin(), 0.0); }
@@ -91,6 +92,29 @@ class NormalEquations {
       right[j] = passed_[static_cast<std::size_t>(j)] ? 0.0 : right[j] / s_(j, j);
       if (right[j] != 0.0) right.tail(m - j - 1) -= right[j] * s_.col(j).tail(m - j - 1);
     }
+    return back(right, [&](std::size_t d) { return products[static_cast<std::size_t>(first_[d])]; });
+  }
+
+  // The same for a doubtful column, by what was computed of it before it was passed over.
+  Vector solve_for(std::int64_t doubtful) const {
+    const auto m = static_cast<Eigen::Index>(rest_.size());
+    const auto own = static_cast<Eigen::Index>(place_[static_cast<std::size_t>(doubtful)]);
+    Eigen::VectorXd right = Eigen::VectorXd::Zero(m);
+    right.head(own) = s_.row(own).head(own).transpose();
+    return back(right, [&](std::size_t d) {
+      const auto link = std::lower_bound(links_[d].begin(), links_[d].end(), own,
+                                         [](const auto& entry, Eigen::Index i) { return entry.first < i; });
+      return link != links_[d].end() && link->first == own ? link->second : 0.0;
+    });
+  }
+
+ private:
+  std::size_t column(Eigen::Index i) const { return static_cast<std::size_t>(rest_[static_cast<std::size_t>(i)]); }
+
+  // L' b = right, then the disjoint columns; `product` of each of those with what is to be met.
+  template <class Product>
+  Vector back(Eigen::VectorXd& right, Product product) const {
+    const auto m = static_cast<Eigen::Index>(rest_.size());
     for (Eigen::Index j = m; j-- > 0;) {
       if (!passed_[static_cast<std::size_t>(j)]) {
         right[j] = (right[j] - s_.col(j).tail(m - j - 1).dot(right.tail(m - j - 1))) / s_(j, j);
@@ -99,15 +123,12 @@ class NormalEquations {
     Vector b(columns_.size(), 0.0);
     for (Eigen::Index i = 0; i < m; ++i) b[column(i)] = right[i];
     for (std::size_t d = 0; d < first_.size(); ++d) {
-      double own = products[static_cast<std::size_t>(first_[d])];
+      double own = product(d);
       for (const auto& [i, value] : links_[d]) own -= value * right[i];
       b[static_cast<std::size_t>(first_[d])] = own;
     }
     return b;
   }
-
- private:
-  std::size_t column(Eigen::Index i) const { return static_cast<std::size_t>(rest_[static_cast<std::size_t>(i)]); }
 
   // The products of the rest among themselves, by blocks of rows: of the dense columns as a matrix, of the others entry
   // by entry.
@@ -287,16 +308,10 @@ class NullSpace {
     Vector combination(columns_.size(), 0.0);
     combination[j] = 1.0;
     for (int pass = 0; pass < kRefinements; ++pass) {
-      Vector products;
-      products.reserve(columns_.size());
-      for (const GroupedColumn& column : columns_) {
-        double product = 0.0;
-        column.for_each([&](std::size_t row, double value) { product += value * left[row]; });
-        products.push_back(product);
-      }
-      const Vector b = equations_.solve(products);
+      const Vector b =
+          pass == 0 ? equations_.solve_for(static_cast<std::int64_t>(j)) : equations_.solve(products(left));
       for (std::size_t k = 0; k < b.size(); ++k) {
-        if (b[k] == 0.0) continue;
+        if (std::fabs(b[k]) <= kUnfelt) continue;
         columns_[k].for_each([&](std::size_t row, double value) { left[row] -= b[k] * value; });
         combination[k] -= b[k];
       }
@@ -305,8 +320,20 @@ class NullSpace {
         for (std::size_t i = 0; i < left.size(); ++i) left[i] -= part * directions_[d][i];
         for (std::size_t k = 0; k < combination.size(); ++k) combination[k] -= part * combinations_[d][k];
       }
+      if (std::sqrt(dot(left, left)) * columns_[j].scale <= kNothing / 100.0 * columns_[j].size) break;
     }
     return combination;
+  }
+
+  Vector products(const Vector& values) const {
+    Vector products;
+    products.reserve(columns_.size());
+    for (const GroupedColumn& column : columns_) {
+      double product = 0.0;
+      column.for_each([&](std::size_t row, double value) { product += value * values[row]; });
+      products.push_back(product);
+    }
+    return products;
   }
 
   // Z v = X w: column j of Z is (column j of X - the shares of those before it) / scale.

@@ -44,7 +44,7 @@ void name_columns(Coding& coding, const CodedTerm& term) {
     const CodedVariable& variable = coding.variables[static_cast<std::size_t>(term.variables[i])];
     std::vector<std::string> longer;
     for (const std::string& own : column_names(variable, term.dummies[i] != 0, coding.contrasts)) {
-      for (const std::string& name : names) longer.push_back(name.empty() ? own : name + ":" + own);
+      for (const std::string& name : names) longer.push_back(name.empty() ? own : fmt::format("{}:{}", name, own));
     }
     names = std::move(longer);
   }

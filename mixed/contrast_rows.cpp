@@ -204,15 +204,17 @@ class ContrastParser {
       if (ended() || text_[at_] != '=') fail(at_, "found " + rest(), "= behind the name of a column", "");
       ++at_;
       const std::string value = take_until(place, ",)");
-      if (!told.emplace(name, std::make_pair(value, place)).second)
-        fail(place, fmt::format("'{}' is told twice", name), "", "");
+      if (!told.emplace(name, std::make_pair(value, place)).second) {
+        fail(place, fmt::format("'{}' is told twice", name), "each variable once", "leave one out");
+      }
       if (text_[at_ - 1] == ')') break;
     }
     std::vector<Setting> settings;
     for (const CodedVariable& variable : coding_.variables) settings.push_back(setting_of(variable, told, begin));
     for (const auto& [name, value] : told) {
-      if (!used_.count(name))
+      if (!used_.contains(name)) {
         fail(value.second, fmt::format("'{}' is no variable of the fixed part", name), "", "leave it out");
+      }
     }
     for (const CodedTerm& term : coding_.terms) add(term, settings, factor);
   }

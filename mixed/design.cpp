@@ -37,6 +37,7 @@ class ModelBuilder {
     model_.row = frame_.rows();
     model_.notes.insert(model_.notes.end(), variables_.notes().begin(), variables_.notes().end());
     find_aliased(model_.fixed, model_.weights);
+    refuse_saturated();
     return std::move(model_);
   }
 
@@ -124,6 +125,16 @@ class ModelBuilder {
       if (variable.factor) model_.factors.push_back({.name = variable.label, .levels = variable.levels});
     }
     model_.sum_contrasts = options_.contrasts == Contrasts::sum;
+  }
+
+  void refuse_saturated() const {
+    if (model_.fixed.rank() < model_.rows() || options_.variances_given) return;
+    throw ModelError(
+        {.file = frame_.table().name(),
+         .what = fmt::format("the fixed part has {} for {}", count_of(model_.fixed.rank(), "independent column"),
+                             count_of(model_.rows(), "observation")),
+         .expected = "fewer: nothing is left for a variance",
+         .advice = "leave terms out, or make a factor of many levels a random term"});
   }
 
   const Formula& formula_;

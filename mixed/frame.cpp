@@ -5,9 +5,11 @@
 #include <algorithm>
 #include <charconv>
 #include <cmath>
+#include <numeric>
 
 #include "mixed/error.hpp"
 #include "mixed/expression.hpp"
+#include "mixed/formula.hpp"
 #include "mixed/words.hpp"
 
 namespace sm::mixed {
@@ -168,15 +170,7 @@ std::vector<double> Frame::numbers(const Node& expression, const std::string& la
       evaluate(expression, rows_.size(), [this](const Node& name) { return column_numbers(name); });
   const auto bad = std::find_if(values.begin(), values.end(), [](double value) { return !std::isfinite(value); });
   if (bad == values.end()) return values;
-  const std::vector<const Node*> names = [&] {
-    std::vector<const Node*> found;
-    const std::function<void(const Node&)> collect = [&](const Node& node) {
-      if (node.kind == NodeKind::name) found.push_back(&node);
-      for (const Node& arg : node.args) collect(arg);
-    };
-    collect(expression);
-    return found;
-  }();
+  const std::vector<const Node*> names = names_in(expression);
   const Cell cell =
       names.empty() ? Cell{} : this->cell(column(*names.front()), static_cast<std::size_t>(bad - values.begin()));
   throw ModelError({.file = table_.name(),
@@ -209,16 +203,20 @@ Factor Frame::distinct(const Column& column) const {
   for (const std::int64_t row : rows_) values.push_back(column.number[static_cast<std::size_t>(row)]);
   std::vector<std::size_t> first;
   factor = distinct_numbers(values, first);
-  if (column.plain) return factor;
+  if (!column.plain) take_labels(column, first, factor);
+  return factor;
+}
+
+// The text of the first cell of each level.
+void Frame::take_labels(const Column& column, const std::vector<std::size_t>& first, Factor& factor) const {
+  std::vector<std::size_t> by_row(first.size());
+  std::iota(by_row.begin(), by_row.end(), 0);
+  std::sort(by_row.begin(), by_row.end(), [&](std::size_t a, std::size_t b) { return first[a] < first[b]; });
   std::vector<std::int64_t> rows;
-  for (const std::size_t place : first) rows.push_back(rows_[place]);
-  std::vector<std::size_t> by_row(rows.size());
-  for (std::size_t i = 0; i < rows.size(); ++i) by_row[i] = i;
-  std::sort(by_row.begin(), by_row.end(), [&](std::size_t a, std::size_t b) { return rows[a] < rows[b]; });
-  std::sort(rows.begin(), rows.end());
+  rows.reserve(first.size());
+  for (const std::size_t level : by_row) rows.push_back(rows_[first[level]]);
   const std::vector<Cell> cells = table_.cells(column, rows);
   for (std::size_t i = 0; i < cells.size(); ++i) factor.levels[by_row[i]] = cells[i].text;
-  return factor;
 }
 
 void Frame::refuse_slip(const Column& column) const {

@@ -2,7 +2,6 @@
 #pragma once
 
 #include <cstdint>
-#include <functional>
 #include <string>
 #include <utility>
 #include <vector>
@@ -50,7 +49,7 @@ class Frame {
   // appearance of text, in order of values of numbers.
   Factor distinct(const Column& column) const;
 
-  // Throws at the first of the rows where `wrong` holds.
+  // A cell by its place among the rows.
   Cell cell(const Column& column, std::size_t place) const { return table_.cell(column, rows_[place]); }
 
   // Refuses a text column in which nearly all cells are numbers: it is one with a slip, not a factor.
@@ -58,6 +57,7 @@ class Frame {
 
  private:
   std::vector<double> column_numbers(const Node& name) const;
+  void take_labels(const Column& column, const std::vector<std::size_t>& first, Factor& factor) const;
   [[noreturn]] void not_a_number(const Column& column, const std::string& advice) const;
 
   const Table& table_;

@@ -133,6 +133,15 @@ class TableLoader {
       }
       names_.emplace_back(name);
     }
+    double value = 0.0;
+    if (std::all_of(names_.begin(), names_.end(), [&](const std::string& name) { return parse_number(name, value); })) {
+      throw ModelError({.file = name_,
+                        .line = row.line,
+                        .column = 1,
+                        .what = "found nothing but numbers in the first line",
+                        .expected = "the names of the columns",
+                        .advice = "put a header line above the data"});
+    }
     text_.resize(names_.size(), 0);
     builders_.clear();
     for (std::size_t c = 0; c < names_.size(); ++c) {

@@ -139,6 +139,22 @@ TEST(Aliasing, counts_a_column_of_zeros_and_one_of_constants_beside_the_intercep
   }
 }
 
+TEST(Aliasing, tells_rounding_from_a_difference_that_is_meant) {
+  for (const double difference : {1e-8, 1e-12}) {
+    Matrix x(40, 3);
+    for (Eigen::Index i = 0; i < 40; ++i) {
+      x(i, 0) = 1.0;
+      x(i, 1) = static_cast<double>((i * 7) % 11);
+      x(i, 2) = 3.0 * x(i, 1) - 1.0 + difference * static_cast<double>((i * i) % 13) * 10.0;
+    }
+    const SparseColumns columns = sparse(x);
+    const WeightedColumns weighted(columns, {});
+    for (const Dependences& found : {dense_dependences(weighted), sparse_dependences(weighted, {0, 1, 2})}) {
+      EXPECT_EQ(found.aliased.size(), difference > 1e-10 ? 0u : 1u);
+    }
+  }
+}
+
 TEST(Aliasing, agrees_with_dense_ranks_on_crossed_factors_and_numbers_within_them) {
   for (unsigned seed = 1; seed <= 12; ++seed) {
     SCOPED_TRACE(seed);
