@@ -15,9 +15,8 @@ namespace {
 constexpr std::size_t kMostRows = 150;   // more levels than that are thinned
 constexpr std::size_t kThinnedTo = 100;  // to so many
 constexpr std::size_t kMostPanels = 12;
-constexpr std::size_t kAcross = 3;
-constexpr double kPlotWidth = 270.0;
-constexpr double kWidestLabel = 130.0;
+constexpr double kWidestLabel = 180.0;
+constexpr double kNarrowest = 520.0;
 constexpr double kAbove = 46.0;  // for a panel's heading
 constexpr double kBelow = 46.0;  // for its axis
 constexpr double kMargin = 20.0;
@@ -35,6 +34,9 @@ std::vector<std::size_t> shown_levels(const RandomEffects& effects) {
   return thinned;
 }
 
+// A panel by itself has the room of two.
+double plot_width(std::size_t panels) { return panels == 1 ? 420.0 : 270.0; }
+
 double row_height(std::size_t rows) {
   constexpr double kComfortable = 420.0;
   return std::clamp(kComfortable / static_cast<double>(rows), 9.0, 20.0);
@@ -51,6 +53,7 @@ struct Placed {
   double label_width = 0.0;
   double left = 0.0;
   double top = 0.0;
+  double width = 0.0;  // without the labels
 };
 
 double label_size(std::size_t rows) { return std::min(10.5, row_height(rows) - 1.0); }
@@ -89,10 +92,10 @@ std::string note_of(const Placed& panel) {
 void draw(svg::Canvas& canvas, const Placed& placed) {
   const RandomEffects& effects = *placed.effects;
   const std::size_t rows = placed.levels.size();
-  const Panel panel(canvas, placed.left + placed.label_width, placed.top, kPlotWidth, panel_height(rows),
+  const Panel panel(canvas, placed.left + placed.label_width, placed.top, placed.width, panel_height(rows),
                     range_of_rows(placed), {-0.5, static_cast<double>(rows) - 0.5});
   panel.x_axis("estimate");
-  panel.heading(effects.group + " · " + effects.term, note_of(placed));
+  panel.heading(effects.group + " · " + effects.term, note_of(placed), placed.label_width);
   canvas.line(panel.x(0.0), panel.top(), panel.x(0.0), panel.bottom(), svg::kRule);
   std::string bars;
   const double size = label_size(rows);
@@ -126,14 +129,16 @@ std::string caterpillar_plot(const Model& model, const Fit& fit) {
     panels.push_back(std::move(panel));
   }
   double top = kHeader;
-  double width = 2.0 * kMargin + kWidestLabel + kPlotWidth;
-  for (std::size_t first = 0; first < panels.size(); first += kAcross) {
+  double width = kNarrowest;
+  const std::size_t across = panels_across(panels.size());
+  for (std::size_t first = 0; first < panels.size(); first += across) {
     double left = kMargin;
     double height = 0.0;
-    for (std::size_t i = first; i < std::min(first + kAcross, panels.size()); ++i) {
+    for (std::size_t i = first; i < std::min(first + across, panels.size()); ++i) {
       panels[i].left = left;
       panels[i].top = top + kAbove;
-      left += panels[i].label_width + kPlotWidth + kMargin;
+      panels[i].width = plot_width(panels.size());
+      left += panels[i].label_width + panels[i].width + kMargin;
       height = std::max(height, panel_height(panels[i].levels.size()));
     }
     top += kAbove + height + kBelow;
@@ -142,8 +147,8 @@ std::string caterpillar_plot(const Model& model, const Fit& fit) {
   svg::Canvas canvas(width, panels.empty() ? top + 60.0 : top, "Random effects");
   const bool intervals =
       std::any_of(panels.begin(), panels.end(), [](const Placed& panel) { return has_intervals(*panel.effects); });
-  header(canvas, intervals ? "Random effects with 95 % prediction intervals" : "Random effects", model.formula);
-  if (panels.empty()) canvas.text(kMargin, top + 20.0, "The model has no random effects.");
+  header(canvas, intervals ? "Random effects with 95 % prediction intervals" : "Random effects", model, fit);
+  if (panels.empty()) canvas.text(kMargin, top + 20.0, "There are no random effects.", {.size = 12.0});
   for (const Placed& panel : panels) draw(canvas, panel);
   return canvas.finished();
 }

@@ -37,7 +37,7 @@ std::vector<Point> finite_points(const Fit& fit) {
 // Locally weighted straight lines with tricube weights over two thirds of the points, without robustness steps: W. S.
 // Cleveland, "Robust locally weighted regression and smoothing scatterplots", J. Amer. Statist. Assoc. 74 (1979) 829-836.
 std::vector<Point> smoothed(const std::vector<Point>& points) {
-  constexpr std::size_t kFewest = 10;
+  constexpr std::size_t kFewest = 30;
   constexpr int kPlaces = 60;
   const double lo = points.empty() ? 0.0 : points.front().x;
   const double hi = points.empty() ? 0.0 : points.back().x;
@@ -136,7 +136,7 @@ void draw_hexagons(const Panel& panel, const std::vector<Point>& points) {
   panel.canvas().text(panel.right() + 10.0, panel.top() + 14.0, "observations", {.size = 10.5, .fill = svg::kMuted});
 }
 
-void draw_line(const Panel& panel, const std::vector<Point>& line) {
+void draw_line(const Panel& panel, const std::vector<Point>& line, bool with_halo) {
   std::string d;
   for (const Point& point : line) {
     const double y = std::clamp(panel.y(point.y), panel.top(), panel.bottom());
@@ -144,7 +144,7 @@ void draw_line(const Panel& panel, const std::vector<Point>& line) {
                    svg::coordinate(y));
   }
   if (d.empty()) return;
-  panel.canvas().stroke_path(d, "#ffffff", 4.0);
+  if (with_halo) panel.canvas().stroke_path(d, "#ffffff", 4.0);
   panel.canvas().stroke_path(d, svg::kInk, 1.6);
   const double y = panel.top() - 10.0;
   panel.canvas().line(panel.right() - 120.0, y - 4.0, panel.right() - 98.0, y - 4.0, svg::kInk, 1.6);
@@ -156,7 +156,7 @@ void draw_line(const Panel& panel, const std::vector<Point>& line) {
 std::string residual_plot(const Model& model, const Fit& fit) {
   const std::vector<Point> points = finite_points(fit);
   svg::Canvas canvas(kWidth, kHeight, "Residuals against fitted values");
-  header(canvas, "Residuals against fitted values", model.formula);
+  header(canvas, "Residuals against fitted values", model, fit);
   std::vector<double> xs;
   std::vector<double> ys{0.0};
   for (const Point& point : points) {
@@ -176,7 +176,7 @@ std::string residual_plot(const Model& model, const Fit& fit) {
     draw_dots(panel, points);
   }
   canvas.line(panel.left(), panel.y(0.0), panel.right(), panel.y(0.0), svg::kRule);
-  draw_line(panel, smoothed(points));
+  draw_line(panel, smoothed(points), many);
   canvas.text(
       panel.left(), panel.top() - 10.0,
       count_text(static_cast<std::int64_t>(points.size())) + (points.size() == 1 ? " observation" : " observations"),
