@@ -79,7 +79,8 @@ std::string tick_text(double value, double step) {
   if (std::fabs(value) < kLargest && decimals <= kMostDecimals) {
     return with_minus(fmt::format("{:.{}f}", value, decimals));
   }
-  const int digits = std::max(1, 1 + static_cast<int>(std::floor(std::log10(std::fabs(value) / step) + 1e-9)));
+  const auto exponent = [](double size) { return static_cast<int>(std::floor(std::log10(size) + 1e-9)); };
+  const int digits = std::max(1, 1 + exponent(std::fabs(value)) - exponent(step));
   return with_minus(fmt::format("{:.{}g}", value, digits));
 }
 

@@ -4,7 +4,6 @@
 #include <algorithm>
 #include <cmath>
 #include <iterator>
-#include <numeric>
 
 #include "mixed/axes.hpp"
 #include "mixed/plots.hpp"
@@ -24,8 +23,10 @@ constexpr double kNormal95 = 1.959963984540054;
 
 // The levels that are shown of one coefficient, the smallest effect first.
 std::vector<std::size_t> shown_levels(const RandomEffects& effects) {
-  std::vector<std::size_t> order(effects.estimate.size());
-  std::iota(order.begin(), order.end(), std::size_t{0});
+  std::vector<std::size_t> order;
+  for (std::size_t i = 0; i < effects.estimate.size(); ++i) {
+    if (std::isfinite(effects.estimate[i])) order.push_back(i);
+  }
   std::stable_sort(order.begin(), order.end(),
                    [&](std::size_t a, std::size_t b) { return effects.estimate[a] < effects.estimate[b]; });
   if (order.size() <= kMostRows) return order;
@@ -104,7 +105,7 @@ void draw(svg::Canvas& canvas, const Placed& placed) {
     const double y = panel.y(static_cast<double>(row));
     canvas.text(panel.left() - 6.0, y + 0.35 * size, svg::fitted(effects.levels[level], size, placed.label_width - 6.0),
                 {.size = size, .anchor = svg::Anchor::end, .fill = svg::kMuted});
-    if (!has_intervals(effects)) continue;
+    if (!has_intervals(effects) || !std::isfinite(effects.pev_sd[level])) continue;
     const double half = kNormal95 * effects.pev_sd[level];
     fmt::format_to(std::back_inserter(bars), "M{} {}H{}", svg::coordinate(panel.x(effects.estimate[level] - half)),
                    svg::coordinate(y), svg::coordinate(panel.x(effects.estimate[level] + half)));
@@ -123,8 +124,9 @@ void draw(svg::Canvas& canvas, const Placed& placed) {
 std::string caterpillar_plot(const Model& model, const Fit& fit) {
   std::vector<Placed> panels;
   for (const RandomEffects& effects : fit.ranef) {
-    if (effects.estimate.empty() || panels.size() == kMostPanels) continue;
+    if (panels.size() == kMostPanels) break;
     Placed panel{.effects = &effects, .levels = shown_levels(effects)};
+    if (panel.levels.empty()) continue;
     panel.label_width = label_width(effects, panel.levels);
     panels.push_back(std::move(panel));
   }

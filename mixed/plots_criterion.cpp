@@ -77,10 +77,11 @@ std::string criterion_plot(const Model& model, const Fit& fit) {
     score.push_back(log_of(iteration.score));
   }
   // On a logarithmic scale the smallest value itself has no place.
-  const std::string note = fmt::format("open circles: at the smallest value, {:.6f}", best);
+  const std::string note = std::isfinite(best) ? fmt::format("open circles: at the smallest value, {:.6f}", best) : "";
+  const double end = fit.iterations.back().score;
   draw(canvas, kHeader + 40.0, excess, "Criterion above its smallest value", note, false);
   draw(canvas, kHeader + 40.0 + kHigh + kGap, score, "Largest scaled score",
-       fmt::format("at the end {:.1e}", fit.iterations.back().score), true);
+       std::isfinite(end) ? fmt::format("at the end {:.1e}", end) : "", true);
   return canvas.finished();
 }
 
