@@ -10,7 +10,8 @@ namespace {
 
 constexpr double kTickSize = 10.5;
 constexpr double kNameSize = 11.5;
-constexpr double kPixelsPerTick = 70.0;
+constexpr double kPixelsPerTick = 64.0;
+constexpr double kBold = 1.08;  // times as wide as plain
 constexpr const char* kMinus = "\u2212";
 
 double step_of(const std::vector<double>& ticks) { return ticks.size() > 1 ? ticks[1] - ticks[0] : 1.0; }
@@ -19,7 +20,9 @@ double step_of(const std::vector<double>& ticks) { return ticks.size() > 1 ? tic
 std::vector<double> power_ticks(Range range, int count) {
   const double stride = std::max(1.0, std::ceil((range.hi - range.lo) / std::max(count, 1)));
   std::vector<double> ticks;
-  for (double power = std::ceil(range.lo / stride) * stride; power <= range.hi; power += stride) ticks.push_back(power);
+  for (double power = std::ceil(range.lo / stride) * stride; power <= range.hi; power += stride) {
+    ticks.push_back(power + 0.0);  // never the zero with a sign
+  }
   return ticks;
 }
 
@@ -59,7 +62,7 @@ std::vector<double> nice_ticks(Range range, int count) {
   if (!(raw > 0.0) || !std::isfinite(raw)) return {range.lo};
   const double power = std::pow(10.0, std::floor(std::log10(raw)));
   const double lead = raw / power;
-  const double step = (lead <= 1.0 ? 1.0 : lead <= 2.0 ? 2.0 : lead <= 5.0 ? 5.0 : 10.0) * power;
+  const double step = (lead < 1.5 ? 1.0 : lead < 3.5 ? 2.0 : lead < 7.5 ? 5.0 : 10.0) * power;
   std::vector<double> ticks;
   const double slack = 1e-9;
   const double first = std::ceil(range.lo / step - slack);
@@ -76,7 +79,8 @@ std::string tick_text(double value, double step) {
   if (std::fabs(value) < kLargest && decimals <= kMostDecimals) {
     return with_minus(fmt::format("{:.{}f}", value, decimals));
   }
-  const int digits = std::max(1, 1 + static_cast<int>(std::floor(std::log10(std::fabs(value) / step) + 1e-9)));
+  const auto exponent = [](double size) { return static_cast<int>(std::floor(std::log10(size) + 1e-9)); };
+  const int digits = std::max(1, 1 + exponent(std::fabs(value)) - exponent(step));
   return with_minus(fmt::format("{:.{}g}", value, digits));
 }
 
@@ -90,8 +94,9 @@ std::string count_text(std::int64_t count) {
   return text;
 }
 
-void Panel::x_axis(const std::string& name) const {
-  const std::vector<double> ticks = nice_ticks(x_, std::max(2, static_cast<int>(width_ / kPixelsPerTick)));
+void Panel::x_axis(const std::string& name, bool whole) const {
+  std::vector<double> ticks = nice_ticks(x_, std::max(2, static_cast<int>(width_ / kPixelsPerTick)));
+  if (whole) std::erase_if(ticks, [](double tick) { return tick != std::round(tick); });
   for (const double tick : ticks) {
     canvas_.line(x(tick), top_, x(tick), bottom(), svg::kGrid);
     canvas_.text(x(tick), bottom() + 15.0, tick_text(tick, step_of(ticks)),
@@ -119,20 +124,29 @@ void Panel::y_axis(const std::string& name, bool powers) const {
                {.size = kNameSize, .anchor = svg::Anchor::middle, .upwards = true});
 }
 
-void Panel::heading(const std::string& title, const std::string& note) const {
+void Panel::heading(const std::string& title, const std::string& note, double left_of) const {
   constexpr double kTitleSize = 12.0;
   constexpr double kNoteSize = 10.5;
-  canvas_.text(left_, top_ - 24.0, svg::fitted(title, kTitleSize * 1.08, width_), {.size = kTitleSize, .bold = true});
-  canvas_.text(left_, top_ - 9.0, svg::fitted(note, kNoteSize, width_), {.size = kNoteSize, .fill = svg::kMuted});
+  const double left = left_ - left_of;
+  const double width = width_ + left_of;
+  canvas_.text(left, top_ - 24.0, svg::fitted(title, kTitleSize * kBold, width), {.size = kTitleSize, .bold = true});
+  canvas_.text(left, top_ - 9.0, svg::fitted(note, kNoteSize, width), {.size = kNoteSize, .fill = svg::kMuted});
 }
 
-void header(svg::Canvas& canvas, const std::string& title, const std::string& below) {
+void header(svg::Canvas& canvas, const std::string& title, const Model& model, const Fit& fit) {
   constexpr double kTitleSize = 16.0;
   constexpr double kBelowSize = 11.5;
   constexpr double kMargin = 20.0;
   const double width = canvas.width() - 2.0 * kMargin;
-  canvas.text(kMargin, 27.0, svg::fitted(title, kTitleSize * 1.08, width), {.size = kTitleSize, .bold = true});
-  canvas.text(kMargin, 46.0, svg::fitted(below, kBelowSize, width), {.size = kBelowSize, .fill = svg::kMuted});
+  canvas.text(kMargin, 27.0, svg::fitted(title, kTitleSize * kBold, width), {.size = kTitleSize, .bold = true});
+  const bool doubtful = fit.convergence != Convergence::converged && !fit.variances_given;
+  canvas.text(kMargin, 46.0, svg::fitted((doubtful ? "NOT CONVERGED: " : "") + model.formula, kBelowSize, width),
+              {.size = kBelowSize, .fill = svg::kMuted});
+}
+
+std::size_t panels_across(std::size_t panels) {
+  constexpr std::size_t kMost = 3;
+  return panels == 4 ? 2 : std::min(panels, kMost);
 }
 
 }  // namespace sm::mixed

@@ -6,6 +6,8 @@
 #include <string>
 #include <vector>
 
+#include "mixed/fit.hpp"
+#include "mixed/model.hpp"
 #include "mixed/svg.hpp"
 
 namespace sm::mixed {
@@ -45,10 +47,12 @@ class Panel {
   Range y_range() const { return y_; }
   svg::Canvas& canvas() const { return canvas_; }
 
-  // Grid lines, tick labels and the name of an axis. With `powers` the scale holds decimal logarithms.
-  void x_axis(const std::string& name) const;
+  // Grid lines, tick labels and the name of an axis. With `whole` no fractions are labelled; with `powers` the scale
+  // holds decimal logarithms.
+  void x_axis(const std::string& name, bool whole = false) const;
   void y_axis(const std::string& name, bool powers = false) const;
-  void heading(const std::string& title, const std::string& note) const;  // above the panel
+  // Above the panel, beginning so far to the left of it.
+  void heading(const std::string& title, const std::string& note, double left_of = 0.0) const;
 
  private:
   svg::Canvas& canvas_;
@@ -60,8 +64,12 @@ class Panel {
   Range y_;
 };
 
-// The plot's title, and below it the formula of the model: the uppermost kHeader pixels of every plot.
+// The plot's title and below it the formula of the model, in the uppermost kHeader pixels of every plot. A fit that did
+// not converge is said to be one.
 constexpr double kHeader = 58.0;
-void header(svg::Canvas& canvas, const std::string& title, const std::string& below);
+void header(svg::Canvas& canvas, const std::string& title, const Model& model, const Fit& fit);
+
+// How many panels stand side by side: up to three, four by twos.
+std::size_t panels_across(std::size_t panels);
 
 }  // namespace sm::mixed

@@ -24,7 +24,7 @@ double log_of(double value) { return value > 0.0 && std::isfinite(value) ? std::
 Range range_of_powers(const std::vector<double>& powers) {
   const Range range = range_of(powers);
   const double lo = std::floor(range.lo);
-  return {lo, std::max(lo + 1.0, std::ceil(range.hi))};
+  return {lo - 0.5, std::max(lo + 1.0, std::ceil(range.hi)) + 0.1};
 }
 
 void draw(svg::Canvas& canvas, double top, const std::vector<double>& powers, const std::string& title,
@@ -32,7 +32,7 @@ void draw(svg::Canvas& canvas, double top, const std::vector<double>& powers, co
   const double last = std::max(1.0, static_cast<double>(powers.size()) - 1.0);
   const Panel panel(canvas, kLeft, top, kWidth - kLeft - kMargin, kHigh, {-0.03 * last, 1.03 * last},
                     range_of_powers(powers));
-  panel.x_axis(with_name ? "iteration" : "");
+  panel.x_axis(with_name ? "iteration" : "", true);
   panel.y_axis("", true);
   panel.heading(title, note);
   std::string d;
@@ -43,13 +43,15 @@ void draw(svg::Canvas& canvas, double top, const std::vector<double>& powers, co
   }
   if (!d.empty()) canvas.stroke_path(d, svg::kAccent, 1.5);
   constexpr std::size_t kFew = 60;
+  const double radius = powers.size() <= kFew ? 3.2 : 1.6;
   canvas.begin_circles(svg::kAccent, 1.0);
   for (std::size_t i = 0; i < powers.size(); ++i) {
-    if (std::isfinite(powers[i])) {
-      canvas.circle(panel.x(static_cast<double>(i)), panel.y(powers[i]), powers.size() <= kFew ? 3.2 : 1.6);
-    }
+    if (std::isfinite(powers[i])) canvas.circle(panel.x(static_cast<double>(i)), panel.y(powers[i]), radius);
   }
   canvas.end_group();
+  for (std::size_t i = 0; i < powers.size(); ++i) {
+    if (!std::isfinite(powers[i])) canvas.ring(panel.x(static_cast<double>(i)), panel.bottom(), radius, svg::kAccent);
+  }
 }
 
 }  // namespace
@@ -59,7 +61,7 @@ std::string criterion_plot(const Model& model, const Fit& fit) {
   constexpr double kGap = 70.0;
   const bool nothing = fit.iterations.empty();
   svg::Canvas canvas(kWidth, nothing ? 120.0 : kHeader + 40.0 + kHigh + kGap + kHigh + 46.0, title);
-  header(canvas, title, model.formula);
+  header(canvas, title, model, fit);
   if (nothing) {
     canvas.text(20.0, kHeader + 24.0,
                 fit.variances_given ? "The variances are given: nothing was iterated." : "There were no iterations.",
@@ -74,13 +76,12 @@ std::string criterion_plot(const Model& model, const Fit& fit) {
     excess.push_back(log_of(iteration.criterion - best));
     score.push_back(log_of(iteration.score));
   }
-  // Steps that end within rounding of the smallest value have nothing to show on a logarithmic scale.
-  const auto at_best = std::count(excess.begin(), excess.end(), kNothing);
-  const std::string note = fmt::format("smallest value {:.6f}; {} {} at it", best, at_best,
-                                       at_best == 1 ? "iteration is" : "iterations are");
+  // On a logarithmic scale the smallest value itself has no place.
+  const std::string note = std::isfinite(best) ? fmt::format("open circles: at the smallest value, {:.6f}", best) : "";
+  const double end = fit.iterations.back().score;
   draw(canvas, kHeader + 40.0, excess, "Criterion above its smallest value", note, false);
   draw(canvas, kHeader + 40.0 + kHigh + kGap, score, "Largest scaled score",
-       fmt::format("at the end {:.1e}", fit.iterations.back().score), true);
+       std::isfinite(end) ? fmt::format("at the end {:.1e}", end) : "", true);
   return canvas.finished();
 }
 

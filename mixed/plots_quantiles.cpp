@@ -12,7 +12,6 @@ namespace {
 
 constexpr std::size_t kMostPanels = 12;
 constexpr std::size_t kMostDots = 1'500;
-constexpr std::size_t kAcross = 3;
 constexpr double kSide = 290.0;
 constexpr double kLeft = 68.0;
 constexpr double kAbove = 46.0;
@@ -103,16 +102,16 @@ std::string quantile_plot(const Model& model, const Fit& fit) {
     if (samples.size() == kMostPanels) break;
     samples.push_back(sample_of(effects.group + " · " + effects.term, "estimate", effects.estimate));
   }
-  const std::size_t across = std::min(kAcross, samples.size());
-  const std::size_t down = (samples.size() + kAcross - 1) / kAcross;
+  const std::size_t across = panels_across(samples.size());
+  const std::size_t down = (samples.size() + across - 1) / across;
   constexpr double kColumn = kLeft + kSide + kMargin;
   constexpr double kRow = kAbove + kSide + kBelow;
   svg::Canvas canvas(static_cast<double>(across) * kColumn + kMargin, kHeader + static_cast<double>(down) * kRow,
                      "Normal quantiles");
-  header(canvas, "Normal quantiles", model.formula);
+  header(canvas, "Normal quantiles", model, fit);
   for (std::size_t i = 0; i < samples.size(); ++i) {
-    draw(canvas, samples[i], static_cast<double>(i % kAcross) * kColumn,
-         kHeader + static_cast<double>(i / kAcross) * kRow);
+    draw(canvas, samples[i], static_cast<double>(i % across) * kColumn,
+         kHeader + static_cast<double>(i / across) * kRow);
   }
   return canvas.finished();
 }

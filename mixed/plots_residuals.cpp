@@ -37,7 +37,7 @@ std::vector<Point> finite_points(const Fit& fit) {
 // Locally weighted straight lines with tricube weights over two thirds of the points, without robustness steps: W. S.
 // Cleveland, "Robust locally weighted regression and smoothing scatterplots", J. Amer. Statist. Assoc. 74 (1979) 829-836.
 std::vector<Point> smoothed(const std::vector<Point>& points) {
-  constexpr std::size_t kFewest = 10;
+  constexpr std::size_t kFewest = 30;
   constexpr int kPlaces = 60;
   const double lo = points.empty() ? 0.0 : points.front().x;
   const double hi = points.empty() ? 0.0 : points.back().x;
@@ -66,6 +66,15 @@ std::vector<Point> smoothed(const std::vector<Point>& points) {
     line.push_back({at, det > 1e-9 * w * wxx ? (wxx * wy - wx * wxy) / det : wy / w});
   }
   return line;
+}
+
+// Every so many of the points where there are more than a smooth line needs.
+std::vector<Point> thinned(const std::vector<Point>& points) {
+  constexpr std::size_t kEnough = 20'000;
+  const std::size_t stride = points.size() / kEnough + 1;
+  std::vector<Point> some;
+  for (std::size_t i = stride / 2; i < points.size(); i += stride) some.push_back(points[i]);
+  return some;
 }
 
 void draw_dots(const Panel& panel, const std::vector<Point>& points) {
@@ -111,6 +120,22 @@ std::string hexagon_path(double x, double y) {
 constexpr int kShades = 6;
 double opacity(int shade) { return 0.14 + 0.86 * shade / (kShades - 1); }
 
+// From how many observations on a hexagon has each shade, of those that occur.
+void draw_legend(const Panel& panel, double factor, std::int64_t most) {
+  const double x = panel.right() + 16.0;
+  double y = panel.top() + 40.0;
+  panel.canvas().text(panel.right() + 10.0, panel.top() + 14.0, "observations", {.size = 10.5, .fill = svg::kMuted});
+  const auto from = [&](int shade) {
+    return static_cast<std::int64_t>(std::ceil(std::exp(factor * shade / kShades) - 1e-9));
+  };
+  for (int shade = 0; shade < kShades && from(shade) <= most; ++shade) {
+    if (shade + 1 < kShades && from(shade + 1) == from(shade)) continue;  // no count has this one
+    panel.canvas().fill_path(hexagon_path(x + 5.0, y - 4.0), svg::kAccent, opacity(shade));
+    panel.canvas().text(x + 16.0, y, "≥ " + count_text(from(shade)), {.size = 10.5, .fill = svg::kMuted});
+    y += 20.0;
+  }
+}
+
 void draw_hexagons(const Panel& panel, const std::vector<Point>& points) {
   const auto counts = hexagon_counts(panel, points);
   std::int64_t most = 1;
@@ -126,17 +151,11 @@ void draw_hexagons(const Panel& panel, const std::vector<Point>& points) {
   }
   for (int shade = 0; shade < kShades; ++shade) {
     if (!paths[shade].empty()) panel.canvas().fill_path(paths[shade], svg::kAccent, opacity(shade));
-    const double from = std::ceil(std::exp(factor * shade / kShades) - 1e-9);
-    const double x = panel.right() + 16.0;
-    const double y = panel.top() + 40.0 + 20.0 * shade;
-    panel.canvas().fill_path(hexagon_path(x + 5.0, y - 4.0), svg::kAccent, opacity(shade));
-    panel.canvas().text(x + 16.0, y, "≥ " + count_text(static_cast<std::int64_t>(from)),
-                        {.size = 10.5, .fill = svg::kMuted});
   }
-  panel.canvas().text(panel.right() + 10.0, panel.top() + 14.0, "observations", {.size = 10.5, .fill = svg::kMuted});
+  draw_legend(panel, factor, most);
 }
 
-void draw_line(const Panel& panel, const std::vector<Point>& line) {
+void draw_line(const Panel& panel, const std::vector<Point>& line, bool with_halo) {
   std::string d;
   for (const Point& point : line) {
     const double y = std::clamp(panel.y(point.y), panel.top(), panel.bottom());
@@ -144,7 +163,7 @@ void draw_line(const Panel& panel, const std::vector<Point>& line) {
                    svg::coordinate(y));
   }
   if (d.empty()) return;
-  panel.canvas().stroke_path(d, "#ffffff", 4.0);
+  if (with_halo) panel.canvas().stroke_path(d, "#ffffff", 4.0);
   panel.canvas().stroke_path(d, svg::kInk, 1.6);
   const double y = panel.top() - 10.0;
   panel.canvas().line(panel.right() - 120.0, y - 4.0, panel.right() - 98.0, y - 4.0, svg::kInk, 1.6);
@@ -156,7 +175,7 @@ void draw_line(const Panel& panel, const std::vector<Point>& line) {
 std::string residual_plot(const Model& model, const Fit& fit) {
   const std::vector<Point> points = finite_points(fit);
   svg::Canvas canvas(kWidth, kHeight, "Residuals against fitted values");
-  header(canvas, "Residuals against fitted values", model.formula);
+  header(canvas, "Residuals against fitted values", model, fit);
   std::vector<double> xs;
   std::vector<double> ys{0.0};
   for (const Point& point : points) {
@@ -176,7 +195,7 @@ std::string residual_plot(const Model& model, const Fit& fit) {
     draw_dots(panel, points);
   }
   canvas.line(panel.left(), panel.y(0.0), panel.right(), panel.y(0.0), svg::kRule);
-  draw_line(panel, smoothed(points));
+  draw_line(panel, smoothed(thinned(points)), many);
   canvas.text(
       panel.left(), panel.top() - 10.0,
       count_text(static_cast<std::int64_t>(points.size())) + (points.size() == 1 ? " observation" : " observations"),

@@ -58,6 +58,16 @@ void add_runs(std::string* paths, const Grid& grid) {
   }
 }
 
+// White lines between cells that are large enough to be counted.
+constexpr std::int64_t kMostSeparate = 60;
+void separate_cells(svg::Canvas& canvas, const Panel& panel, std::int64_t side) {
+  for (std::int64_t i = 1; i < side; ++i) {
+    const double part = static_cast<double>(i) / static_cast<double>(side);
+    canvas.line(panel.x(part), panel.top() + 1.0, panel.x(part), panel.bottom() - 1.0, "#ffffff");
+    canvas.line(panel.left() + 1.0, panel.y(part), panel.right() - 1.0, panel.y(part), "#ffffff");
+  }
+}
+
 void draw(svg::Canvas& canvas, double left, const SpyPattern& pattern, bool both_triangles, const std::string& title,
           const std::string& note) {
   const double top = kHeader + kAbove;
@@ -77,9 +87,10 @@ void draw(svg::Canvas& canvas, double left, const SpyPattern& pattern, bool both
     if (!paths[shade].empty()) canvas.fill_path(paths[shade], svg::kAccent, 0.4 + 0.6 * shade / (kShades - 1));
   }
   canvas.end_group();
+  if (grid.side <= kMostSeparate) separate_cells(canvas, panel, grid.side);
   const auto shown = static_cast<std::int64_t>(pattern.places.size());
   std::string below = "order " + count_text(pattern.order);
-  if (shown < pattern.entries) below += ", drawn from " + count_text(shown) + " of the entries";
+  if (shown < pattern.entries) below += ", drawn from a sample of " + count_text(shown) + " entries";
   canvas.text(left, top + kSide + 18.0, below, {.size = 10.5, .fill = svg::kMuted});
 }
 
@@ -88,14 +99,14 @@ void draw(svg::Canvas& canvas, double left, const SpyPattern& pattern, bool both
 std::string spy_plot(const Model& model, const Fit& fit) {
   const std::string title = "Mixed-model equations and their factor";
   svg::Canvas canvas(3.0 * kMargin + 2.0 * kSide, kHeader + kAbove + kSide + 36.0, title);
-  header(canvas, title, model.formula);
+  header(canvas, title, model, fit);
   const EquationFacts& facts = fit.equations;
   draw(canvas, kMargin, fit.spy_equations, true, "Equations",
        count_text(facts.entries) + " entries in the upper triangle");
   std::string note = count_text(facts.factor_entries) + " entries";
   if (facts.entries > 0) {
     const double ratio = static_cast<double>(facts.factor_entries) / static_cast<double>(facts.entries);
-    note += fmt::format(", {:.2f} times those of the equations", ratio);
+    note += fmt::format(", fill ratio {:.2f}", ratio);
   }
   draw(canvas, 2.0 * kMargin + kSide, fit.spy_factor, false, "Factor, in the order of elimination", note);
   return canvas.finished();

@@ -4,6 +4,7 @@
 
 #include <cmath>
 #include <iterator>
+#include <vector>
 
 #include "mixed/text.hpp"
 
@@ -60,15 +61,27 @@ double text_width(std::string_view text, double size) {
 std::string fitted(std::string_view text, double size, double width) {
   const std::string shown = printable(text);
   if (text_width(shown, size) <= width) return shown;
-  std::string_view rest = shown;
-  std::size_t kept = 0;
-  double taken = text_width("…", size);
-  while (!rest.empty()) {
-    taken += advance(next_character(rest)) * size;
-    if (taken > width) break;
-    kept = shown.size() - rest.size();
+  std::vector<std::string_view> characters;
+  for (std::string_view rest = shown; !rest.empty();) {
+    const std::string_view before = rest;
+    next_character(rest);
+    characters.push_back(before.substr(0, before.size() - rest.size()));
   }
-  return shown.substr(0, kept) + "…";
+  std::string head;
+  std::string tail;
+  double left = width - text_width("…", size);
+  for (std::size_t i = 0; i < characters.size(); ++i) {
+    const bool at_end = i % 2 == 1;
+    const std::string_view next = at_end ? characters[characters.size() - 1 - i / 2] : characters[i / 2];
+    left -= text_width(next, size);
+    if (left < 0.0) break;
+    if (at_end) {
+      tail.insert(0, next);
+    } else {
+      head += next;
+    }
+  }
+  return head + "…" + tail;
 }
 
 std::string coordinate(double value) {
@@ -121,8 +134,15 @@ void Canvas::circle(double x, double y, double radius) {
                  coordinate(radius));
 }
 
+void Canvas::ring(double x, double y, double radius, const char* stroke) {
+  fmt::format_to(std::back_inserter(body_),
+                 "<circle cx=\"{}\" cy=\"{}\" r=\"{}\" fill=\"#ffffff\" stroke=\"{}\" stroke-width=\"1.5\"/>\n",
+                 coordinate(x), coordinate(y), coordinate(radius), stroke);
+}
+
 void Canvas::begin_scaled(double x, double y, double scale) {
-  fmt::format_to(std::back_inserter(body_), "<g transform=\"translate({} {}) scale({:.6g})\">\n", coordinate(x),
+  fmt::format_to(std::back_inserter(body_),
+                 "<g transform=\"translate({} {}) scale({:.6g})\" shape-rendering=\"crispEdges\">\n", coordinate(x),
                  coordinate(y), scale);
 }
 

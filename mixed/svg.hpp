@@ -29,7 +29,7 @@ std::string escaped(std::string_view text);
 // An estimate of a text's width, on the side of too wide: fonts differ.
 double text_width(std::string_view text, double size);
 
-// The text, or its beginning with an ellipsis, no wider than that.
+// The text no wider than that, with an ellipsis for its middle: names often differ at their ends.
 std::string fitted(std::string_view text, double size, double width);
 
 // Coordinates in pixels, the origin at the upper left; written to a hundredth.
@@ -51,6 +51,7 @@ class Canvas {
   // Between these, circles of one radius; a group spares each of them its style.
   void begin_circles(const char* fill, double opacity);
   void circle(double x, double y, double radius);
+  void ring(double x, double y, double radius, const char* stroke);
   // Between these, one unit of a path is `scale` pixels, and the origin is at (x, y).
   void begin_scaled(double x, double y, double scale);
   void end_group() { body_ += "</g>\n"; }
