@@ -3,8 +3,8 @@
 #include <algorithm>
 #include <array>
 #include <bit>
-#include <compare>
 #include <span>
+#include <tuple>
 #include <utility>
 
 #include "mixed/relationship.hpp"
@@ -32,7 +32,9 @@ struct NumberedParent {
   std::int64_t sire;
   std::int64_t dam;
   std::int64_t animal;
-  auto operator<=>(const NumberedParent&) const = default;
+  bool operator<(const NumberedParent& other) const {
+    return std::tie(sire, dam, animal) < std::tie(other.sire, other.dam, other.animal);
+  }
 };
 
 Parents number_parents(const Pedigree& pedigree) {
@@ -73,7 +75,9 @@ struct Couple {
   std::int64_t pivot;
   std::int64_t mate;
   std::int64_t child;
-  auto operator<=>(const Couple&) const = default;
+  bool operator<(const Couple& other) const {
+    return std::tie(pivot, mate, child) < std::tie(other.pivot, other.mate, other.child);
+  }
 };
 
 // The two sweeps for up to kLanes pivots at a time.
@@ -117,9 +121,9 @@ class Sweeps {
     const std::int64_t nobody = parents_.nobody();
     for (std::size_t word = at(last_) / 64 + 1; word-- > 0;) {
       while (met_[word] != 0) {
-        const int bit = 63 - std::countl_zero(met_[word]);
-        met_[word] &= ~(std::uint64_t{1} << bit);
-        const auto j = static_cast<std::int64_t>(word * 64) + bit;
+        const std::uint64_t highest = std::bit_floor(met_[word]);
+        met_[word] ^= highest;
+        const auto j = static_cast<std::int64_t>(word * 64) + std::countr_zero(highest);
         ancestors_.push_back(j);
         for (const std::int64_t parent : {parents_.sire[at(j)], parents_.dam[at(j)]}) {
           if (parent == nobody) continue;

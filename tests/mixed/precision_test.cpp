@@ -60,7 +60,7 @@ class MatrixPrecision : public ::testing::Test {
     const Precision k = precision(m);
     const Eigen::Index n = m.rows();
     const Eigen::SelfAdjointEigenSolver<MatrixXd> eigen(m);
-    const VectorXd values = eigen.eigenvalues();
+    const VectorXd& values = eigen.eigenvalues();
     EXPECT_LT(values.head(nullity).cwiseAbs().sum(), 1e-10);
     ASSERT_EQ(k.nullity, nullity);
     ASSERT_EQ(k.order, n);
