@@ -21,7 +21,7 @@ namespace sm::cli {
 namespace {
 
 // What the largest step takes for each animal: names and indices, the parts of the inverse, the sweeps over parents.
-constexpr double kBytesPerAnimal = 700.0;
+constexpr double kBytesPerAnimal = 450.0;
 
 // The files that were asked for, opened before the work begins.
 struct Outputs {

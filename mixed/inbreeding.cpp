@@ -4,6 +4,7 @@
 #include <array>
 #include <bit>
 #include <span>
+#include <tuple>
 #include <utility>
 
 #include "mixed/relationship.hpp"
@@ -16,7 +17,8 @@ using Lanes = std::array<double, kLanes>;
 
 std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
-// Only parents are anybody's ancestors. They are numbered by generation; the number behind the last stands for nobody.
+// Only parents are anybody's ancestors. They are numbered by generation and within one by their own parents, so that sibs
+// and half sibs, who share ancestors, stand together; the number behind the last stands for nobody.
 struct Parents {
   std::vector<std::int64_t> number;  // of each animal; -1 for those without offspring
   std::vector<std::int64_t> sire;    // of each parent, by number
@@ -24,6 +26,15 @@ struct Parents {
   std::vector<double> mendelian;  // variances, as far as they are known
 
   std::int64_t nobody() const { return static_cast<std::int64_t>(sire.size()); }
+};
+
+struct NumberedParent {
+  std::int64_t sire;
+  std::int64_t dam;
+  std::int64_t animal;
+  bool operator<(const NumberedParent& other) const {
+    return std::tie(sire, dam, animal) < std::tie(other.sire, other.dam, other.animal);
+  }
 };
 
 Parents number_parents(const Pedigree& pedigree) {
@@ -34,19 +45,28 @@ Parents number_parents(const Pedigree& pedigree) {
       if (parent != kUnknownParent) parents.number[at(parent)] = 0;
     }
   }
-  std::int64_t count = 0;
-  for (const std::int64_t animal : pedigree.order) {
-    if (parents.number[at(animal)] == 0) parents.number[at(animal)] = count++;
-  }
+  const auto nobody = std::count(parents.number.begin(), parents.number.end(), 0);
   const auto number_of = [&](std::int64_t animal) {
-    return animal == kUnknownParent ? count : parents.number[at(animal)];
+    return animal == kUnknownParent ? nobody : parents.number[at(animal)];
   };
-  for (const std::int64_t animal : pedigree.order) {
-    if (parents.number[at(animal)] < 0) continue;
-    parents.sire.push_back(number_of(pedigree.sire[at(animal)]));
-    parents.dam.push_back(number_of(pedigree.dam[at(animal)]));
+  std::vector<NumberedParent> generation;
+  for (std::size_t i = 0; i < pedigree.order.size(); ++i) {
+    const std::int64_t animal = pedigree.order[i];
+    if (parents.number[at(animal)] >= 0) {
+      generation.push_back({number_of(pedigree.sire[at(animal)]), number_of(pedigree.dam[at(animal)]), animal});
+    }
+    const bool last = i + 1 == pedigree.order.size() ||
+                      pedigree.generation[at(pedigree.order[i + 1])] != pedigree.generation[at(animal)];
+    if (!last) continue;
+    std::sort(generation.begin(), generation.end());
+    for (const NumberedParent& parent : generation) {
+      parents.number[at(parent.animal)] = parents.nobody();
+      parents.sire.push_back(parent.sire);
+      parents.dam.push_back(parent.dam);
+    }
+    generation.clear();
   }
-  parents.mendelian.assign(at(count), 0.0);
+  parents.mendelian.assign(parents.sire.size(), 0.0);
   return parents;
 }
 
@@ -55,6 +75,9 @@ struct Couple {
   std::int64_t pivot;
   std::int64_t mate;
   std::int64_t child;
+  bool operator<(const Couple& other) const {
+    return std::tie(pivot, mate, child) < std::tie(other.pivot, other.mate, other.child);
+  }
 };
 
 // The two sweeps for up to kLanes pivots at a time.
@@ -98,9 +121,9 @@ class Sweeps {
     const std::int64_t nobody = parents_.nobody();
     for (std::size_t word = at(last_) / 64 + 1; word-- > 0;) {
       while (met_[word] != 0) {
-        const int bit = 63 - std::countl_zero(met_[word]);
-        met_[word] &= ~(std::uint64_t{1} << bit);
-        const auto j = static_cast<std::int64_t>(word * 64) + bit;
+        const std::uint64_t highest = std::bit_floor(met_[word]);
+        met_[word] ^= highest;
+        const auto j = static_cast<std::int64_t>(word * 64) + std::countr_zero(highest);
         ancestors_.push_back(j);
         for (const std::int64_t parent : {parents_.sire[at(j)], parents_.dam[at(j)]}) {
           if (parent == nobody) continue;
@@ -180,11 +203,7 @@ class Coefficients {
       if (children_[at(couple.mate)] > children_[at(couple.pivot)]) std::swap(couple.pivot, couple.mate);
     }
     for (const Couple& couple : couples_) children_[at(couple.pivot)] = children_[at(couple.mate)] = 0;
-    // Half sibs side by side share ancestors.
-    const auto key = [&](const Couple& c) {
-      return std::array{parents_.sire[at(c.pivot)], parents_.dam[at(c.pivot)], c.pivot, c.mate, c.child};
-    };
-    std::sort(couples_.begin(), couples_.end(), [&](const Couple& a, const Couple& b) { return key(a) < key(b); });
+    std::sort(couples_.begin(), couples_.end());
   }
 
   void relate() {

@@ -342,7 +342,7 @@ Ratio estimate_ratio(const RatioFunction& ratio, std::span<const VarianceCompone
       variance += at_estimates.gradient[free[i]] * covariance[i * free.size() + j] * at_estimates.gradient[free[j]];
     }
   }
-  result.se_delta = std::sqrt(std::max(variance, 0.0));
+  if (variance >= 0.0) result.se_delta = std::sqrt(variance);  // a covariance may fail to be one
   return result;
 }
 

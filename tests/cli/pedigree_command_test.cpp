@@ -124,7 +124,7 @@ TEST_F(PedigreeCommand, refuses_a_dense_matrix_that_does_not_fit_and_a_pedigree_
   EXPECT_FALSE(std::filesystem::exists(path("a.mtx")));
   EXPECT_EQ(qxsm({"pedigree", p, "--memory", "20M"}).code, 0);
   EXPECT_EQ(qxsm({"pedigree", p, "--a", path("a.mtx"), "--memory", "40M"}).code, 0);
-  expect_message(qxsm({"pedigree", p, "--memory", "1M"}), 3, {"out of memory: a pedigree of 2000 animals need"});
+  expect_message(qxsm({"pedigree", p, "--memory", "512K"}), 3, {"out of memory: a pedigree of 2000 animals need"});
 }
 
 }  // namespace

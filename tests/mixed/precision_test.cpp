@@ -6,7 +6,7 @@
 #include <cmath>
 #include <random>
 
-#include "cli/module_session.hpp"
+#include "mixed/loaded_module.hpp"
 #include "mixed/row_ids.hpp"
 
 namespace sm::mixed::test {
@@ -17,15 +17,6 @@ using Eigen::VectorXd;
 
 class MatrixPrecision : public ::testing::Test {
  protected:
-  MatrixPrecision() : session_(std::uint64_t{1} << 30) {
-    module_.instance = session_.instance();
-    module_.qxsmmd = session_.steps().qxsmmd;
-    module_.qxsmreorder = session_.steps().qxsmreorder;
-    module_.qxsmsymbfact = session_.steps().qxsmsymbfact;
-    module_.qxsmnumfact = session_.steps().qxsmnumfact;
-    module_.expect_ok = [this](SmStatus status, const std::string& doing) { session_.expect_ok(status, doing); };
-  }
-
   static SparseColumns sparse(const MatrixXd& m) {
     SparseColumns k;
     k.rows = m.rows();
@@ -40,7 +31,7 @@ class MatrixPrecision : public ::testing::Test {
     return k;
   }
 
-  Precision precision(const MatrixXd& m) { return matrix_precision(module_, sparse(m), names(m.rows())); }
+  Precision precision(const MatrixXd& m) { return matrix_precision(module_.module(), sparse(m), names(m.rows())); }
 
   static MatrixNames names(Eigen::Index rows) { return {"k.mtx", row_ids({}, rows, "")}; }
 
@@ -60,7 +51,7 @@ class MatrixPrecision : public ::testing::Test {
     const Precision k = precision(m);
     const Eigen::Index n = m.rows();
     const Eigen::SelfAdjointEigenSolver<MatrixXd> eigen(m);
-    const VectorXd values = eigen.eigenvalues();
+    const VectorXd& values = eigen.eigenvalues();
     EXPECT_LT(values.head(nullity).cwiseAbs().sum(), 1e-10);
     ASSERT_EQ(k.nullity, nullity);
     ASSERT_EQ(k.order, n);
@@ -84,8 +75,7 @@ class MatrixPrecision : public ::testing::Test {
   }
 
  private:
-  cli::ModuleSession session_;
-  Module module_;
+  LoadedModule module_;
 };
 
 // D - W of a random graph on `n` points whose edges stay within `parts` parts; weights from 0.5 to 2.

@@ -123,6 +123,8 @@ TEST(Ratio, has_a_standard_error_from_the_covariance_of_what_is_free) {
   ASSERT_TRUE(ratio.se_delta.has_value());
   EXPECT_DOUBLE_EQ(*ratio.se_delta, std::sqrt(variance));
   EXPECT_FALSE(estimate_ratio(parse_ratio("a", two), two, free, {}).se_delta.has_value());
+  const std::vector<double> indefinite{-0.5, 0.0, 0.0, 0.25};
+  EXPECT_FALSE(estimate_ratio(parse_ratio("a", two), two, free, indefinite).se_delta.has_value());
 }
 
 TEST(Ratio, that_is_not_understood_is_refused_with_the_column) {

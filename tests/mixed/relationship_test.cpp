@@ -91,6 +91,15 @@ TEST(Relationship, and_its_inverse_are_inverse_to_each_other_with_selfing) {
   }
 }
 
+// Two calves of a sire and his daughter add to the element of these two what she took from it.
+TEST(Relationship, has_an_inverse_without_elements_that_cancel) {
+  const Pedigree p = make_pedigree(rows_of("s . .  d . .  i s d  k s i  l s i"), "p.csv");
+  const Precision inverse = pedigree_precision(p, "p.csv");
+  EXPECT_EQ(dense(inverse)(0, 2), 0.0);
+  EXPECT_EQ(inverse.col.size(), 11u);
+  expect_inverse(p, 1e-14);
+}
+
 // More couples in one generation than go through the sweeps together, and couples that share sires, dams or both.
 TEST(Relationship, has_the_inbreeding_of_large_generations) {
   std::string text;
