@@ -14,11 +14,14 @@ Example: reaction times of 18 subjects, each with an intercept and a slope of it
 
   $ qxsm lmm examples/sleepstudy.csv 'reaction ~ days + (days | subject)'
   REML criterion at convergence: 1743.6283
+   subject   (Intercept)  612.0899    288.7827   24.74045
+             days          35.0717     14.7821    5.92213  0.066
+   Residual               654.9410     77.1855   25.59182
+  (Intercept)  251.4051      6.8246  17.00   36.838   < 2e-16
+  days          10.4673      1.5458  17.00    6.771  3.26e-06
   ...
 
-Example: solve A x = b for a stiffness matrix, with b = A * 1.
-
-  $ qxsm solve data/bcsstk13.mtx
+  $ qxsm solve data/bcsstk13.mtx     # a stiffness matrix, with b = A * 1
   matrix             data/bcsstk13.mtx (coordinate real symmetric)
   order              2003 x 2003
   rank               2003 of 2003
@@ -261,9 +264,12 @@ Example: does sleep deprivation slow reactions, and how much do subjects differ?
   $ qxsm lmm examples/sleepstudy.csv 'reaction ~ days + (days | subject)' --test 'day 9: 1*(Intercept) + 9*days'
   Linear mixed model fit by REML
   REML criterion at convergence: 1743.6283
+  days          10.4673      1.5458  17.00    6.771  3.26e-06
+  day 9   345.611      14.629  17.00   23.625  1.94e-14  estimable
   ...
   $ qxsm lmm examples/penicillin.csv 'diameter ~ 1 + (1 | plate) + (1 | sample)' --out fit --plot plots
   REML criterion at convergence: 330.8606
+   plate     (Intercept)  0.716908    0.226365   0.846704
   ...
   $ qxsm lmm examples/sleepstudy.csv 'reaction ~ days + (days | subject)' --dry-run
   observations    180
@@ -276,27 +282,37 @@ const char* const kReml =
     R"(Fit a model with a pedigree or another known precision
 
 As 'qxsm lmm', for terms whose levels are related: (1 | animal; pedigree) has the variance times the relationship matrix
-of --pedigree, (1 | g; name) the variance times the (Moore-Penrose) inverse of the matrix of --kinv name=K.mtx, which may
+of --pedigree, (1 | g; name) the variance times the (Moore-Penrose) inverse of the matrix of --kinv name=K.mtx. That may
 be singular, as that of an intrinsic autoregression is. Each variance over their total is printed with its standard
 error, or what --ratio asks for.
 
-Example: gains of five calves out of eight in the pedigree (far too few for an answer: the additive variance is 0).
+Example: how much of the variance is between batches; and the heritability of a trait, from a pedigree.
 
-  $ qxsm reml examples/calves.csv 'gain ~ sex + (1 | calf; pedigree)' --pedigree examples/calves_pedigree.csv
-  Linear mixed model fit by REML
+  $ qxsm reml examples/dyestuff.csv 'yield ~ 1 + (1 | batch)' --ratio 'icc = batch / (batch + residual)'
+  REML criterion at convergence: 319.6543
+   batch     (Intercept)   1764.05     1432.75    42.0006
+   Residual                2451.25      707.61    49.5101
+  icc    0.4185      0.2162
   ...
+
+  qxsm reml birds.csv 'weight ~ sex + (1 | bird; pedigree) + (1 | nest)' --pedigree birds_pedigree.csv \
+    --ratio 'h2 = bird / total'
 )";
 
 const char* const kBlup =
     R"(Predict random effects with given variances
 
-As 'qxsm reml', with the variances told and not estimated: solves the mixed-model equations for fixed and random effects,
-their standard errors, and the prediction error variances and reliabilities (--pev prints them).
+As 'qxsm reml', with the variances told and not estimated: solves the mixed-model equations for fixed and random
+effects, their standard errors, and the prediction error variances and reliabilities (--pev prints them).
 
-Example: breeding values of eight calves, with a ratio of variances of 2.
+Example: breeding values of eight calves, five of them weighed, with a ratio of variances of 2.
 
-  $ qxsm blup examples/calves.csv 'gain ~ 0 + sex + (1 | calf; pedigree)' --pedigree examples/calves_pedigree.csv --var calf=20 --var residual=40 --pev
+  $ qxsm blup examples/calves.csv 'gain ~ 0 + sex + (1 | calf; pedigree)' --pedigree examples/calves_pedigree.csv \
+      --var calf=20 --var residual=40 --pev
   Linear mixed model with given variances
+  REML criterion at these variances: 19.3092
+   1      0.0984446    4.0760    4.3409     0.057812
+   8      0.1826147    3.4820    4.1103     0.155272
   ...
 )";
 
