@@ -76,6 +76,8 @@ struct PedigreeOptions {
   std::string inbreeding;
   std::string mendelian;
   std::string ids;
+  bool report_inbreeding = false;  // of each animal
+  bool report_mendelian = false;
 };
 
 // A mixed model. Lists have an element for each time that an option was given.

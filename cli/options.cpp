@@ -249,13 +249,17 @@ void add_pedigree(CLI::App& app, Options& options) {
   PedigreeOptions& pedigree = options.pedigree;
   add_file(*command, pedigree.pedigree, "PEDIGREE.csv", "CSV or TSV file, plain or gzip;\n- is standard input");
   const auto add = [&](const char* name, std::string& path, const char* type, const char* text) {
-    command->add_option(name, path, text)->type_name(type);
+    return command->add_option(name, path, text)->type_name(type);
   };
   add("--ainv", pedigree.ainv, "AINV.mtx", "Write the inverse of A as coordinates, rows in\nthe order of the file");
   add("--a", pedigree.a, "A.mtx", "Write A itself as a symmetric array; for small\npedigrees");
-  add("--inbreeding", pedigree.inbreeding, "F.csv", "Write the inbreeding coefficient of each animal");
+  add("--inbreeding", pedigree.inbreeding, "F.csv",
+      "Write the inbreeding coefficient of each animal;\nwithout a file, report it")
+      ->expected(0, 1);
   add("--mendelian", pedigree.mendelian, "D.csv",
-      "Write the Mendelian sampling variance of each\nanimal, as a part of the additive variance");
+      "Write the Mendelian sampling variance of each\nanimal, as a part of the additive variance; without\n"
+      "a file, report it")
+      ->expected(0, 1);
   add("--ids", pedigree.ids, "IDS.txt",
       "Write the animals in the order of the rows of A,\none a line. Each result is compressed when its\n"
       "name ends in .gz; - is standard output for one\nof them, and the report then goes to standard\nerror");
@@ -340,7 +344,12 @@ void settle(const CLI::App& app, Options& options) {
   }
   options.filter = app.got_subcommand("convert") || app.got_subcommand("grid");
   if (app.got_subcommand("grid") && options.common.output.empty()) options.common.output = "-";
-  const PedigreeOptions& pedigree = options.pedigree;
+  PedigreeOptions& pedigree = options.pedigree;
+  const auto bare = [&](const char* name, const std::string& path) {
+    return app.got_subcommand("pedigree") && app.get_subcommand("pedigree")->count(name) > 0 && path.empty();
+  };
+  pedigree.report_inbreeding = bare("--inbreeding", pedigree.inbreeding);
+  pedigree.report_mendelian = bare("--mendelian", pedigree.mendelian);
   for (const std::string* path :
        {&pedigree.a, &pedigree.ainv, &pedigree.inbreeding, &pedigree.mendelian, &pedigree.ids}) {
     if (*path == "-") options.common.output = "-";

@@ -135,6 +135,32 @@ void report_inverse(Report& report, const mixed::Precision& inverse) {
              fmt::format("{} entries in its lower triangle", inverse.col.size()));
 }
 
+// What was asked for without a file: a line for each of the first animals, and all of them in JSON.
+void report_animals(Report& report, const PedigreeOptions& options, const mixed::Pedigree& pedigree,
+                    const std::vector<double>& f) {
+  if (!options.report_inbreeding && !options.report_mendelian) return;
+  constexpr std::size_t kShown = 60;
+  const std::vector<double> d =
+      options.report_mendelian ? mixed::mendelian_variances(pedigree, f) : std::vector<double>();
+  Json list = Json::array();
+  for (std::size_t i = 0; i < f.size(); ++i) {
+    Json animal{{"id", pedigree.ids[i]}};
+    std::string text;
+    if (options.report_inbreeding) {
+      animal["inbreeding"] = f[i];
+      text = fmt::format("F {}", number_text(f[i]));
+    }
+    if (options.report_mendelian) {
+      animal["mendelian_variance"] = d[i];
+      text += fmt::format("{}Mendelian variance {}", text.empty() ? "" : ", ", number_text(d[i]));
+    }
+    list.push_back(std::move(animal));
+    if (i < kShown) report.add_text("animal " + pedigree.ids[i], text);
+  }
+  if (f.size() > kShown) report.add_text("...", fmt::format("{} more; name a file for all", f.size() - kShown));
+  report.add_json("per_animal", std::move(list));
+}
+
 void report_outputs(Report& report, const Outputs& outputs) {
   const std::array<std::pair<const char*, const OutputFile*>, 5> all{{{"a", outputs.a.get()},
                                                                       {"ainv", outputs.ainv.get()},
@@ -176,6 +202,7 @@ Report run_pedigree(const PedigreeOptions& options, const CommonOptions& common,
   const mixed::Precision inverse =
       clock.timed("inverting", [&] { return mixed::relationship_inverse(pedigree, f, name); });
   report_inverse(report, inverse);
+  report_animals(report, options, pedigree, f);
   for (const std::string& note : pedigree.notes) report.add_text("note", note);
   report.add_json("notes", pedigree.notes);
   clock.timed("writing", [&] {

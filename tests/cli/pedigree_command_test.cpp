@@ -127,5 +127,17 @@ TEST_F(PedigreeCommand, refuses_a_dense_matrix_that_does_not_fit_and_a_pedigree_
   expect_message(qxsm({"pedigree", p, "--memory", "512K"}), 3, {"out of memory: a pedigree of 2000 animals need"});
 }
 
+TEST_F(PedigreeCommand, reports_each_animal_where_no_file_is_named) {
+  const std::vector<std::string> line{"pedigree", shipped("six_animals.csv"), "--inbreeding", "--mendelian"};
+  const Outcome text = qxsm(line);
+  EXPECT_EQ(text.code, 0);
+  EXPECT_EQ(text.fact("animal 5"), "F 0.125, Mendelian variance 0.5");
+  const Outcome run = qxsm({line[0], line[1], "--mendelian", "--json"});
+  const auto list = run.json().at("per_animal");
+  ASSERT_EQ(list.size(), 6u);
+  EXPECT_EQ(list.at(5).at("mendelian_variance"), 0.46875);
+  EXPECT_FALSE(list.at(5).contains("inbreeding"));
+}
+
 }  // namespace
 }  // namespace sm::test
