@@ -61,9 +61,13 @@ void ModuleSession::find_steps() {
     if (!step) fail(fmt::format("{} does not export {}", info.dli_fname, name), kReinstall);
   };
   find(steps_.qxsmmd, "qxsmmd");
+  find(steps_.qxsmorder, "qxsmorder");
   find(steps_.qxsmreorder, "qxsmreorder");
   find(steps_.qxsmsymbfact, "qxsmsymbfact");
   find(steps_.qxsmnumfact, "qxsmnumfact");
+  find(steps_.qxsmrefill, "qxsmrefill");
+  find(steps_.qxsminvpattern, "qxsminvpattern");
+  find(steps_.qxsminvdiag, "qxsminvdiag");
   find(steps_.qxsminvmultv, "qxsminvmultv");
   find(steps_.qxsmtraceinvAB, "qxsmtraceinvAB");
   find(steps_.qxsmcopyv, "qxsmcopyv");

@@ -30,11 +30,15 @@ Equations::Equations(Module& module, const ScaledDesign& design, const Gram& gra
     }
   }
   try {
+    module_.tell("assembling the equations", 0.0);
     matrix_ = assemble();
     find_places_of_last_rows();
+    // Finding an order takes some hundred operations for each entry, whatever comes of it.
+    module_.tell("ordering the equations", 300.0 * static_cast<double>(values_.size()));
     order_rows();
     module_.expect_ok(module_.qxsmreorder(matrix_), "ordering the mixed-model equations");
     module_.expect_ok(module_.qxsmsymbfact(matrix_), "finding the structure of the factor");
+    if (order_ > 0) flops_ = facts().flops;
   } catch (...) {
     if (matrix_) module_.fn().qxsmDestroyMatrix(module_.instance, &matrix_);
     throw;
@@ -174,6 +178,7 @@ bool Equations::factor(const Factors& factors, const std::vector<std::int64_t>& 
     std::vector<std::int64_t> cleared = superfluous;
     if (without_aliased_) cleared.insert(cleared.end(), aliased_unknowns_.begin(), aliased_unknowns_.end());
     refill(cleared);
+    module_.tell("factoring the equations", flops_);
     const SmStatus status = module_.qxsmnumfact(matrix_);
     if (status != SM_NOT_DEFINITE) {
       module_.expect_ok(status, "factoring the mixed-model equations");
@@ -315,6 +320,7 @@ void Equations::visit_inverse(const Constraint& constraint,
                               const std::function<void(const Block&, std::span<const double>)>& visit) {
   if (!inverse_known_) {
     inverse_.resize(values_.size());
+    module_.tell("inverting the equations", 2.0 * flops_);
     module_.expect_ok(module_.qxsminvpattern(matrix_, inverse_.data()), "inverting the mixed-model equations");
     inverse_known_ = true;
   }

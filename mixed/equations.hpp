@@ -76,6 +76,7 @@ class Equations {
   const Gram& gram_;
   Part part_;
   std::int64_t order_ = 0;
+  double flops_ = 0.0;  // of one factorization
   SmMatrix* matrix_ = nullptr;
   std::vector<std::int64_t> aliased_unknowns_;
   std::vector<std::int64_t> null_unknowns_;

@@ -33,9 +33,8 @@ struct FitOptions {
   std::int64_t max_vcov = 1000;  // columns of X up to which Fit::vcov_fixef and degrees of freedom are computed
   int max_iterations = 200;
   bool derivative_free = false;
-  bool spy = false;                                       // patterns of the equations and the factor
-  std::function<bool(const Iteration&)> progress{};       // false: stop here
-  std::function<void(const std::string& doing)> phase{};  // "ordering the equations"
+  bool spy = false;                                  // patterns of the equations and the factor
+  std::function<bool(const Iteration&)> progress{};  // false: stop here
 };
 
 // Throws ModelError for a model that cannot be fitted, and what Module::expect_ok throws.
