@@ -248,6 +248,24 @@ TEST(Plans, say_what_the_fit_finds) {
   }
 }
 
+TEST(ModelsWithoutRandomTerms, are_least_squares) {
+  LoadedModule loaded;
+  const Model model = random_model({.rows = 30, .numeric = 2, .weighted = true, .terms = {}}, 4);
+  const DenseOracle oracle(model);
+  for (const bool reml : {true, false}) {
+    const Fit fitted = fit(model, loaded.module(), {.reml = reml, .spy = true});
+    EXPECT_EQ(fitted.convergence, Convergence::converged);
+    const DenseOracle::Answer answer = oracle.answer(components(fitted), reml);
+    EXPECT_NEAR(fitted.criterion, static_cast<double>(oracle.criterion(components(fitted), reml)), 1e-10);
+    EXPECT_NEAR(static_cast<double>(oracle.slope(answer, 0, reml)), 0.0, 1e-9);
+    for (std::size_t j = 0; j < 3; ++j) {
+      EXPECT_NEAR(fitted.fixef[j].estimate, static_cast<double>(answer.beta(static_cast<Eigen::Index>(j))), 1e-10);
+      ASSERT_TRUE(fitted.fixef[j].df);
+      EXPECT_NEAR(*fitted.fixef[j].df, reml ? 27.0 : 30.0, 1e-6);
+    }
+  }
+}
+
 TEST(Searches, stop_when_they_are_told_to) {
   LoadedModule loaded;
   const Model model = random_model({.rows = 60, .terms = {kSlopes, kGroups}}, 4);
