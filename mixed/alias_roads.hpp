@@ -53,6 +53,10 @@ Dependences dense_dependences(const WeightedColumns& x);
 // memory and work that many dummies allow. `term` of each column.
 Dependences sparse_dependences(const WeightedColumns& x, const std::vector<std::int64_t>& term);
 
+// From vectors with X v = 0, one for each dependence: they are reduced until each has a last column of its own, which is
+// aliased. `sizes` of the columns of X, to tell rounding.
+Dependences last_columns(std::vector<std::vector<double>> null, const std::vector<double>& sizes);
+
 // Exact zeros and small fractions in place of what rounding made of them, where the columns bear that out.
 void tidy(const WeightedColumns& x, Dependences& found);
 

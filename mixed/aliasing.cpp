@@ -14,6 +14,7 @@ namespace {
 
 constexpr double kSlack = 1e-11;
 constexpr int kLargestDenominator = 60;
+constexpr double kSmallPart = 1e-8;  // of a null vector: rounding
 // Beyond these the columns are not held as a dense array.
 constexpr double kMostNumbers = 2e7;
 constexpr double kMostWork = 4e9;
@@ -160,6 +161,47 @@ void WeightedColumns::add(double factor, std::int64_t j, std::vector<double>& va
 }
 
 Dependences dense_dependences(const WeightedColumns& x) { return GramSchmidt(x).run(); }
+
+Dependences last_columns(std::vector<std::vector<double>> null, const std::vector<double>& sizes) {
+  for (Vector& vector : null) {
+    double largest = 0.0;
+    for (std::size_t j = 0; j < vector.size(); ++j) largest = std::max(largest, std::fabs(vector[j] *= sizes[j]));
+    for (double& value : vector) value /= largest;
+  }
+  std::vector<std::int64_t> pivot(null.size(), -1);
+  for (std::size_t j = sizes.size(); j-- > 0;) {
+    std::size_t best = null.size();
+    for (std::size_t v = 0; v < null.size(); ++v) {
+      if (pivot[v] >= 0 || std::fabs(null[v][j]) <= kSmallPart) continue;
+      if (best == null.size() || std::fabs(null[v][j]) > std::fabs(null[best][j])) best = v;
+    }
+    if (best == null.size()) continue;
+    pivot[best] = static_cast<std::int64_t>(j);
+    const double value = null[best][j];
+    for (double& part : null[best]) part /= value;
+    for (std::size_t v = 0; v < null.size(); ++v) {
+      const double part = null[v][j];
+      if (v == best || part == 0.0) continue;
+      for (std::size_t k = 0; k <= j; ++k) null[v][k] -= part * null[best][k];
+      null[v][j] = 0.0;
+    }
+  }
+  Dependences found;
+  for (std::size_t j = 0; j < sizes.size(); ++j) {
+    const bool aliased = std::find(pivot.begin(), pivot.end(), static_cast<std::int64_t>(j)) != pivot.end();
+    (aliased ? found.aliased : found.kept).push_back(static_cast<std::int64_t>(j));
+  }
+  for (const std::int64_t a : found.aliased) {
+    const Vector& vector = null[static_cast<std::size_t>(std::find(pivot.begin(), pivot.end(), a) - pivot.begin())];
+    Vector dependence;
+    for (const std::int64_t k : found.kept) {
+      const auto at = static_cast<std::size_t>(k);
+      dependence.push_back(-vector[at] * sizes[static_cast<std::size_t>(a)] / sizes[at]);
+    }
+    found.dependence.push_back(std::move(dependence));
+  }
+  return found;
+}
 
 void tidy(const WeightedColumns& x, Dependences& found) {
   Residual residual(x);
