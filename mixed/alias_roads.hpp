@@ -2,6 +2,7 @@
 #pragma once
 
 #include <cstdint>
+#include <limits>
 #include <vector>
 
 #include "mixed/model.hpp"
@@ -11,6 +12,9 @@ namespace sm::mixed {
 // What is left of a column, relative to the column, when it counts as nothing. Squares and fourth powers of years stay
 // above it, sums of columns with 15 digits below.
 constexpr double kNothing = 1e-10;
+// What rounding may leave of a combination of columns, relative to the sum of the lengths of its parts: more than the
+// above where the columns nearly cancel.
+constexpr double kRounding = 16.0 * std::numeric_limits<double>::epsilon();
 
 // The columns of X times the square roots of the weights.
 class WeightedColumns {

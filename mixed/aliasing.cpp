@@ -13,6 +13,7 @@ namespace sm::mixed {
 namespace {
 
 constexpr double kSlack = 1e-11;
+constexpr double kDoubtful = 1e-4;  // what is left of a column when it is looked at twice
 constexpr int kLargestDenominator = 60;
 constexpr double kSmallPart = 1e-8;  // of a null vector: rounding
 // Beyond these the columns are not held as a dense array.
@@ -32,7 +33,7 @@ void subtract(double factor, const Vector& b, Vector& a) {
 double nearest_fraction(double value) {
   for (int q = 1; q <= kLargestDenominator; ++q) {
     const double p = std::round(value * q);
-    if (std::fabs(value * q - p) <= 1e-8 * std::max(1.0, std::fabs(value)) && std::fabs(p) < 1e6) return p / q;
+    if (std::fabs(value * q - p) <= std::min(1e-8 * std::max(1.0, std::fabs(value)), 1e-3)) return p / q;
   }
   return value;
 }
@@ -97,11 +98,15 @@ class GramSchmidt {
     const double size = norm_of(left);
     Vector parts = project(left);
     const double rest = norm_of(left);
-    if (rest <= kNothing * size) {
-      found_.aliased.push_back(j);
-      found_.dependence.push_back(dependence(j, std::move(parts)));
-      return;
+    if (rest <= kDoubtful * size) {
+      Vector b = dependence(j, parts);
+      if (rest <= kNothing * size + kRounding * sum_of_lengths(b)) {
+        found_.aliased.push_back(j);
+        found_.dependence.push_back(std::move(b));
+        return;
+      }
     }
+    sizes_.push_back(size);
     found_.kept.push_back(j);
     for (double& value : left) value /= rest;
     directions_.push_back(std::move(left));
@@ -127,8 +132,15 @@ class GramSchmidt {
     return b;
   }
 
+  double sum_of_lengths(const Vector& b) const {
+    double sum = 0.0;
+    for (std::size_t k = 0; k < b.size(); ++k) sum += std::fabs(b[k]) * sizes_[k];
+    return sum;
+  }
+
   const WeightedColumns& x_;
   Dependences found_;
+  Vector sizes_;                    // of the kept columns
   std::vector<Vector> directions_;  // orthonormal
   std::vector<Vector> triangle_;    // column k: the parts of kept column k
 };
@@ -210,8 +222,10 @@ void tidy(const WeightedColumns& x, Dependences& found) {
   for (std::size_t a = 0; a < found.aliased.size(); ++a) {
     Vector& b = found.dependence[a];
     const double size = x.norm(found.aliased[a]);
+    double felt = kNothing * size;
+    for (std::size_t k = 0; k < b.size(); ++k) felt += kRounding * std::fabs(b[k]) * sizes[k];
     for (std::size_t k = 0; k < b.size(); ++k) {
-      if (std::fabs(b[k]) * sizes[k] <= kNothing * size) b[k] = 0.0;
+      if (std::fabs(b[k]) * sizes[k] <= felt) b[k] = 0.0;
     }
     Vector clean = b;
     for (double& value : clean) value = nearest_fraction(value);

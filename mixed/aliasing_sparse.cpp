@@ -286,7 +286,9 @@ class NullSpace {
       Vector combination = residual(static_cast<std::size_t>(j), left);
       const double rest = std::sqrt(dot(left, left));
       const GroupedColumn& column = columns_[static_cast<std::size_t>(j)];
-      if (rest * column.scale <= kNothing * column.size) {
+      double rounding = 0.0;
+      for (std::size_t k = 0; k < columns_.size(); ++k) rounding += std::fabs(combination[k]) * columns_[k].noise;
+      if (rest <= kNothing * column.size / column.scale + rounding) {
         found.push_back(std::move(combination));
         continue;
       }
