@@ -87,6 +87,7 @@ TEST(Design, codes_sum_contrasts_by_number) {
 }
 
 TEST(Design, computes_expressions_on_both_sides) {
+  EXPECT_EQ(dense(model_of(kCrossed, "y ~ I(x^3^2) + I(-x^2)").fixed.x)[1], (Numbers{1, 512, -4}));
   const Model model = model_of(kCrossed, "log(y) ~ I(x^2) + sqrt(x)*f + I(-(x - 1)/2)");
   EXPECT_EQ(model.response, "log(y)");
   EXPECT_EQ(model.y[2], std::log(3.0));
