@@ -32,6 +32,7 @@ Equations::Equations(Module& module, const ScaledDesign& design, const Gram& gra
   try {
     module_.tell("assembling the equations", 0.0);
     matrix_ = assemble();
+    find_places_of_last_rows();
     // Finding an order takes some hundred operations for each entry, whatever comes of it.
     module_.tell("ordering the equations", 300.0 * static_cast<double>(values_.size()));
     order_rows();
@@ -131,25 +132,52 @@ void Equations::fill(const Factors& factors) {
       }
     }
   });
-  if (!without_aliased_) return;
-  std::vector<bool> cleared(at(order_), false);
-  for (const std::int64_t i : aliased_unknowns_) cleared[at(i)] = true;
+}
+
+void Equations::find_places_of_last_rows() {
+  const std::vector<std::int64_t> last = last_rows();
+  last_places_.resize(last.size());
+  if (last.empty()) return;
+  std::vector<std::size_t> number(at(order_), last.size());
+  for (std::size_t i = 0; i < last.size(); ++i) number[at(last[i])] = i;
   walk_blocks(design_, gram_, part_, [&](const Block& block) {
-    if (block.s < terms || !(cleared[block.row] || cleared[block.col])) return;
-    for (std::size_t a = 0; a < block.k; ++a) values_[block.place(a, 0)] = 0.0;
+    for (std::size_t a = 0; a < block.k; ++a) {
+      for (std::size_t c = block.diagonal() ? a : 0; c < block.m; ++c) {
+        for (const std::size_t unknown : {block.row + a, block.col + c}) {
+          if (number[unknown] < last.size()) last_places_[number[unknown]].push_back(block.place(a, c));
+        }
+      }
+    }
   });
 }
 
-bool Equations::factor(const Factors& factors) {
+// Rows and columns that are cleared have a pivot of exactly zero.
+void Equations::refill(const std::vector<std::int64_t>& cleared) {
+  const std::vector<std::int64_t> last = last_rows();
+  std::vector<std::pair<std::size_t, double>> kept;
+  for (std::size_t i = 0; i < last.size(); ++i) {
+    if (std::find(cleared.begin(), cleared.end(), last[i]) == cleared.end()) continue;
+    for (const std::size_t place : last_places_[i]) {
+      kept.emplace_back(place, values_[place]);
+      values_[place] = 0.0;
+    }
+  }
+  module_.expect_ok(module_.qxsmrefill(matrix_, values_.data()), "filling the mixed-model equations");
+  for (auto entry = kept.rbegin(); entry != kept.rend(); ++entry) values_[entry->first] = entry->second;
+}
+
+bool Equations::factor(const Factors& factors, const std::vector<std::int64_t>& superfluous) {
   inverse_known_ = false;
   for (const std::vector<double>& factor : factors) {
     for (const double element : factor) {
       if (!std::isfinite(element)) return false;
     }
   }
-  for (int attempt = 0;; ++attempt) {
-    fill(factors);
-    module_.expect_ok(module_.qxsmrefill(matrix_, values_.data()), "filling the mixed-model equations");
+  fill(factors);
+  for (;;) {
+    std::vector<std::int64_t> cleared = superfluous;
+    if (without_aliased_) cleared.insert(cleared.end(), aliased_unknowns_.begin(), aliased_unknowns_.end());
+    refill(cleared);
     module_.tell("factoring the equations", flops_);
     const SmStatus status = module_.qxsmnumfact(matrix_);
     if (status != SM_NOT_DEFINITE) {

@@ -30,8 +30,9 @@ class Equations {
   Equations& operator=(const Equations&) = delete;
 
   // False when the equations are not positive semidefinite, or pivots other than those expected were dropped: then
-  // `doubt` says which. There is no factor to work with.
-  bool factor(const Factors& factors);
+  // `doubt` says which. There is no factor to work with. `superfluous`: unknowns of singular precisions whose rows are
+  // taken out.
+  bool factor(const Factors& factors, const std::vector<std::int64_t>& superfluous);
   const std::string& doubt() const { return doubt_; }
 
   double log_det() const { return log_det_; }  // of the accepted pivots
@@ -66,6 +67,8 @@ class Equations {
   void order_rows();
   std::vector<std::int64_t> last_rows() const;
   void fill(const Factors& factors);
+  void refill(const std::vector<std::int64_t>& cleared);
+  void find_places_of_last_rows();
   bool pivots_as_expected();
 
   Module& module_;
@@ -77,6 +80,7 @@ class Equations {
   SmMatrix* matrix_ = nullptr;
   std::vector<std::int64_t> aliased_unknowns_;
   std::vector<std::int64_t> null_unknowns_;
+  std::vector<std::vector<std::size_t>> last_places_;  // entries in the rows and columns of last_rows()
   bool without_aliased_ = false;  // columns of zeros stand for aliased ones, whose pivots drowned in rounding
   std::vector<double> values_;
   std::vector<double> inverse_;

@@ -17,6 +17,8 @@ Likelihood::Likelihood(Module& module, const ScaledDesign& design, bool reml)
       reml_(reml),
       degrees_(static_cast<double>(design.rows() - (reml ? design.model().fixed.rank() : 0))),
       all_(module, design, gram_, Part::all),
+      null_space_(design, all_, Part::all),
+      random_null_space_(design, all_, Part::random),
       constraint_(design),
       random_constraint_(design) {
   constants_ = -design.log_weights();
@@ -32,7 +34,7 @@ Likelihood::Likelihood(Module& module, const ScaledDesign& design, bool reml)
 
 bool Likelihood::factor_random(const Factors& factors) {
   if (!random_) random_ = std::make_unique<Equations>(module_, design_, gram_, Part::random);
-  if (!random_->factor(factors)) {
+  if (!random_->factor(factors, random_null_space_.superfluous(factors))) {
     doubt_ = random_->doubt();
     return false;
   }
@@ -43,7 +45,7 @@ bool Likelihood::factor_random(const Factors& factors) {
 CriterionParts Likelihood::evaluate(const Factors& factors, bool with_gradient) {
   ++evaluations_;
   CriterionParts parts;
-  if (!all_.factor(factors)) {
+  if (!all_.factor(factors, null_space_.superfluous(factors))) {
     doubt_ = all_.doubt();
     return parts;
   }

@@ -10,6 +10,7 @@
 
 #include "mixed/constraint.hpp"
 #include "mixed/equations.hpp"
+#include "mixed/null_space.hpp"
 
 namespace sm::mixed {
 
@@ -67,6 +68,8 @@ class Likelihood {
   double constants_ = 0.0;  // of the log-determinant
   Equations all_;
   std::unique_ptr<Equations> random_;
+  NullSpace null_space_;
+  NullSpace random_null_space_;
   Constraint constraint_;
   Constraint random_constraint_;
   Solution solved_;

@@ -20,10 +20,10 @@ class Finder {
 
   Optimum find(const Factors& start) {
     Optimum best = settle(search(Parameters(start)));
-    const bool again = options_.several_starts && likelihood_.design().unknowns() <= kCheapUnknowns;
-    for (const double scale : {0.15, 4.0}) {
-      if (!again || best.convergence == Convergence::stopped) break;
-      Optimum other = settle(search(Parameters(scaled(start, scale))));
+    if (!options_.several_starts || likelihood_.design().unknowns() > kCheapUnknowns) return best;
+    for (const Factors& other_start : other_starts(start)) {
+      if (best.convergence == Convergence::stopped) break;
+      Optimum other = settle(search(Parameters(other_start)));
       const bool lower = other.criterion < best.criterion - noise(best.criterion);
       const bool sounder = best.convergence != Convergence::converged && other.convergence == Convergence::converged &&
                            other.criterion < best.criterion + noise(best.criterion);
@@ -35,11 +35,26 @@ class Finder {
  private:
   static double noise(double criterion) { return 1e-9 * std::max(1.0, std::abs(criterion)); }
 
-  static Factors scaled(Factors factors, double scale) {
-    for (Dense& factor : factors) {
-      for (double& element : factor) element *= scale;
+  // The criterion can have several minima: small and large variances, and each term as what explains most.
+  static std::vector<Factors> other_starts(const Factors& like) {
+    std::vector<std::vector<double>> sizes;
+    for (const double size : {1.0, 0.15, 4.0}) sizes.emplace_back(like.size(), size);
+    for (std::size_t t = 0; t < like.size() && like.size() > 1; ++t) {
+      sizes.emplace_back(like.size(), 0.15);
+      sizes.back()[t] = 2.0;
     }
-    return factors;
+    std::vector<Factors> starts;
+    for (const std::vector<double>& size : sizes) {
+      Factors start;
+      for (std::size_t t = 0; t < like.size(); ++t) {
+        const std::size_t n = Parameters::order_of(like[t]);
+        Dense factor(n * n, 0.0);
+        for (std::size_t c = 0; c < n; ++c) factor[c * n + c] = size[t];
+        start.push_back(std::move(factor));
+      }
+      if (start != like) starts.push_back(std::move(start));
+    }
+    return starts;
   }
 
   Optimum search(Parameters parameters) {

@@ -2,16 +2,10 @@
 
 #include <cmath>
 
-#include "mixed/factor_algebra.hpp"
-
 namespace sm::mixed {
-namespace {
-
-std::size_t order_of(const Dense& factor) {
+std::size_t Parameters::order_of(const Dense& factor) {
   return static_cast<std::size_t>(std::lround(std::sqrt(static_cast<double>(factor.size()))));
 }
-
-}  // namespace
 
 Parameters::Parameters(const Factors& factors) : Parameters(factors, std::vector<double>(factors.size(), 0.0)) {}
 

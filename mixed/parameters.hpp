@@ -3,6 +3,7 @@
 
 #include <span>
 
+#include "mixed/factor_algebra.hpp"
 #include "mixed/scaled_design.hpp"
 
 namespace sm::mixed {
@@ -13,6 +14,8 @@ class Parameters {
   explicit Parameters(const Factors& factors);
   // Lower triangles after singular values below the limits, one for each term, are taken for zeros.
   Parameters(const Factors& factors, std::span<const double> limits);
+
+  static std::size_t order_of(const Dense& factor);
 
   std::size_t count() const { return places_.size(); }
   std::vector<double> values() const;
