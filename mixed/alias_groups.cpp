@@ -56,8 +56,12 @@ class Grouping {
       }
     }
     column.scale = norm_of(column.value);
-    column.nothing = column.scale <= kNothing * column.size;
+    double rounding = kRounding * column.size;
+    for (const auto& [k, share] : column.shares)
+      rounding += std::fabs(share) * made_[static_cast<std::size_t>(k)].noise;
+    column.nothing = column.scale <= kNothing * column.size + rounding;
     if (column.nothing) column.scale = 1.0;
+    column.noise = rounding / column.scale;
     for (double& value : column.value) value = column.nothing ? 0.0 : value / column.scale;
     made_.push_back(std::move(column));
   }

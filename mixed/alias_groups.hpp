@@ -18,6 +18,7 @@ struct GroupedColumn {
   double size = 0.0;              // the norm of the column itself
   double scale = 0.0;             // value * scale = column - sum of share * (grouped column as it stands)
   std::vector<std::pair<std::int64_t, double>> shares;
+  double noise = 0.0;    // rounding in `value`
   bool nothing = false;  // what is left is rounding: the column depends on the shares alone
 
   template <class Visit>

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <cstdint>
+#include <limits>
 #include <vector>
 
 #include "mixed/model.hpp"
@@ -11,6 +12,9 @@ namespace sm::mixed {
 // What is left of a column, relative to the column, when it counts as nothing. Squares and fourth powers of years stay
 // above it, sums of columns with 15 digits below.
 constexpr double kNothing = 1e-10;
+// What rounding may leave of a combination of columns, relative to the sum of the lengths of its parts: more than the
+// above where the columns nearly cancel.
+constexpr double kRounding = 16.0 * std::numeric_limits<double>::epsilon();
 
 // The columns of X times the square roots of the weights.
 class WeightedColumns {
@@ -52,6 +56,10 @@ Dependences dense_dependences(const WeightedColumns& x);
 // By the normal equations of columns that are orthogonal by groups, and the columns themselves where those are in doubt:
 // memory and work that many dummies allow. `term` of each column.
 Dependences sparse_dependences(const WeightedColumns& x, const std::vector<std::int64_t>& term);
+
+// From vectors with X v = 0, one for each dependence: they are reduced until each has a last column of its own, which is
+// aliased. `sizes` of the columns of X, to tell rounding.
+Dependences last_columns(std::vector<std::vector<double>> null, const std::vector<double>& sizes);
 
 // Exact zeros and small fractions in place of what rounding made of them, where the columns bear that out.
 void tidy(const WeightedColumns& x, Dependences& found);

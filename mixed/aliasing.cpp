@@ -13,7 +13,9 @@ namespace sm::mixed {
 namespace {
 
 constexpr double kSlack = 1e-11;
+constexpr double kDoubtful = 1e-4;  // what is left of a column when it is looked at twice
 constexpr int kLargestDenominator = 60;
+constexpr double kSmallPart = 1e-8;  // of a null vector: rounding
 // Beyond these the columns are not held as a dense array.
 constexpr double kMostNumbers = 2e7;
 constexpr double kMostWork = 4e9;
@@ -31,7 +33,7 @@ void subtract(double factor, const Vector& b, Vector& a) {
 double nearest_fraction(double value) {
   for (int q = 1; q <= kLargestDenominator; ++q) {
     const double p = std::round(value * q);
-    if (std::fabs(value * q - p) <= 1e-8 * std::max(1.0, std::fabs(value)) && std::fabs(p) < 1e6) return p / q;
+    if (std::fabs(value * q - p) <= std::min(1e-8 * std::max(1.0, std::fabs(value)), 1e-3)) return p / q;
   }
   return value;
 }
@@ -96,11 +98,15 @@ class GramSchmidt {
     const double size = norm_of(left);
     Vector parts = project(left);
     const double rest = norm_of(left);
-    if (rest <= kNothing * size) {
-      found_.aliased.push_back(j);
-      found_.dependence.push_back(dependence(j, std::move(parts)));
-      return;
+    if (rest <= kDoubtful * size) {
+      Vector b = dependence(j, parts);
+      if (rest <= kNothing * size + kRounding * sum_of_lengths(b)) {
+        found_.aliased.push_back(j);
+        found_.dependence.push_back(std::move(b));
+        return;
+      }
     }
+    sizes_.push_back(size);
     found_.kept.push_back(j);
     for (double& value : left) value /= rest;
     directions_.push_back(std::move(left));
@@ -126,8 +132,15 @@ class GramSchmidt {
     return b;
   }
 
+  double sum_of_lengths(const Vector& b) const {
+    double sum = 0.0;
+    for (std::size_t k = 0; k < b.size(); ++k) sum += std::fabs(b[k]) * sizes_[k];
+    return sum;
+  }
+
   const WeightedColumns& x_;
   Dependences found_;
+  Vector sizes_;                    // of the kept columns
   std::vector<Vector> directions_;  // orthonormal
   std::vector<Vector> triangle_;    // column k: the parts of kept column k
 };
@@ -161,6 +174,47 @@ void WeightedColumns::add(double factor, std::int64_t j, std::vector<double>& va
 
 Dependences dense_dependences(const WeightedColumns& x) { return GramSchmidt(x).run(); }
 
+Dependences last_columns(std::vector<std::vector<double>> null, const std::vector<double>& sizes) {
+  for (Vector& vector : null) {
+    double largest = 0.0;
+    for (std::size_t j = 0; j < vector.size(); ++j) largest = std::max(largest, std::fabs(vector[j] *= sizes[j]));
+    for (double& value : vector) value /= largest;
+  }
+  std::vector<std::int64_t> pivot(null.size(), -1);
+  for (std::size_t j = sizes.size(); j-- > 0;) {
+    std::size_t best = null.size();
+    for (std::size_t v = 0; v < null.size(); ++v) {
+      if (pivot[v] >= 0 || std::fabs(null[v][j]) <= kSmallPart) continue;
+      if (best == null.size() || std::fabs(null[v][j]) > std::fabs(null[best][j])) best = v;
+    }
+    if (best == null.size()) continue;
+    pivot[best] = static_cast<std::int64_t>(j);
+    const double value = null[best][j];
+    for (double& part : null[best]) part /= value;
+    for (std::size_t v = 0; v < null.size(); ++v) {
+      const double part = null[v][j];
+      if (v == best || part == 0.0) continue;
+      for (std::size_t k = 0; k <= j; ++k) null[v][k] -= part * null[best][k];
+      null[v][j] = 0.0;
+    }
+  }
+  Dependences found;
+  for (std::size_t j = 0; j < sizes.size(); ++j) {
+    const bool aliased = std::find(pivot.begin(), pivot.end(), static_cast<std::int64_t>(j)) != pivot.end();
+    (aliased ? found.aliased : found.kept).push_back(static_cast<std::int64_t>(j));
+  }
+  for (const std::int64_t a : found.aliased) {
+    const Vector& vector = null[static_cast<std::size_t>(std::find(pivot.begin(), pivot.end(), a) - pivot.begin())];
+    Vector dependence;
+    for (const std::int64_t k : found.kept) {
+      const auto at = static_cast<std::size_t>(k);
+      dependence.push_back(-vector[at] * sizes[static_cast<std::size_t>(a)] / sizes[at]);
+    }
+    found.dependence.push_back(std::move(dependence));
+  }
+  return found;
+}
+
 void tidy(const WeightedColumns& x, Dependences& found) {
   Residual residual(x);
   Vector sizes;
@@ -168,8 +222,10 @@ void tidy(const WeightedColumns& x, Dependences& found) {
   for (std::size_t a = 0; a < found.aliased.size(); ++a) {
     Vector& b = found.dependence[a];
     const double size = x.norm(found.aliased[a]);
+    double felt = kNothing * size;
+    for (std::size_t k = 0; k < b.size(); ++k) felt += kRounding * std::fabs(b[k]) * sizes[k];
     for (std::size_t k = 0; k < b.size(); ++k) {
-      if (std::fabs(b[k]) * sizes[k] <= kNothing * size) b[k] = 0.0;
+      if (std::fabs(b[k]) * sizes[k] <= felt) b[k] = 0.0;
     }
     Vector clean = b;
     for (double& value : clean) value = nearest_fraction(value);

@@ -25,7 +25,6 @@ constexpr std::int64_t kBlockRows = 512;
 constexpr std::int64_t kMostDense = 8000;
 constexpr int kRefinements = 3;
 constexpr double kUnfelt = 1e-14;
-constexpr double kSmallPart = 1e-8;  // of a null vector: rounding
 
 double dot(const Vector& a, const Vector& b) { return std::inner_product(a.begin(), a.end(), b.begin(), 0.0); }
 
@@ -287,7 +286,9 @@ class NullSpace {
       Vector combination = residual(static_cast<std::size_t>(j), left);
       const double rest = std::sqrt(dot(left, left));
       const GroupedColumn& column = columns_[static_cast<std::size_t>(j)];
-      if (rest * column.scale <= kNothing * column.size) {
+      double rounding = 0.0;
+      for (std::size_t k = 0; k < columns_.size(); ++k) rounding += std::fabs(combination[k]) * columns_[k].noise;
+      if (rest <= kNothing * column.size / column.scale + rounding) {
         found.push_back(std::move(combination));
         continue;
       }
@@ -350,48 +351,6 @@ class NullSpace {
   std::vector<Vector> directions_;    // orthonormal, behind the believed columns
   std::vector<Vector> combinations_;  // of the columns, which make them
 };
-
-// Reduces the null vectors until each has a last column of its own, which is aliased.
-Dependences last_columns(std::vector<Vector> null, const Vector& sizes) {
-  for (Vector& vector : null) {
-    double largest = 0.0;
-    for (std::size_t j = 0; j < vector.size(); ++j) largest = std::max(largest, std::fabs(vector[j] *= sizes[j]));
-    for (double& value : vector) value /= largest;
-  }
-  std::vector<std::int64_t> pivot(null.size(), -1);
-  for (std::size_t j = sizes.size(); j-- > 0;) {
-    std::size_t best = null.size();
-    for (std::size_t v = 0; v < null.size(); ++v) {
-      if (pivot[v] >= 0 || std::fabs(null[v][j]) <= kSmallPart) continue;
-      if (best == null.size() || std::fabs(null[v][j]) > std::fabs(null[best][j])) best = v;
-    }
-    if (best == null.size()) continue;
-    pivot[best] = static_cast<std::int64_t>(j);
-    const double value = null[best][j];
-    for (double& part : null[best]) part /= value;
-    for (std::size_t v = 0; v < null.size(); ++v) {
-      const double part = null[v][j];
-      if (v == best || part == 0.0) continue;
-      for (std::size_t k = 0; k <= j; ++k) null[v][k] -= part * null[best][k];
-      null[v][j] = 0.0;
-    }
-  }
-  Dependences found;
-  for (std::size_t j = 0; j < sizes.size(); ++j) {
-    const bool aliased = std::find(pivot.begin(), pivot.end(), static_cast<std::int64_t>(j)) != pivot.end();
-    (aliased ? found.aliased : found.kept).push_back(static_cast<std::int64_t>(j));
-  }
-  for (const std::int64_t a : found.aliased) {
-    const Vector& vector = null[static_cast<std::size_t>(std::find(pivot.begin(), pivot.end(), a) - pivot.begin())];
-    Vector dependence;
-    for (const std::int64_t k : found.kept) {
-      const auto at = static_cast<std::size_t>(k);
-      dependence.push_back(-vector[at] * sizes[static_cast<std::size_t>(a)] / sizes[at]);
-    }
-    found.dependence.push_back(std::move(dependence));
-  }
-  return found;
-}
 
 }  // namespace
 

@@ -20,9 +20,9 @@ double step_of(const std::vector<double>& ticks) { return ticks.size() > 1 ? tic
 std::vector<double> power_ticks(Range range, int count) {
   const double stride = std::max(1.0, std::ceil((range.hi - range.lo) / std::max(count, 1)));
   std::vector<double> ticks;
-  for (double power = std::ceil(range.lo / stride) * stride; power <= range.hi; power += stride) {
-    ticks.push_back(power + 0.0);  // never the zero with a sign
-  }
+  const double first = std::ceil(range.lo / stride) * stride;
+  const int last = static_cast<int>(std::floor((range.hi - first) / stride));
+  for (int i = 0; i <= last; ++i) ticks.push_back(first + i * stride + 0.0);  // never the zero with a sign
   return ticks;
 }
 
@@ -66,8 +66,11 @@ std::vector<double> nice_ticks(Range range, int count) {
   std::vector<double> ticks;
   const double slack = 1e-9;
   const double first = std::ceil(range.lo / step - slack);
-  const double last = std::floor(range.hi / step + slack);
-  for (double k = first; k <= last; k += 1.0) ticks.push_back(k == 0.0 ? 0.0 : k * step);
+  const int more = static_cast<int>(std::floor(range.hi / step + slack) - first);
+  for (int i = 0; i <= more; ++i) {
+    const double k = first + i;
+    ticks.push_back(k == 0.0 ? 0.0 : k * step);
+  }
   return ticks;
 }
 

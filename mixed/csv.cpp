@@ -47,15 +47,19 @@ class FieldWalk {
  public:
   FieldWalk(const CsvRow& row, char delimiter) : row_(row), delimiter_(delimiter), place_{row.line, 1} {}
   CsvPlace place() const { return place_; }
-  CsvPlace last_quote() const { return last_quote_; }  // the last one that opened or closed
+  CsvPlace last_quote() const { return last_quote_; }  // the last one that opened a field
 
   bool next_field() {
     bool quoted = false;
+    bool closed = false;
     for (; at_ < row_.source.size(); ++at_) {
       const char c = row_.source[at_];
       if (c == '"') {
-        if (!quoted) last_quote_ = place_;
+        if (!quoted && !closed) last_quote_ = place_;  // one that follows a closing quote is doubled
+        closed = quoted;
         quoted = !quoted;
+      } else {
+        closed = false;
       }
       const bool line_feed = c == '\n' || c == '\r';
       if (!quoted && line_feed) return false;

@@ -1,6 +1,7 @@
 #include "mixed/folder.hpp"
 
 #include <fcntl.h>
+#include <fmt/format.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -17,6 +18,8 @@ namespace {
 
 constexpr int kMode = 0666;
 constexpr const char* kAdvice = "check the folder's permissions and the free space";
+
+std::string path_of(const std::string& folder, const std::string& name) { return fmt::format("{}/{}", folder, name); }
 
 std::string system_text(int error_number) { return std::generic_category().message(error_number); }
 
@@ -35,10 +38,10 @@ std::string system_text(int error_number) { return std::generic_category().messa
 // A file that is not there until it is published.
 class HiddenFile {
  public:
-  HiddenFile(const std::string& folder, const std::string& name) : path_(folder + "/" + name) {
+  HiddenFile(const std::string& folder, const std::string& name) : path_(path_of(folder, name)) {
     constexpr int kTries = 100;
     for (int i = 0; i < kTries && file_ < 0; ++i) {
-      temporary_ = folder + "/." + name + "." + std::to_string(::getpid()) + "." + std::to_string(i);
+      temporary_ = fmt::format("{}/.{}.{}.{}", folder, name, ::getpid(), i);
       file_ = ::open(temporary_.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kMode);
       if (file_ < 0 && errno != EEXIST) break;
     }
@@ -113,13 +116,13 @@ void write_files(const std::string& folder, const std::vector<NamedText>& files,
   std::vector<HiddenFile> hidden;
   hidden.reserve(files.size());
   for (const NamedText& file : files) {
-    refuse_folder_in_the_way(folder + "/" + file.name);
+    refuse_folder_in_the_way(path_of(folder, file.name));
     hidden.emplace_back(folder, file.name);
     hidden.back().write(file.text);
   }
   for (HiddenFile& file : hidden) file.publish();
   for (const std::string& name : outdated) {
-    const std::string path = folder + "/" + name;
+    const std::string path = path_of(folder, name);
     if (::unlink(path.c_str()) != 0 && errno != ENOENT) {
       refuse(path, "is of an earlier fit and cannot be removed (" + system_text(errno) + ")", "remove it yourself");
     }

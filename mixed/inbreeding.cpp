@@ -17,8 +17,8 @@ using Lanes = std::array<double, kLanes>;
 
 std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
-// Only parents are anybody's ancestors. They are numbered by generation and within one by their own parents, so that sibs
-// and half sibs, who share ancestors, stand together; the number behind the last stands for nobody.
+// Only parents are anybody's ancestors. They are numbered by generation and within one by their own parents, so that
+// sibs and half sibs, who share ancestors, stand together; the number behind the last stands for nobody.
 struct Parents {
   std::vector<std::int64_t> number;  // of each animal; -1 for those without offspring
   std::vector<std::int64_t> sire;    // of each parent, by number

@@ -32,8 +32,8 @@ struct Pedigree {
 // Empty, NA, 0 and a point stand for nobody.
 bool is_unknown_animal(std::string_view id);
 
-// Rows in any order. Throws ModelError, naming `file` and the line, for a row without an id, an id that has two rows, an
-// animal that is its own parent, and animals that descend from themselves, which are named in order.
+// Rows in any order. Throws ModelError, naming `file` and the line, for a row without an id, an id that has two rows,
+// an animal that is its own parent, and animals that descend from themselves, which are named in order.
 Pedigree make_pedigree(const std::vector<PedigreeRow>& rows, const std::string& file);
 
 }  // namespace sm::mixed

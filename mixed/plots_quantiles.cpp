@@ -110,8 +110,9 @@ std::string quantile_plot(const Model& model, const Fit& fit) {
                      "Normal quantiles");
   header(canvas, "Normal quantiles", model, fit);
   for (std::size_t i = 0; i < samples.size(); ++i) {
-    draw(canvas, samples[i], static_cast<double>(i % across) * kColumn,
-         kHeader + static_cast<double>(i / across) * kRow);
+    const auto column = static_cast<double>(i % across);
+    const std::size_t row = i / across;
+    draw(canvas, samples[i], column * kColumn, kHeader + static_cast<double>(row) * kRow);
   }
   return canvas.finished();
 }

@@ -24,10 +24,11 @@ struct MatrixNames {
 };
 
 // A precision from the whole matrix, both triangles, rows ascending in each column. Factors it in the module for its
-// rank, and finds what spans its null space. Throws ModelError when it is not square and symmetric, and NotSemidefinite.
+// rank, and finds what spans its null space. Throws ModelError when it is not square and symmetric, and
+// NotSemidefinite.
 //
-// A row d that the factor drops is a combination of the accepted rows S, so that x with x_d = 1, x_S = -K_SS^-1 K_Sd and
-// zeros in the other dropped places is a null vector. With these in B, the product of the nonzero eigenvalues is
+// A row d that the factor drops is a combination of the accepted rows S, so that x with x_d = 1, x_S = -K_SS^-1 K_Sd
+// and zeros in the other dropped places is a null vector. With these in B, the product of the nonzero eigenvalues is
 // |K_SS| |B'B|.
 Precision matrix_precision(const Module& module, const SparseColumns& k, const MatrixNames& names);
 

@@ -40,7 +40,8 @@ class RatioFunction {
 // "h2 = animal / (animal + residual)", or without a name, for which the text then stands. What can be added,
 // subtracted, multiplied and divided: numbers; a group with one variance; group[term] and the covariance
 // group[term, term]; residual; total, the sum of all variances. Names with other characters than letters, digits and
-// . _ : stand in backquotes. Only the names of the components are looked at. Throws ModelError with the column of `text`.
+// . _ : stand in backquotes. Only the names of the components are looked at. Throws ModelError with the column of
+// `text`.
 RatioFunction parse_ratio(const std::string& text, std::span<const VarianceComponent> components);
 
 // What is told when nothing is asked: "animal / total" for each variance but the residual one.

@@ -94,15 +94,23 @@ std::string sizes(const Model& model, const Fit& fit) {
     // (x || g) makes several terms of one factor.
     const std::string& group = model.random[i].group;
     const auto same = [&](const RandomTerm& term) {
-      return term.group == group && term.levels.size() == model.random[i].levels.size();
+      return term.group == group && term.known == model.random[i].known &&
+             term.levels.size() == model.random[i].levels.size();
     };
     const auto here = model.random.begin() + static_cast<std::ptrdiff_t>(i);
     if (std::find_if(model.random.begin(), here, same) != here) continue;
     text += fmt::format("{} {} {}", i == 0 ? "; levels:" : ",", shown_name(group), model.random[i].levels.size());
+    if (!model.random[i].known.empty()) text += fmt::format(" (with {})", shown_name(model.random[i].known));
   }
   std::string out = labelled("Observations:", text);
   if (model.rows_dropped > 0) {
-    out += count_text(model.rows_dropped, "row was", "rows were") + " left out for missing values\n";
+    std::string where;
+    for (const auto& [name, count] : model.missing) {
+      where += fmt::format("{}{} {}", where.empty() ? " (" : ", ", shown_name(name), count);
+    }
+    if (!where.empty()) where += ")";
+    out += wrapped(count_text(model.rows_dropped, "row was", "rows were") + " left out for missing values" + where,
+                   kWidth, 4);
   }
   return out;
 }

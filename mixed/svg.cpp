@@ -59,7 +59,7 @@ double text_width(std::string_view text, double size) {
 }
 
 std::string fitted(std::string_view text, double size, double width) {
-  const std::string shown = printable(text);
+  std::string shown = printable(text);
   if (text_width(shown, size) <= width) return shown;
   std::vector<std::string_view> characters;
   for (std::string_view rest = shown; !rest.empty();) {

@@ -110,6 +110,76 @@ TEST(Aliasing, keeps_years_and_their_squares_and_cubes_beside_an_intercept) {
   EXPECT_EQ(found.kept.size(), 4u);
 }
 
+TEST(Aliasing, sees_powers_of_years_in_those_of_years_less_a_constant) {
+  Matrix x(31, 6);
+  for (Eigen::Index i = 0; i < 31; ++i) {
+    const double year = 1990.0 + static_cast<double>(i);
+    const double t = year - 2000.0;
+    x.row(i) << 1.0, year, year * year, year * year * year, t * t, t * t * t;
+  }
+  FixedDesign design = design_of(x);
+  find_aliased(design, {});
+  EXPECT_EQ(design.aliased, (std::vector<std::int64_t>{4, 5}));
+  EXPECT_EQ(std::vector<double>(design.dependence.begin(), design.dependence.begin() + 4),
+            (std::vector<double>{4e6, -4000.0, 1.0, 0.0}));
+  Dependences found = sparse_dependences(WeightedColumns(design.x, {}), std::vector<std::int64_t>(6, 0));
+  EXPECT_EQ(found.aliased, (std::vector<std::int64_t>{4, 5}));
+}
+
+TEST(Aliasing, allows_for_the_rounding_of_columns_that_nearly_cancel) {
+  Matrix x(31, 5);
+  for (Eigen::Index i = 0; i < 31; ++i) {
+    const double t = 0.1 * static_cast<double>((i * 7) % 31);
+    const double time = t + 300.7;
+    x.row(i) << 1.0, time, time * time, time * time * time, t * t * t;
+  }
+  const SparseColumns columns = sparse(x);
+  const WeightedColumns weighted(columns, {});
+  for (const Dependences& found : {dense_dependences(weighted), sparse_dependences(weighted, {0, 1, 2, 3, 4})}) {
+    EXPECT_EQ(found.aliased, (std::vector<std::int64_t>{4}));
+  }
+}
+
+TEST(Aliasing, keeps_powers_of_years_within_many_groups_and_sees_those_of_all_together) {
+  constexpr Eigen::Index kGroups = 12;
+  Matrix x = Matrix::Zero(31 * kGroups, 4 * kGroups + 4);
+  std::vector<std::int64_t> term;
+  for (Eigen::Index j = 0; j < x.cols(); ++j) term.push_back(j / kGroups);
+  for (Eigen::Index i = 0; i < x.rows(); ++i) {
+    const double year = 1990.0 + static_cast<double>(i / kGroups);
+    double power = 1.0;
+    for (Eigen::Index p = 0; p < 4; ++p, power *= year) {
+      x(i, p * kGroups + i % kGroups) = power;
+      x(i, 4 * kGroups + p) = power;
+    }
+  }
+  const SparseColumns columns = sparse(x);
+  for (Dependences found :
+       {dense_dependences(WeightedColumns(columns, {})), sparse_dependences(WeightedColumns(columns, {}), term)}) {
+    EXPECT_EQ(found.aliased, (std::vector<std::int64_t>{48, 49, 50, 51}));
+    tidy(WeightedColumns(columns, {}), found);
+    for (std::size_t k = 0; k < 48; ++k) EXPECT_EQ(found.dependence[2][k], k / kGroups == 2 ? 1.0 : 0.0) << k;
+  }
+}
+
+TEST(Aliasing, allows_for_that_rounding_in_sums_over_many_groups) {
+  constexpr Eigen::Index kGroups = 12;
+  Matrix x = Matrix::Zero(31 * kGroups, 4 * kGroups + 1);
+  std::vector<std::int64_t> term;
+  for (Eigen::Index j = 0; j < x.cols(); ++j) term.push_back(j / kGroups);
+  for (Eigen::Index i = 0; i < x.rows(); ++i) {
+    const double t = 0.1 * static_cast<double>((i / kGroups * 7 + i) % 31);
+    double power = 1.0;
+    for (Eigen::Index p = 0; p < 4; ++p, power *= t + 300.7) x(i, p * kGroups + i % kGroups) = power;
+    x(i, 4 * kGroups) = t * t * t;
+  }
+  const SparseColumns columns = sparse(x);
+  for (const Dependences& found :
+       {dense_dependences(WeightedColumns(columns, {})), sparse_dependences(WeightedColumns(columns, {}), term)}) {
+    EXPECT_EQ(found.aliased, (std::vector<std::int64_t>{4 * kGroups}));
+  }
+}
+
 TEST(Aliasing, names_the_last_of_a_dependent_set_with_small_fractions) {
   // The classes of age by their dummies, the first left out, beside age itself.
   Matrix x = Matrix::Zero(12, 5);

@@ -47,6 +47,20 @@ TEST(Design, codes_a_factor_by_dummies_where_its_margin_is_absent) {
   EXPECT_EQ(names("y ~ f + f:x"), (Strings{"(Intercept)", "fb", "fa:x", "fb:x"}));
 }
 
+TEST(Design, puts_each_row_of_an_interaction_into_the_column_of_its_levels) {
+  for (const char* formula : {"y ~ 0 + f:g", "y ~ 0 + g:f"}) {
+    const Model model = model_of(kCrossed, formula);
+    const Strings cells = formula == std::string("y ~ 0 + f:g")
+                              ? Strings{"fb:gq", "fa:gp", "fb:gr", "fa:gq", "fb:gp", "fa:gr"}
+                              : Strings{"gq:fb", "gp:fa", "gr:fb", "gq:fa", "gp:fb", "gr:fa"};
+    const Rows x = dense(model.fixed.x);
+    for (std::size_t i = 0; i < x.size(); ++i) {
+      for (std::size_t j = 0; j < 6; ++j)
+        EXPECT_EQ(x[i][j], model.fixed.names[j] == cells[i % 6] ? 1.0 : 0.0) << i << j;
+    }
+  }
+}
+
 TEST(Design, gives_the_first_factor_all_its_dummies_without_an_intercept) {
   EXPECT_EQ(names("y ~ 0 + f + g"), (Strings{"fa", "fb", "gq", "gr"}));
   EXPECT_EQ(names("y ~ 0 + x + f + g"), (Strings{"x", "fa", "fb", "gq", "gr"}));
@@ -73,6 +87,7 @@ TEST(Design, codes_sum_contrasts_by_number) {
 }
 
 TEST(Design, computes_expressions_on_both_sides) {
+  EXPECT_EQ(dense(model_of(kCrossed, "y ~ I(x^3^2) + I(-x^2)").fixed.x)[1], (Numbers{1, 512, -4}));
   const Model model = model_of(kCrossed, "log(y) ~ I(x^2) + sqrt(x)*f + I(-(x - 1)/2)");
   EXPECT_EQ(model.response, "log(y)");
   EXPECT_EQ(model.y[2], std::log(3.0));

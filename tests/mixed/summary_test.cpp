@@ -134,6 +134,17 @@ TEST(Summary, counts_a_grouping_factor_of_several_terms_once) {
   EXPECT_TRUE(has(summary(e.model, e.fit), "\nObservations: 4; levels: g 3, h 3\n"));
 }
 
+TEST(Summary, names_a_known_precision_and_the_variables_with_missing_values) {
+  Example e = example_fit();
+  e.model.random.push_back(e.model.random[0]);
+  e.model.random[0].known = "pedigree";
+  e.model.rows_dropped = 3;
+  e.model.missing = {{"x", 2}, {"y", 1}};
+  EXPECT_TRUE(has(summary(e.model, e.fit),
+                  "\nObservations: 4; levels: g 3 (with pedigree), g 3\n"
+                  "3 rows were left out for missing values (x 2, y 1)\n"));
+}
+
 TEST(Summary, numbers_the_correlations_of_names_that_begin_alike) {
   Example e = example_fit();
   e.fit.fixef[1].name = "Variety of oats 1";

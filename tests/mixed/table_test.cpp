@@ -127,6 +127,7 @@ TEST(Table, refuses_headers_without_a_name_of_its_own_for_each_column) {
 
 TEST(Table, refuses_quotes_that_are_open_or_misplaced) {
   expect_fault("a,b\n1,\"x\n2,y\n3,z\n", 2, 3, "never closed");
+  expect_fault("a,b\n1,\"x\"\"y\n", 2, 3, "never closed");
   expect_fault("a,b\n1,x\"y\n", 2, 4, "quote inside a field");
   expect_fault("a,b\n1,\"x\"y\n", 2, 6, "behind the closing quote");
 }
