@@ -168,6 +168,7 @@ void Equations::refill(const std::vector<std::int64_t>& cleared) {
 
 bool Equations::factor(const Factors& factors, const std::vector<std::int64_t>& superfluous) {
   inverse_known_ = false;
+  if (order_ == 0) return true;  // a model without random terms, or without anything
   for (const std::vector<double>& factor : factors) {
     for (const double element : factor) {
       if (!std::isfinite(element)) return false;
@@ -318,6 +319,7 @@ Factors Equations::log_det_gradient(const Factors& factors, const Constraint& co
 
 void Equations::visit_inverse(const Constraint& constraint,
                               const std::function<void(const Block&, std::span<const double>)>& visit) {
+  if (order_ == 0) return;
   if (!inverse_known_) {
     inverse_.resize(values_.size());
     module_.tell("inverting the equations", 2.0 * flops_);
