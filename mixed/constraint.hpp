@@ -33,7 +33,6 @@ class Constraint {
   };
   std::vector<double> products(std::span<const double> x) const;  // A' x for one vector
 
-  const ScaledDesign& design_;
   std::vector<NullVector> vectors_;
   double log_det_ = 0.0;
   std::size_t order_ = 0;

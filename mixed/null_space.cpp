@@ -62,6 +62,7 @@ NullSpace::NullSpace(const ScaledDesign& design, Equations& equations, Part part
   }
   if (view.empty()) return;
   std::vector<double> length;
+  length.reserve(view.size());
   for (const std::vector<double>& column : view) length.push_back(dot(design, column, column));
   if (part == Part::all) take_fixed_effects_out(design, equations, view);
   const auto count = static_cast<Eigen::Index>(view.size());
