@@ -236,6 +236,7 @@ std::vector<mixed::RatioRequest> ratio_requests(const std::vector<std::string>& 
   for (const std::string& text : texts) functions.push_back(mixed::parse_ratio(text, components));
   if (texts.empty() && defaults) functions = mixed::default_ratios(components);
   std::vector<mixed::RatioRequest> requests;
+  requests.reserve(functions.size());
   for (mixed::RatioFunction& function : functions) {
     std::string name = function.name();
     requests.push_back(
