@@ -41,7 +41,7 @@ const Naming& naming_of(Ordering ordering) {
 [[noreturn]] void refuse_memory(const char* library) {
   throw CommandError({.code = ExitCode::no_memory,
                       .what = fmt::format("out of memory while ordering the matrix with {}", library),
-                      .advice = "use --ordering md, which needs less, or a machine with more memory"});
+                      .advice = "use --ordering md, or a machine with more memory"});
 }
 
 [[noreturn]] void refuse_status(const char* library, std::int64_t status) {
@@ -67,7 +67,7 @@ std::vector<std::int64_t> order_naturally(std::int64_t n) {
 std::vector<std::int64_t> order_by_amd(const UpperPattern& upper, std::uint64_t limit) {
   // As its manual counts: a copy of the graph with a fifth to spare, and nine words a row.
   const double words = 1.2 * static_cast<double>(count_neighbours(upper)) + 10.0 * static_cast<double>(upper.n);
-  require_memory(8.0 * words, limit, "ordering with AMD");
+  require_memory(8.0 * words, limit, "the graph for AMD and its work");
   std::vector<std::int64_t> perm(at(upper.n));
   const std::int64_t status = amd_l_order(upper.n, upper.start, upper.col, perm.data(), nullptr, nullptr);
   if (status == AMD_OUT_OF_MEMORY) refuse_memory("AMD");
@@ -110,9 +110,9 @@ std::vector<std::int64_t> order_by_metis(const UpperPattern& upper, std::uint64_
   if (const std::string why = metis_refusal(upper.n, neighbours); !why.empty()) {
     throw CommandError({.what = why, .advice = "use --ordering amd or --ordering md"});
   }
-  // The graph, and for each vertex and each neighbour what METIS was seen to take beside it.
-  const double words = kMetisWordsPerRow * static_cast<double>(upper.n) + kMetisWordsPerNeighbour * static_cast<double>(neighbours);
-  require_memory(static_cast<double>(sizeof(idx_t)) * words, limit, "ordering with METIS");
+  // The graph and the order; beside them METIS was measured to take five words a neighbour and as many a row on grids.
+  const double words = 9.0 * static_cast<double>(upper.n) + 6.0 * static_cast<double>(neighbours);
+  require_memory(static_cast<double>(sizeof(idx_t)) * words, limit, "the graph for METIS and its work");
   Graph graph = graph_of(upper, neighbours);
   auto n = static_cast<idx_t>(upper.n);
   std::vector<idx_t> perm(at(upper.n));
