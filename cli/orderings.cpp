@@ -147,6 +147,7 @@ std::string metis_refusal(std::int64_t rows, std::int64_t neighbours) {
 }
 
 std::vector<std::int64_t> find_order(Ordering ordering, const UpperPattern& upper, std::uint64_t limit) {
+  if (upper.n < 2) return order_naturally(upper.n);
   if (ordering == Ordering::amd) return order_by_amd(upper, limit);
   if (ordering == Ordering::metis) return order_by_metis(upper, limit);
   return order_naturally(upper.n);
