@@ -2,9 +2,12 @@
 
 #include <SuiteSparse_config.h>
 #include <gtest/gtest.h>
+#include <sys/resource.h>
+#include <unistd.h>
 
 #include <algorithm>
-#include <cstdlib>
+#include <fstream>
+#include <iostream>
 #include <limits>
 #include <set>
 
@@ -137,6 +140,36 @@ TEST(Orderings, an_allocation_that_fails_inside_amd_is_told) {
   EXPECT_NE(problem.advice.find("--ordering md"), std::string::npos);
   EXPECT_TRUE(is_permutation(find_order(Ordering::amd, pattern.upper(), kPlenty), 100)) << "afterwards it works again";
 }
+
+#ifndef QXSM_SANITIZED  // which needs the address space
+// Leaves the process `more` bytes beyond what it has, orders, and ends with the exit code of what became of that.
+[[noreturn]] void order_in_little_memory(const Pattern& pattern, std::uint64_t more) {
+  std::uint64_t pages = 0;
+  std::ifstream("/proc/self/statm") >> pages;
+  const rlim_t limit = pages * static_cast<std::uint64_t>(sysconf(_SC_PAGESIZE)) + more;
+  const rlimit room{limit, limit};
+  setrlimit(RLIMIT_AS, &room);
+  try {
+    find_order(Ordering::metis, pattern.upper(), kPlenty);
+  } catch (const CommandError& error) {
+    std::cerr << error.what() << "\n";
+    _exit(static_cast<int>(error.problem().code));
+  }
+  _exit(0);
+}
+
+TEST(OrderingsDeathTest, an_allocation_that_fails_inside_metis_is_told) {
+  constexpr std::int64_t kRows = 90'000;  // of a grid, 300 points wide
+  std::vector<std::set<std::int64_t>> rows(kRows);
+  for (std::int64_t i = 0; i < kRows; ++i) rows[static_cast<std::size_t>(i)] = {i, std::min(i + 1, kRows - 1)};
+  for (std::int64_t i = 300; i < kRows; ++i) rows[static_cast<std::size_t>(i - 300)].insert(i);
+  const Pattern pattern(rows);
+  EXPECT_EXIT(order_in_little_memory(pattern, 1'000'000'000), ::testing::ExitedWithCode(0), "");
+  // The graph and the order take 2.5 MB of this, and METIS three times as much.
+  EXPECT_EXIT(order_in_little_memory(pattern, 5'000'000), ::testing::ExitedWithCode(3),
+              "out of memory while ordering the matrix with METIS");
+}
+#endif
 
 }  // namespace
 }  // namespace sm::cli
