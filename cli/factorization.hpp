@@ -29,8 +29,8 @@ class Factorization {
   // CommandError.
   Factorization(ModuleSession& session, const LoadedMatrix& upper, PhaseClock& clock);
 
-  // qxsmmd or qxsmorder, qxsmreorder, qxsmsymbfact. `limit` as in require_memory, for an order that is found outside the
-  // module.
+  // qxsmmd or qxsmorder, qxsmreorder, qxsmsymbfact. `limit` as in require_memory, for an order that is found outside
+  // the module.
   void analyse(Ordering ordering, std::uint64_t limit);
   bool factor();  // qxsmnumfact; false when the matrix is not positive semidefinite
 

@@ -56,10 +56,10 @@ General files are accepted when they are symmetric in value. Entries at one posi
 diagonal are not kept.
 
 The order decides how much U fills in. --ordering md, minimum degree, is found fast and good for most matrices: mixed
-models, pedigrees, 2-D grids with five points. --ordering metis, nested dissection, takes about ten times as long to find
-and saves a third of the operations on wide stencils in the plane (13 points) and more than half of them on 3-D grids: it
-is worth it where 'numeric' takes most of the time, or where one order serves many factorizations. --ordering amd differs
-little from md; --ordering natural is for a matrix whose file has it in a good order already, such as a narrow band.
+models, pedigrees, 2-D grids with five points. --ordering metis, nested dissection, takes about ten times as long to
+find and saves a third of the operations on wide stencils in the plane (13 points), more than half of them on 3-D
+grids: it is worth it where 'numeric' takes most of the time. --ordering amd is of md's kind, and often a little better
+on grids; --ordering natural is for a matrix whose file has it in a good order already, such as a narrow band.
 
 Examples:
 

@@ -1,5 +1,5 @@
-// A JSON value on its way to being printed. A small type of the command's own: the library that prints it takes seconds of
-// every file that includes it, and is met in json.cpp only.
+// A JSON value on its way to being printed. A small type of the command's own: the library that prints it takes seconds
+// of every file that includes it, and is met in json.cpp only.
 #pragma once
 
 #include <concepts>

@@ -28,7 +28,7 @@ inline void void_results(SmMatrix& m) {
   m.log_det = missing();
 }
 
-// Whether an array of nnz elements at `p` shares any with the value array of the compressed rows. It may begin before it.
+// Whether an array of nnz elements at `p` shares any with the value array of the compressed rows, wherever it begins.
 inline bool overlaps_nz_values(const SmMatrix& m, const double* p) {
   const auto given = reinterpret_cast<std::uintptr_t>(p);
   const auto own = reinterpret_cast<std::uintptr_t>(m.nz_values);

@@ -1,5 +1,5 @@
-// What a program has printed as JSON, to be looked into. A small reader: the library behind it takes seconds of every file
-// that includes it.
+// What a program has printed as JSON, to be looked into. A small reader: the library behind it takes seconds of every
+// file that includes it.
 #pragma once
 
 #include <concepts>
