@@ -128,6 +128,7 @@ std::vector<std::int64_t> order_by_metis(const UpperPattern& upper, std::uint64_
 
 std::vector<std::string> ordering_names() {
   std::vector<std::string> names;
+  names.reserve(kNamings.size());
   for (const Naming& naming : kNamings) names.emplace_back(naming.name);
   return names;
 }
