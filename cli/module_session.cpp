@@ -61,6 +61,7 @@ void ModuleSession::find_steps() {
     if (!step) fail(fmt::format("{} does not export {}", info.dli_fname, name), kReinstall);
   };
   find(steps_.qxsmmd, "qxsmmd");
+  find(steps_.qxsmorder, "qxsmorder");
   find(steps_.qxsmreorder, "qxsmreorder");
   find(steps_.qxsmsymbfact, "qxsmsymbfact");
   find(steps_.qxsmnumfact, "qxsmnumfact");

@@ -12,6 +12,7 @@ namespace sm::cli {
 // Operations that the module exports beside its table.
 struct ExportedSteps {
   SmStatus (*qxsmmd)(SmMatrix* matrix) = nullptr;
+  SmStatus (*qxsmorder)(SmMatrix* matrix, const int64_t* perm) = nullptr;
   SmStatus (*qxsmreorder)(SmMatrix* matrix) = nullptr;
   SmStatus (*qxsmsymbfact)(SmMatrix* matrix) = nullptr;
   SmStatus (*qxsmnumfact)(SmMatrix* matrix) = nullptr;

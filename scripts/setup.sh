@@ -8,8 +8,8 @@ jobs=$(nproc 2>/dev/null || echo 2)
 
 # What the command and its libraries need, what the tests need on top, and what the checks with clang need. An entry
 # "package=command" counts as there when the command is, wherever it comes from.
-packages_build=(g++=g++ cmake=cmake ninja-build=ninja libblas-dev libcli11-dev libcsv-dev libeigen3-dev libfmt-dev libnlopt-dev
-  nlohmann-json3-dev zlib1g-dev)
+packages_build=(g++=g++ cmake=cmake ninja-build=ninja libblas-dev libcli11-dev libcsv-dev libeigen3-dev libfmt-dev
+  libmetis-dev libnlopt-dev libsuitesparse-dev nlohmann-json3-dev zlib1g-dev)
 packages_tests=(ccache=ccache pkgconf=pkg-config binutils=readelf libgtest-dev mandoc=mandoc)
 packages_clang=(clang=clang++ libclang-rt-dev clang-format=clang-format clang-tidy=run-clang-tidy)
 packages_coverage=(gcovr=gcovr)

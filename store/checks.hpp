@@ -1,6 +1,8 @@
 // Checks and bookkeeping that many operations share.
 #pragma once
 
+#include <cstdint>
+
 #include "frame/memory.hpp"
 #include "store/layouts.hpp"
 
@@ -24,6 +26,13 @@ inline Gate may_read(const SmMatrix& m) {
 inline void void_results(SmMatrix& m) {
   m.rank = 0;
   m.log_det = missing();
+}
+
+// Whether an array of nnz elements at `p` shares any with the value array of the compressed rows, wherever it begins.
+inline bool overlaps_nz_values(const SmMatrix& m, const double* p) {
+  const auto given = reinterpret_cast<std::uintptr_t>(p);
+  const auto own = reinterpret_cast<std::uintptr_t>(m.nz_values);
+  return (given < own ? own - given : given - own) < static_cast<std::uintptr_t>(m.nnz) * sizeof(double);
 }
 
 // Entries of a matrix with a value array are about to change: a separate factor or inverse no longer belongs to them.
