@@ -54,6 +54,9 @@ add_library(qxesm_objects OBJECT
   forms/inverse_forms.cpp
   forms/kernels.cpp
   forms/multiply.cpp
+  forms/passes_avx2.cpp
+  forms/passes_avx512.cpp
+  forms/passes_portable.cpp
   forms/products.cpp
   forms/quadratic.cpp
   forms/scaling.cpp

@@ -1,0 +1,331 @@
+// The passes of passes.hpp, written once. A file that defines SM_PASS_TARGET, the attribute that lets the compiler use
+// wider vectors, includes this in its own namespace.
+//
+// Deliberately without an include guard.
+
+#define SM_PASS_INLINE SM_PASS_TARGET __attribute__((always_inline)) inline
+
+constexpr int kSums = 8;      // partial sums of a sweep over vectors
+constexpr i64 kAhead = 256;   // elements that are made ready together, at least; the next as many are fetched
+constexpr i64 kEntriesAhead = 384;  // of the entry at work: those that are fetched, faster than the processor would
+
+constexpr i64 kLongRow = 8;        // entries from which a row is summed in several partial sums
+
+typedef double Sums __attribute__((vector_size(kSums * sizeof(double)), aligned(sizeof(double)), may_alias));
+
+SM_PASS_INLINE const Sums& sums_at(const double* v) { return *reinterpret_cast<const Sums*>(v); }
+SM_PASS_INLINE Sums& sums_at(double* v) { return *reinterpret_cast<Sums*>(v); }
+
+SM_PASS_INLINE double total_of(const Sums& s) {
+  return ((s[0] + s[4]) + (s[2] + s[6])) + ((s[1] + s[5]) + (s[3] + s[7]));
+}
+
+// What follows in a vector, into the caches.
+SM_PASS_INLINE void fetch(const double* v) {
+  for (i64 j = 0; j < kAhead; j += 8) __builtin_prefetch(v + j);
+}
+
+SM_PASS_INLINE void fetch_entries(const UpperRows& a, i64 p) {
+  __builtin_prefetch(a.col_index + p + kEntriesAhead);
+  __builtin_prefetch(a.values + p + kEntriesAhead);
+}
+
+// What is made ready of the vectors: nothing, zeros of the result, or a piece of the direction besides.
+struct Nothing {
+  SM_PASS_INLINE void operator()(i64, i64) const {}
+};
+struct Cleared {
+  const double* x;
+  double* y;
+  SM_PASS_INLINE void operator()(i64 from, i64 to) const {
+    fetch(x + to);
+    fetch(y + to);
+    for (i64 j = from; j < to; ++j) y[j] = 0.0;
+  }
+};
+struct Directed {
+  const Direction& d;
+  SM_PASS_INLINE void operator()(i64 from, i64 to) const {
+    const double* __restrict inverse = d.inverse;
+    const double* __restrict r = d.r;
+    double* __restrict p = d.p;
+    double* __restrict q = d.q;
+    const double beta = d.beta;
+    fetch(inverse + to);
+    fetch(r + to);
+    fetch(p + to);
+    fetch(q + to);
+    for (i64 j = from; j < to; ++j) {
+      p[j] = inverse[j] * r[j] + beta * p[j];
+      q[j] = 0.0;
+    }
+  }
+};
+
+// y += A x, row by row. Answers x'A x, whose terms come along with the rows, when asked.
+template <bool kForm, class Ready>
+SM_PASS_INLINE double exchange_rows(const UpperRows& a, const double* x, double* y, const Ready& make_ready) {
+  const i64* __restrict start = a.row_start;
+  const i64* __restrict column = a.col_index;
+  const double* __restrict value = a.values;
+  const i64 n = a.rows;
+  double form = 0.0;
+  i64 ready = 0;
+  if (!a.is_ascending) make_ready(0, ready = n);
+  for (i64 i = 0, p = start[0]; i < n; ++i) {
+    const i64 end = start[i + 1];
+    if (p == end) continue;
+    if (const i64 last = column[end - 1]; last >= ready) {
+      const i64 from = ready;
+      ready = std::min(n, last + kAhead);
+      make_ready(from, ready);
+    }
+    fetch_entries(a, p);
+    const double t = x[i];
+    double diagonal = 0.0;
+    if (column[p] == i) diagonal = value[p++] * t;
+    double sum = 0.0;
+    if (end - p >= kLongRow) {
+      double s[4] = {};
+      for (; p + 4 <= end; p += 4) {
+        fetch_entries(a, p);
+#pragma GCC unroll 4
+        for (int e = 0; e < 4; ++e) {
+          const i64 k = column[p + e];
+          const double v = value[p + e];
+          s[e] += v * x[k];
+          y[k] += v * t;
+        }
+      }
+      sum = (s[0] + s[2]) + (s[1] + s[3]);
+    }
+    for (; p < end; ++p) {
+      const i64 k = column[p];
+      const double v = value[p];
+      sum += v * x[k];
+      y[k] += v * t;
+    }
+    y[i] += diagonal + sum;
+    if constexpr (kForm) form += t * (diagonal + 2.0 * sum);
+  }
+  make_ready(ready, n);
+  return form;
+}
+
+SM_PASS_TARGET void multiply_one(const UpperRows& a, const double* x, double* y, bool accumulate) {
+  if (accumulate) {
+    exchange_rows<false>(a, x, y, Nothing{});
+  } else {
+    exchange_rows<false>(a, x, y, Cleared{x, y});
+  }
+}
+
+SM_PASS_TARGET double direct(const UpperRows& a, const Direction& d) {
+  return exchange_rows<true>(a, d.p, d.q, Directed{d});
+}
+
+SM_PASS_TARGET double advance(const Step& s) {
+  const double* __restrict p = s.p;
+  const double* __restrict q = s.q;
+  const double* __restrict inverse = s.inverse;
+  double* __restrict x = s.x;
+  double* __restrict r = s.r;
+  const double alpha = s.alpha;
+  Sums rho{};
+  i64 i = 0;
+  for (; i + kSums <= s.n; i += kSums) {
+    sums_at(x + i) += sums_at(p + i) * alpha;
+    const Sums rest = sums_at(r + i) - sums_at(q + i) * alpha;
+    sums_at(r + i) = rest;
+    rho += rest * (sums_at(inverse + i) * rest);
+  }
+  for (int lane = 0; i < s.n; ++i, ++lane) {
+    x[i] += alpha * p[i];
+    r[i] -= alpha * q[i];
+    rho[lane] += r[i] * (inverse[i] * r[i]);
+  }
+  return total_of(rho);
+}
+
+SM_PASS_TARGET double measure(i64 n, const double* b, const double* q, const double* inverse, double* r) {
+  Sums rho{};
+  i64 i = 0;
+  for (; i + kSums <= n; i += kSums) {
+    const Sums rest = sums_at(b + i) - sums_at(q + i);
+    sums_at(r + i) = rest;
+    rho += rest * (sums_at(inverse + i) * rest);
+  }
+  for (int lane = 0; i < n; ++i, ++lane) {
+    r[i] = b[i] - q[i];
+    rho[lane] += r[i] * (inverse[i] * r[i]);
+  }
+  return total_of(rho);
+}
+
+// Several vectors side by side: element k of vector v in lane v of row k of a window.
+constexpr int kLanes = kProductLanes;
+constexpr i64 kWindow = kProductReach;  // with those of the result 256 kB of stack, which the second cache holds
+
+typedef double Lanes __attribute__((vector_size(kLanes * sizeof(double)), aligned(sizeof(double)), may_alias));
+typedef long long Places __attribute__((vector_size(kLanes * sizeof(double))));
+
+// Rows become columns.
+SM_PASS_INLINE void transpose(Lanes (&r)[kLanes]) {
+  const Places even = {0, 8, 2, 10, 4, 12, 6, 14}, odd = {1, 9, 3, 11, 5, 13, 7, 15};
+  const Places low = {0, 1, 8, 9, 4, 5, 12, 13}, high = {2, 3, 10, 11, 6, 7, 14, 15};
+  const Places front = {0, 1, 2, 3, 8, 9, 10, 11}, back = {4, 5, 6, 7, 12, 13, 14, 15};
+  Lanes s[kLanes], t[kLanes];
+#pragma GCC unroll 4
+  for (int k = 0; k < kLanes; k += 2) {
+    s[k] = __builtin_shuffle(r[k], r[k + 1], even);
+    s[k + 1] = __builtin_shuffle(r[k], r[k + 1], odd);
+  }
+#pragma GCC unroll 4
+  for (int k = 0; k < kLanes; k += 4) {
+#pragma GCC unroll 2
+    for (int i = 0; i < 2; ++i) {
+      t[k + i] = __builtin_shuffle(s[k + i], s[k + i + 2], low);
+      t[k + i + 2] = __builtin_shuffle(s[k + i], s[k + i + 2], high);
+    }
+  }
+#pragma GCC unroll 4
+  for (int k = 0; k < 4; ++k) {
+    r[k] = __builtin_shuffle(t[k], t[k + 4], front);
+    r[k + 4] = __builtin_shuffle(t[k], t[k + 4], back);
+  }
+}
+
+// The vectors of a block in memory, one after the other. A lane that has no vector of its own reads the last one and
+// writes nothing.
+template <class T>
+struct Columns {
+  T* lane[kLanes];
+  int count;
+
+  SM_PASS_INLINE Columns(T* first, i64 n, int vectors) : count(vectors) {
+    for (int v = 0; v < kLanes; ++v) lane[v] = first + std::min(v, vectors - 1) * n;
+  }
+  SM_PASS_INLINE void gather(i64 k, Lanes& to) const {
+    to = Lanes{lane[0][k], lane[1][k], lane[2][k], lane[3][k], lane[4][k], lane[5][k], lane[6][k], lane[7][k]};
+  }
+  SM_PASS_INLINE void add(i64 k, const Lanes& term) const {
+    for (int v = 0; v < count; ++v) lane[v][k] += term[v];
+  }
+  SM_PASS_INLINE void clear(i64 from, i64 to) const {
+    for (int v = 0; v < count; ++v) {
+      for (i64 k = from; k < to; ++k) lane[v][k] = 0.0;
+    }
+  }
+};
+
+// The rows of both vectors that lie ahead of the row at work, side by side in a ring.
+struct Window {
+  Lanes x[kWindow];
+  Lanes y[kWindow];
+};
+
+class SeveralPass {
+ public:
+  SM_PASS_INLINE SeveralPass(const UpperRows& a, const double* x, double* y, int count, bool accumulate, Window& window)
+      : a_(a), x_(x, a.rows, count), y_(y, a.rows, count), window_(window), cleared_(accumulate ? a.rows : 0) {}
+
+  SM_PASS_INLINE void run() {
+    const i64 n = a_.rows;
+    for (i64 i = 0; i < n; i += kLanes) {
+      for (const i64 end = std::min(n, i + kWindow); loaded_ < end; loaded_ += kLanes) load(std::min(kLanes + 0L, n - loaded_));
+      const i64 last = std::min(n, i + kLanes);
+      for (i64 k = i; k < last; ++k) row(k);
+      store(i, last - i);
+    }
+  }
+
+ private:
+  SM_PASS_INLINE static i64 slot(i64 k) { return k & (kWindow - 1); }
+
+  SM_PASS_INLINE void load(i64 rows) {
+    const i64 at = slot(loaded_);
+    Lanes t[kLanes] = {};
+    read(x_, loaded_, rows, t);
+    for (int k = 0; k < kLanes; ++k) window_.x[at + k] = t[k];
+    if (cleared_ <= loaded_) {
+      for (int k = 0; k < kLanes; ++k) window_.y[at + k] = Lanes{};
+      return;
+    }
+    if (cleared_ < loaded_ + rows) {
+      y_.clear(cleared_, loaded_ + rows);
+      cleared_ = loaded_ + rows;
+    }
+    read(y_, loaded_, rows, t);
+    for (int k = 0; k < kLanes; ++k) window_.y[at + k] = t[k];
+  }
+  template <class T>
+  SM_PASS_INLINE static void read(const Columns<T>& from, i64 k, i64 rows, Lanes (&t)[kLanes]) {
+    if (rows == kLanes) {
+      for (int v = 0; v < kLanes; ++v) t[v] = *reinterpret_cast<const Lanes*>(from.lane[v] + k);
+      transpose(t);
+    } else {
+      for (i64 i = 0; i < rows; ++i) from.gather(k + i, t[i]);
+    }
+  }
+  SM_PASS_INLINE void store(i64 k, i64 rows) {
+    Lanes t[kLanes];
+    for (int i = 0; i < kLanes; ++i) t[i] = window_.y[slot(k) + i];
+    if (rows == kLanes) {
+      transpose(t);
+      for (int v = 0; v < y_.count; ++v) *reinterpret_cast<Lanes*>(y_.lane[v] + k) = t[v];
+    } else {
+      for (i64 i = 0; i < rows; ++i) {
+        for (int v = 0; v < y_.count; ++v) y_.lane[v][k + i] = t[i][v];
+      }
+    }
+  }
+
+  SM_PASS_INLINE void row(i64 i) {
+    i64 p = a_.row_start[i];
+    const i64 end = a_.row_start[i + 1];
+    fetch_entries(a_, p);
+    const Lanes t = window_.x[slot(i)];
+    Lanes diagonal{};
+    if (p < end && a_.col_index[p] == i) diagonal = a_.values[p++] * t;
+    Lanes sum{};
+    for (; p < end; ++p) {
+      const i64 k = a_.col_index[p];
+      if (k >= loaded_) break;
+      const double v = a_.values[p];
+      sum += v * window_.x[slot(k)];
+      window_.y[slot(k)] += v * t;
+    }
+    if (p < end) far(p, end, t, sum);
+    window_.y[slot(i)] += diagonal + sum;
+  }
+  // Entries p to `end`, whose columns lie behind the window.
+  SM_PASS_INLINE void far(i64 p, i64 end, const Lanes& t, Lanes& sum) {
+    if (const i64 last = a_.col_index[end - 1]; last >= cleared_) {
+      const i64 from = std::max(cleared_, loaded_);
+      cleared_ = std::min(a_.rows, last + kAhead);
+      y_.clear(from, cleared_);
+    }
+    for (; p < end; ++p) {
+      const i64 k = a_.col_index[p];
+      const double v = a_.values[p];
+      Lanes xk;
+      x_.gather(k, xk);
+      sum += v * xk;
+      y_.add(k, v * t);
+    }
+  }
+
+  const UpperRows& a_;
+  Columns<const double> x_;
+  Columns<double> y_;
+  Window& window_;
+  i64 loaded_ = 0;   // rows before it have been in the window
+  i64 cleared_;      // elements of y before it hold sums already; those behind are not cleared yet
+};
+
+SM_PASS_TARGET void multiply_several(const UpperRows& a, const double* x, double* y, int count, bool accumulate) {
+  Window window;
+  SeveralPass(a, x, y, count, accumulate, window).run();
+}
+
+constexpr Passes kPasses = {multiply_one, multiply_several, direct, advance, measure};
