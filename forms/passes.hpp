@@ -12,7 +12,7 @@
 
 namespace sm {
 
-inline constexpr int kProductLanes = 8;        // vectors that go through the matrix together
+inline constexpr int kProductLanes = 8;     // vectors that go through the matrix together
 inline constexpr i64 kProductReach = 2048;  // rows ahead of the one at work that they have side by side
 
 // The diagonal preconditioner, the residual, and what they make the next direction from.

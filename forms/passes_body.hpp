@@ -5,11 +5,11 @@
 
 #define SM_PASS_INLINE SM_PASS_TARGET __attribute__((always_inline)) inline
 
-constexpr int kSums = 8;      // partial sums of a sweep over vectors
-constexpr i64 kAhead = 256;   // elements that are made ready together, at least; the next as many are fetched
+constexpr int kSums = 8;            // partial sums of a sweep over vectors
+constexpr i64 kAhead = 256;         // elements that are made ready together, at least; the next as many are fetched
 constexpr i64 kEntriesAhead = 384;  // of the entry at work: those that are fetched, faster than the processor would
 
-constexpr i64 kLongRow = 8;        // entries from which a row is summed in several partial sums
+constexpr i64 kLongRow = 8;  // entries from which a row is summed in several partial sums
 
 typedef double Sums __attribute__((vector_size(kSums * sizeof(double)), aligned(sizeof(double)), may_alias));
 
@@ -62,7 +62,105 @@ struct Directed {
   }
 };
 
-// y += A x, row by row. Answers x'A x, whose terms come along with the rows, when asked.
+// Rows of equal length whose columns are those of the row before moved by one, as stencils have: `rows` of them from
+// row i on, `length` entries each from p on.
+struct Strip {
+  i64 i;
+  i64 rows;
+  i64 p;
+  i64 length;
+};
+
+constexpr i64 kStripRows = 64;
+constexpr i64 kStripEntries = 1024;  // which stay in the first cache
+constexpr i64 kStripUnit = kSums;    // rows that are taken together
+constexpr i64 kLeastStrip = 32;      // rows that are worth the trouble
+
+// Whether v[k + step] is v[k] + more for k < count.
+SM_PASS_INLINE bool climbs(const i64* v, i64 step, i64 more, i64 count) {
+  i64 differs = 0;
+  for (i64 k = 0; k < count; ++k) differs |= v[k + step] - v[k] - more;
+  return differs == 0;
+}
+
+// The strip that begins with row i, which begins at p; of no rows when there is none.
+SM_PASS_TARGET __attribute__((noinline)) Strip strip_at(const UpperRows& a, i64 i, i64 p) {
+  const i64 length = a.row_start[i + 1] - p;
+  const i64* next = a.col_index + p + length;
+  if (i + 1 >= a.rows || length < 1 || a.row_start[i + 2] - a.row_start[i + 1] != length ||
+      next[length - 1] != next[-1] + 1 || next[-length] != i) {
+    return {i, 0, p, length};  // most often
+  }
+  const i64 limit = std::min(a.rows - i, kStripEntries / length);
+  for (i64 rows = kStripRows; rows >= kLeastStrip; rows /= 2) {
+    if (rows > limit || a.row_start[i + rows] - p != rows * length) continue;
+    if (!climbs(a.row_start + i, 1, length, rows)) continue;
+    if (climbs(a.col_index + p, length, 1, (rows - 1) * length)) return {i, rows, p, length};
+  }
+  return {i, 0, p, length};
+}
+
+// Eight values, each `l` behind the one before.
+SM_PASS_INLINE void load_strided(const double* w, i64 l, Sums& v) {
+  const double* z = w + 4 * l;
+  v = Sums{w[0], w[l], w[2 * l], w[3 * l], z[0], z[l], z[2 * l], z[3 * l]};
+}
+
+// Every slot of the rows at once: the values are strided, the vectors are not.
+template <bool kForm>
+SM_PASS_TARGET __attribute__((noinline)) void exchange_strip(const UpperRows& a, const Strip& s, const double* x,
+                                                             double* y, Sums& form) {
+  const double* const value = a.values + s.p;
+  const i64* const column = a.col_index + s.p;
+  const double* const xi = x + s.i;
+  double* const yi = y + s.i;
+  const i64 l = s.length;
+  const i64 rows = s.rows;
+  double sum[kStripRows];
+  for (i64 r = 0; r < rows; r += kStripUnit) sums_at(sum + r) = Sums{};
+  for (i64 e = 1; e < l; ++e) {
+    const i64 k = column[e];
+    for (i64 r = 0; r < rows; r += kStripUnit) {
+      __builtin_prefetch(column + e * rows + r + kEntriesAhead);
+      __builtin_prefetch(value + e * rows + r + kEntriesAhead);
+      Sums v;
+      load_strided(value + e + r * l, l, v);
+      sums_at(sum + r) += v * sums_at(x + k + r);
+      sums_at(y + k + r) += v * sums_at(xi + r);
+    }
+  }
+  Sums part{};
+  for (i64 r = 0; r < rows; r += kStripUnit) {
+    __builtin_prefetch(column + r + kEntriesAhead);
+    __builtin_prefetch(value + r + kEntriesAhead);
+    Sums v;
+    load_strided(value + r * l, l, v);
+    const Sums t = sums_at(xi + r);
+    const Sums diagonal = v * t;
+    const Sums others = sums_at(sum + r);
+    sums_at(yi + r) += diagonal + others;
+    if constexpr (kForm) part += t * (diagonal + 2.0 * others);
+  }
+  if constexpr (kForm) form += part;
+}
+
+// Entries p to `end` of a long row: several partial sums, so that none waits for the one before.
+SM_PASS_INLINE double exchange_long(const UpperRows& a, i64& p, i64 end, double t, const double* x, double* y) {
+  double part[4] = {};
+  for (; p + 4 <= end; p += 4) {
+    fetch_entries(a, p);
+#pragma GCC unroll 4
+    for (int e = 0; e < 4; ++e) {
+      const i64 k = a.col_index[p + e];
+      const double v = a.values[p + e];
+      part[e] += v * x[k];
+      y[k] += v * t;
+    }
+  }
+  return (part[0] + part[2]) + (part[1] + part[3]);
+}
+
+// y += A x, with what it needs of the vectors made ready just before. Answers x'A x when asked: its terms come along.
 template <bool kForm, class Ready>
 SM_PASS_INLINE double exchange_rows(const UpperRows& a, const double* x, double* y, const Ready& make_ready) {
   const i64* __restrict start = a.row_start;
@@ -70,46 +168,53 @@ SM_PASS_INLINE double exchange_rows(const UpperRows& a, const double* x, double*
   const double* __restrict value = a.values;
   const i64 n = a.rows;
   double form = 0.0;
+  Sums forms{};
   i64 ready = 0;
+  i64 patience = 1;  // rows before the next look for a strip
   if (!a.is_ascending) make_ready(0, ready = n);
-  for (i64 i = 0, p = start[0]; i < n; ++i) {
-    const i64 end = start[i + 1];
-    if (p == end) continue;
-    if (const i64 last = column[end - 1]; last >= ready) {
-      const i64 from = ready;
-      ready = std::min(n, last + kAhead);
-      make_ready(from, ready);
-    }
-    fetch_entries(a, p);
-    const double t = x[i];
-    double diagonal = 0.0;
-    if (column[p] == i) diagonal = value[p++] * t;
-    double sum = 0.0;
-    if (end - p >= kLongRow) {
-      double s[4] = {};
-      for (; p + 4 <= end; p += 4) {
-        fetch_entries(a, p);
-#pragma GCC unroll 4
-        for (int e = 0; e < 4; ++e) {
-          const i64 k = column[p + e];
-          const double v = value[p + e];
-          s[e] += v * x[k];
-          y[k] += v * t;
-        }
+  for (i64 i = 0, p = start[0]; i < n;) {
+    const Strip strip = strip_at(a, i, p);
+    const i64 until = strip.rows > 0 ? i + strip.rows : std::min(n, i + patience);
+    if (strip.rows > 0) {
+      const i64 end = p + strip.rows * strip.length;
+      if (const i64 last = column[end - 1]; last >= ready) {
+        const i64 from = ready;
+        ready = std::min(n, last + kAhead);
+        make_ready(from, ready);
       }
-      sum = (s[0] + s[2]) + (s[1] + s[3]);
+      exchange_strip<kForm>(a, strip, x, y, forms);
+      p = end;
+      i = until;
+      patience = 1;
+      continue;
     }
-    for (; p < end; ++p) {
-      const i64 k = column[p];
-      const double v = value[p];
-      sum += v * x[k];
-      y[k] += v * t;
+    patience = std::min<i64>(2 * patience, 32);
+    for (; i < until; ++i) {
+      const i64 end = start[i + 1];
+      if (p == end) continue;
+      if (const i64 last = column[end - 1]; last >= ready) {
+        const i64 from = ready;
+        ready = std::min(n, last + kAhead);
+        make_ready(from, ready);
+      }
+      fetch_entries(a, p);
+      const double t = x[i];
+      double diagonal = 0.0;
+      if (column[p] == i) diagonal = value[p++] * t;
+      double sum = 0.0;
+      if (end - p >= kLongRow) sum = exchange_long(a, p, end, t, x, y);
+      for (; p < end; ++p) {
+        const i64 k = column[p];
+        const double v = value[p];
+        sum += v * x[k];
+        y[k] += v * t;
+      }
+      y[i] += diagonal + sum;
+      if constexpr (kForm) form += t * (diagonal + 2.0 * sum);
     }
-    y[i] += diagonal + sum;
-    if constexpr (kForm) form += t * (diagonal + 2.0 * sum);
   }
   make_ready(ready, n);
-  return form;
+  return form + total_of(forms);
 }
 
 SM_PASS_TARGET void multiply_one(const UpperRows& a, const double* x, double* y, bool accumulate) {
@@ -232,7 +337,8 @@ class SeveralPass {
   SM_PASS_INLINE void run() {
     const i64 n = a_.rows;
     for (i64 i = 0; i < n; i += kLanes) {
-      for (const i64 end = std::min(n, i + kWindow); loaded_ < end; loaded_ += kLanes) load(std::min(kLanes + 0L, n - loaded_));
+      for (const i64 end = std::min(n, i + kWindow); loaded_ < end; loaded_ += kLanes)
+        load(std::min(kLanes + 0L, n - loaded_));
       const i64 last = std::min(n, i + kLanes);
       for (i64 k = i; k < last; ++k) row(k);
       store(i, last - i);
@@ -319,8 +425,8 @@ class SeveralPass {
   Columns<const double> x_;
   Columns<double> y_;
   Window& window_;
-  i64 loaded_ = 0;   // rows before it have been in the window
-  i64 cleared_;      // elements of y before it hold sums already; those behind are not cleared yet
+  i64 loaded_ = 0;  // rows before it have been in the window
+  i64 cleared_;     // elements of y before it hold sums already; those behind are not cleared yet
 };
 
 SM_PASS_TARGET void multiply_several(const UpperRows& a, const double* x, double* y, int count, bool accumulate) {
