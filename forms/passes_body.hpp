@@ -62,8 +62,8 @@ struct Directed {
   }
 };
 
-// Rows of equal length whose columns are those of the row before moved by one, as stencils have: `rows` of them from
-// row i on, `length` entries each from p on.
+// Rows of equal length whose columns are those of the row before moved by one, as stencils have, are a strip: `rows` of
+// them from row i on, with `length` entries each from p on.
 struct Strip {
   i64 i;
   i64 rows;
@@ -74,7 +74,7 @@ struct Strip {
 constexpr i64 kStripRows = 64;
 constexpr i64 kStripEntries = 1024;  // which stay in the first cache
 constexpr i64 kStripUnit = kSums;    // rows that are taken together
-constexpr i64 kLeastStrip = 32;      // rows that are worth the trouble
+constexpr i64 kLeastStrip = 24;      // rows that are worth the trouble
 
 // Whether v[k + step] is v[k] + more for k < count.
 SM_PASS_INLINE bool climbs(const i64* v, i64 step, i64 more, i64 count) {
@@ -83,21 +83,56 @@ SM_PASS_INLINE bool climbs(const i64* v, i64 step, i64 more, i64 count) {
   return differs == 0;
 }
 
-// The strip that begins with row i, which begins at p; of no rows when there is none.
-SM_PASS_TARGET __attribute__((noinline)) Strip strip_at(const UpperRows& a, i64 i, i64 p) {
-  const i64 length = a.row_start[i + 1] - p;
+// How many rows from row i on, which begins at p, are a strip; 0 when it begins none.
+SM_PASS_TARGET __attribute__((noinline)) i64 strip_rows(const UpperRows& a, i64 i, i64 p) {
+  const i64* start = a.row_start + i;
+  const i64 length = start[1] - p;
   const i64* next = a.col_index + p + length;
-  if (i + 1 >= a.rows || length < 1 || a.row_start[i + 2] - a.row_start[i + 1] != length ||
-      next[length - 1] != next[-1] + 1 || next[-length] != i) {
-    return {i, 0, p, length};  // most often
+  const i64 limit = std::min(a.rows - i, kStripRows);
+  if (limit < kLeastStrip || length < 1 || start[kLeastStrip] - p != kLeastStrip * length || next[-length] != i ||
+      next[length - 1] != next[-1] + 1) {
+    return 0;  // most often
   }
-  const i64 limit = std::min(a.rows - i, kStripEntries / length);
-  for (i64 rows = kStripRows; rows >= kLeastStrip; rows /= 2) {
-    if (rows > limit || a.row_start[i + rows] - p != rows * length) continue;
-    if (!climbs(a.row_start + i, 1, length, rows)) continue;
-    if (climbs(a.col_index + p, length, 1, (rows - 1) * length)) return {i, rows, p, length};
+  i64 rows = 0;
+  while (rows + kStripUnit <= limit && climbs(start + rows, 1, length, kStripUnit)) rows += kStripUnit;
+  rows = std::min(rows, kStripEntries / length & -kStripUnit);
+  return rows >= kLeastStrip && climbs(a.col_index + p, length, 1, (rows - 1) * length) ? rows : 0;
+}
+
+// What the next rows are: so many of a strip, or, negative, so many others. Either by looking, less and less often
+// where nothing is found, or from a list of that.
+struct Look {
+  static constexpr bool kReadsColumns = true;
+  i64 patience = 1;
+  SM_PASS_INLINE i64 next(const UpperRows& a, i64 i, i64 p) {
+    const i64 rows = strip_rows(a, i, p);
+    if (rows > 0) {
+      patience = 1;
+      return rows;
+    }
+    const i64 others = std::min(a.rows - i, patience);
+    patience = std::min<i64>(2 * patience, 32);
+    return -others;
   }
-  return {i, 0, p, length};
+};
+struct Listed {
+  static constexpr bool kReadsColumns = false;
+  const i64* list;
+  SM_PASS_INLINE i64 next(const UpperRows&, i64, i64) { return *list++; }
+};
+
+SM_PASS_TARGET void list_strips(const UpperRows& a, i64* list) {
+  Look look;
+  i64* end = list;
+  for (i64 i = 0; i < a.rows;) {
+    const i64 rows = look.next(a, i, a.row_start[i]);
+    if (rows < 0 && end != list && end[-1] < 0) {
+      end[-1] += rows;
+    } else {
+      *end++ = rows;
+    }
+    i += std::abs(rows);
+  }
 }
 
 // Eight values, each `l` behind the one before.
@@ -106,8 +141,9 @@ SM_PASS_INLINE void load_strided(const double* w, i64 l, Sums& v) {
   v = Sums{w[0], w[l], w[2 * l], w[3 * l], z[0], z[l], z[2 * l], z[3 * l]};
 }
 
-// Every slot of the rows at once: the values are strided, the vectors are not.
-template <bool kForm>
+// Every slot of the rows at once: the values are strided, the vectors are not. With a list the columns are left alone
+// but for those of the first row.
+template <bool kForm, class Strips>
 SM_PASS_TARGET __attribute__((noinline)) void exchange_strip(const UpperRows& a, const Strip& s, const double* x,
                                                              double* y, Sums& form) {
   const double* const value = a.values + s.p;
@@ -121,7 +157,7 @@ SM_PASS_TARGET __attribute__((noinline)) void exchange_strip(const UpperRows& a,
   for (i64 e = 1; e < l; ++e) {
     const i64 k = column[e];
     for (i64 r = 0; r < rows; r += kStripUnit) {
-      __builtin_prefetch(column + e * rows + r + kEntriesAhead);
+      if (Strips::kReadsColumns) __builtin_prefetch(column + e * rows + r + kEntriesAhead);
       __builtin_prefetch(value + e * rows + r + kEntriesAhead);
       Sums v;
       load_strided(value + e + r * l, l, v);
@@ -131,7 +167,7 @@ SM_PASS_TARGET __attribute__((noinline)) void exchange_strip(const UpperRows& a,
   }
   Sums part{};
   for (i64 r = 0; r < rows; r += kStripUnit) {
-    __builtin_prefetch(column + r + kEntriesAhead);
+    if (Strips::kReadsColumns) __builtin_prefetch(column + r + kEntriesAhead);
     __builtin_prefetch(value + r + kEntriesAhead);
     Sums v;
     load_strided(value + r * l, l, v);
@@ -161,8 +197,9 @@ SM_PASS_INLINE double exchange_long(const UpperRows& a, i64& p, i64 end, double 
 }
 
 // y += A x, with what it needs of the vectors made ready just before. Answers x'A x when asked: its terms come along.
-template <bool kForm, class Ready>
-SM_PASS_INLINE double exchange_rows(const UpperRows& a, const double* x, double* y, const Ready& make_ready) {
+template <bool kForm, class Strips, class Ready>
+SM_PASS_INLINE double exchange_rows(const UpperRows& a, Strips strips, const double* x, double* y,
+                                    const Ready& make_ready) {
   const i64* __restrict start = a.row_start;
   const i64* __restrict column = a.col_index;
   const double* __restrict value = a.values;
@@ -170,26 +207,22 @@ SM_PASS_INLINE double exchange_rows(const UpperRows& a, const double* x, double*
   double form = 0.0;
   Sums forms{};
   i64 ready = 0;
-  i64 patience = 1;  // rows before the next look for a strip
   if (!a.is_ascending) make_ready(0, ready = n);
   for (i64 i = 0, p = start[0]; i < n;) {
-    const Strip strip = strip_at(a, i, p);
-    const i64 until = strip.rows > 0 ? i + strip.rows : std::min(n, i + patience);
-    if (strip.rows > 0) {
-      const i64 end = p + strip.rows * strip.length;
-      if (const i64 last = column[end - 1]; last >= ready) {
+    const i64 rows = strips.next(a, i, p);
+    if (rows > 0) {
+      const i64 length = start[i + 1] - p;
+      if (const i64 last = column[p + length - 1] + rows - 1; last >= ready) {
         const i64 from = ready;
         ready = std::min(n, last + kAhead);
         make_ready(from, ready);
       }
-      exchange_strip<kForm>(a, strip, x, y, forms);
-      p = end;
-      i = until;
-      patience = 1;
+      exchange_strip<kForm, Strips>(a, {i, rows, p, length}, x, y, forms);
+      p += rows * length;
+      i += rows;
       continue;
     }
-    patience = std::min<i64>(2 * patience, 32);
-    for (; i < until; ++i) {
+    for (const i64 until = i - rows; i < until; ++i) {
       const i64 end = start[i + 1];
       if (p == end) continue;
       if (const i64 last = column[end - 1]; last >= ready) {
@@ -219,14 +252,14 @@ SM_PASS_INLINE double exchange_rows(const UpperRows& a, const double* x, double*
 
 SM_PASS_TARGET void multiply_one(const UpperRows& a, const double* x, double* y, bool accumulate) {
   if (accumulate) {
-    exchange_rows<false>(a, x, y, Nothing{});
+    exchange_rows<false>(a, Look{}, x, y, Nothing{});
   } else {
-    exchange_rows<false>(a, x, y, Cleared{x, y});
+    exchange_rows<false>(a, Look{}, x, y, Cleared{x, y});
   }
 }
 
-SM_PASS_TARGET double direct(const UpperRows& a, const Direction& d) {
-  return exchange_rows<true>(a, d.p, d.q, Directed{d});
+SM_PASS_TARGET double direct(const UpperRows& a, const i64* strips, const Direction& d) {
+  return exchange_rows<true>(a, Listed{strips}, d.p, d.q, Directed{d});
 }
 
 SM_PASS_TARGET double advance(const Step& s) {
@@ -434,4 +467,4 @@ SM_PASS_TARGET void multiply_several(const UpperRows& a, const double* x, double
   SeveralPass(a, x, y, count, accumulate, window).run();
 }
 
-constexpr Passes kPasses = {multiply_one, multiply_several, direct, advance, measure};
+constexpr Passes kPasses = {multiply_one, multiply_several, list_strips, direct, advance, measure};
