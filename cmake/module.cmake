@@ -61,6 +61,7 @@ add_library(qxesm_objects OBJECT
   forms/quadratic.cpp
   forms/scaling.cpp
   forms/sum.cpp
+  forms/tree_products.cpp
   forms/vector_forms.cpp
   ginv/accumulation.cpp
   ginv/addition.cpp

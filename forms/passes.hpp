@@ -15,7 +15,7 @@ namespace sm {
 inline constexpr int kProductLanes = 8;     // vectors that go through the matrix together
 inline constexpr i64 kProductReach = 2048;  // rows ahead of the one at work that they have side by side
 
-inline i64 strip_words(i64 n) { return n / 12 + 2; }  // a strip has 24 rows at least, and others before it
+inline i64 strip_words(i64 n) { return n / 4 + 2; }  // a strip has 8 rows at least, and others before it
 
 // The diagonal preconditioner, the residual, and what they make the next direction from.
 struct Direction {

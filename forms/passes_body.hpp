@@ -74,6 +74,7 @@ struct Strip {
 constexpr i64 kStripRows = 64;
 constexpr i64 kStripEntries = 1024;  // which stay in the first cache
 constexpr i64 kStripUnit = kSums;    // rows that are taken together
+constexpr i64 kLeastListed = 8;      // and when they are listed
 constexpr i64 kLeastStrip = 24;      // rows that are worth the trouble
 
 // Whether v[k + step] is v[k] + more for k < count.
@@ -84,28 +85,29 @@ SM_PASS_INLINE bool climbs(const i64* v, i64 step, i64 more, i64 count) {
 }
 
 // How many rows from row i on, which begins at p, are a strip; 0 when it begins none.
-SM_PASS_TARGET __attribute__((noinline)) i64 strip_rows(const UpperRows& a, i64 i, i64 p) {
+SM_PASS_TARGET __attribute__((noinline)) i64 strip_rows(const UpperRows& a, i64 i, i64 p, i64 least) {
   const i64* start = a.row_start + i;
   const i64 length = start[1] - p;
   const i64* next = a.col_index + p + length;
   const i64 limit = std::min(a.rows - i, kStripRows);
-  if (limit < kLeastStrip || length < 1 || start[kLeastStrip] - p != kLeastStrip * length || next[-length] != i ||
+  if (limit < least || length < 1 || start[least] - p != least * length || next[-length] != i ||
       next[length - 1] != next[-1] + 1) {
     return 0;  // most often
   }
   i64 rows = 0;
   while (rows + kStripUnit <= limit && climbs(start + rows, 1, length, kStripUnit)) rows += kStripUnit;
   rows = std::min(rows, kStripEntries / length & -kStripUnit);
-  return rows >= kLeastStrip && climbs(a.col_index + p, length, 1, (rows - 1) * length) ? rows : 0;
+  return rows >= least && climbs(a.col_index + p, length, 1, (rows - 1) * length) ? rows : 0;
 }
 
 // What the next rows are: so many of a strip, or, negative, so many others. Either by looking, less and less often
 // where nothing is found, or from a list of that.
 struct Look {
   static constexpr bool kReadsColumns = true;
+  i64 least;
   i64 patience = 1;
   SM_PASS_INLINE i64 next(const UpperRows& a, i64 i, i64 p) {
-    const i64 rows = strip_rows(a, i, p);
+    const i64 rows = strip_rows(a, i, p, least);
     if (rows > 0) {
       patience = 1;
       return rows;
@@ -122,7 +124,7 @@ struct Listed {
 };
 
 SM_PASS_TARGET void list_strips(const UpperRows& a, i64* list) {
-  Look look;
+  Look look{kLeastListed};
   i64* end = list;
   for (i64 i = 0; i < a.rows;) {
     const i64 rows = look.next(a, i, a.row_start[i]);
@@ -252,9 +254,9 @@ SM_PASS_INLINE double exchange_rows(const UpperRows& a, Strips strips, const dou
 
 SM_PASS_TARGET void multiply_one(const UpperRows& a, const double* x, double* y, bool accumulate) {
   if (accumulate) {
-    exchange_rows<false>(a, Look{}, x, y, Nothing{});
+    exchange_rows<false>(a, Look{kLeastStrip}, x, y, Nothing{});
   } else {
-    exchange_rows<false>(a, Look{}, x, y, Cleared{x, y});
+    exchange_rows<false>(a, Look{kLeastStrip}, x, y, Cleared{x, y});
   }
 }
 

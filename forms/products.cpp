@@ -10,6 +10,7 @@
 // A' X is formed for whole matrices, of every kind and format.
 #include "forms/lines.hpp"
 #include "forms/passes.hpp"
+#include "forms/tree_products.hpp"
 #include "store/checks.hpp"
 
 namespace sm {
@@ -78,12 +79,7 @@ void add_block(const View& a, Range outs, Range ins, const double* x, double* y,
   const i64 last = std::max(sums ? outs.last : ins.last, adds ? ins.last : outs.last);
   for (i64 o = first; o <= last; ++o) {
     if (sums && outs.has(o)) y[o - outs.first] += line_sum(a, o, ins, x).total();
-    if (adds && ins.has(o)) {
-      const double t = x[o - ins.first];
-      // Rows of trees are added in the transposed product only, which leaves out those that meet an exact zero.
-      if (std::is_same_v<View, TreeRows> && t == 0.0) continue;
-      line_add(a, o, outs, t, y);
-    }
+    if (adds && ins.has(o)) line_add(a, o, outs, x[o - ins.first], y);
   }
 }
 
@@ -99,6 +95,13 @@ void add_each(const View& a, Range outs, Range ins, const Block& block, bool tra
       }
     }
     add_block(a, outs, ins, x, y, transposed);
+  }
+}
+void add_each(const TreeRows& a, Range outs, Range ins, const Block& block, bool transposed) {
+  if (transposed) {
+    add_transposed_tree_product(a, block);
+  } else {
+    add_tree_product(a, block, outs, ins);
   }
 }
 
