@@ -87,7 +87,7 @@ inline Pattern patched(Random& random, std::int64_t n) {
   Pattern rows = scattered(random, n, 2);
   for (std::int64_t i = random.below(20); i < n;) {
     std::set<std::int64_t> distances;
-    for (std::int64_t k = random.below(12); k > 0; --k) distances.insert(1 + random.below(n));
+    for (std::int64_t k = random.below(12); k > 0; --k) distances.insert(1 + random.below(1 + n / 8));
     const std::int64_t end = std::min(n, i + 1 + random.below(120));
     for (; i < end; ++i) {
       rows[i] = {i};
@@ -96,6 +96,11 @@ inline Pattern patched(Random& random, std::int64_t n) {
       }
     }
     i += random.below(3);
+  }
+  // Here and there a row that is as long as its neighbours and yet does not continue them.
+  for (std::int64_t k = random.below(4); k > 0; --k) {
+    auto& row = rows[random.below(n)];
+    if (row.size() > 1 && row.back() + 1 < n) ++row.back();
   }
   return rows;
 }
