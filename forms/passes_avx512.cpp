@@ -14,6 +14,7 @@ namespace sm {
 namespace {
 
 #include "forms/passes_body.hpp"
+#include "forms/passes_several_body.hpp"
 
 }  // namespace
 

@@ -11,6 +11,7 @@ namespace sm {
 namespace {
 
 #include "forms/passes_body.hpp"
+#include "forms/passes_several_body.hpp"
 
 }  // namespace
 
