@@ -3,7 +3,7 @@
 namespace sm::avl {
 namespace {
 
-Side towards(std::int64_t key, const Node& node) { return key < node.key ? Side::left : Side::right; }
+Side towards(std::int64_t key, const Node& node) { return static_cast<Side>(key >= node.key); }
 
 // Turns the child on `side` up into the place of `top`, and returns it. Heights are the caller's business.
 Node* rotate(Node& top, Side side) {
@@ -56,32 +56,21 @@ Balanced restore(Node& top, Side side) {
 
 // Where a key is: at `node`, or else in the gap that the node's thread on `side` spans.
 struct Place {
-  Node* node;
+  Node* node;  // null: not found
   Side side;
   bool held;
 };
 
 Place held_at(Node* node) { return {node, Side::left, true}; }
 
-Place descend(Word root, std::int64_t key) {
-  Node* node = node_at(root);
-  while (key != node->key) {
-    const bool before = key < node->key;
-    const Word link = before ? node->left : node->right;
-    if (is_thread(link)) return {node, before ? Side::left : Side::right, false};
-    node = node_at(link);
-  }
-  return held_at(node);
-}
-
-// The place of `key` if it is at `node`, at a neighbour, or in a gap beside it; else by a descent.
-Place locate(Word root, std::int64_t key, Node* node) {
+// The place of `key` if it is at `node`, at a neighbour, or in a gap beside it.
+Place locate(std::int64_t key, Node* node) {
   if (key == node->key) return held_at(node);
   const Side side = towards(key, *node);
   Node* next = neighbour(node, side);
   if (next) {
     if (key == next->key) return held_at(next);
-    if (towards(key, *next) == side) return descend(root, key);
+    if (towards(key, *next) == side) return {};
     // Of two neighbours one lies below the other, and only that one has a thread across the gap.
     if (has_child(*node, side)) return {next, opposite(side), false};
   }
@@ -133,6 +122,62 @@ void grow(Word& root, Node* node, Node* before, Node* after) {
     set_higher(*parent, side);
     top = parent;
   }
+}
+
+// Insertion with a descent from the root (Knuth's algorithm A): what can change its balance is the last uneven node on
+// the way, or the root, and the even ones below it.
+inline Node* insert_below(Word& root, Node& node, std::int64_t& deep) {
+  const std::int64_t key = node.key;
+  Word* critical = &root;  // leads to the last uneven node so far
+  Word* link = &root;      // leads to `at`
+  Node* at = node_at(root);
+  Word word = 0;
+  Side side = Side::left;
+  for (int depth = 0;; ++depth) {
+    if (depth == kDeep) ++deep;
+    if (key == at->key) return at;
+    side = towards(key, *at);
+    critical = (at->left | at->right) & SM_LINK_BALANCE ? link : critical;
+    link = &link_of(*at, side);
+    word = *link;
+    if (is_thread(word)) break;
+    at = node_at(word);
+  }
+  link_of(node, side) = word & ~SM_LINK_BALANCE;
+  link_of(node, opposite(side)) = address_of(at) | SM_LINK_THREAD;
+  *link = address_of(&node) | (word & SM_LINK_BALANCE);
+
+  Node& top = *node_at(*critical);
+  side = towards(key, top);
+  for (Node* p = target(top, side); p != &node;) {
+    Word& below = link_of(*p, towards(key, *p));
+    p = node_at(below);
+    below |= SM_LINK_BALANCE;
+  }
+  Word& far = link_of(top, opposite(side));
+  Word& near = link_of(top, side);
+  if (far & SM_LINK_BALANCE) {
+    far &= ~SM_LINK_BALANCE;
+  } else if (!(near & SM_LINK_BALANCE)) {
+    near |= SM_LINK_BALANCE;
+  } else {
+    replace_below(*critical, restore(top, side).top);
+  }
+  return &node;
+}
+
+// Insertion beside `last`, without a descent where its neighbours tell the place.
+Node* insert_beside(Word& root, Node& node, Hint& hint) {
+  const Place place = locate(node.key, hint.last);
+  if (!place.node) return insert_below(root, node, hint.deep);
+  if (place.held) return place.node;
+  Node* beyond = target(*place.node, place.side);
+  link_of(node, place.side) = address_of(beyond) | SM_LINK_THREAD;
+  link_of(node, opposite(place.side)) = address_of(place.node) | SM_LINK_THREAD;
+  set_child(*place.node, place.side, &node);
+  const bool in_front = place.side == Side::left;
+  grow(root, &node, in_front ? beyond : place.node, in_front ? place.node : beyond);
+  return &node;
 }
 
 // A tree of height h holds at least F(h + 2) - 1 nodes, F the Fibonacci numbers (Adelson-Velsky and Landis), which puts
@@ -221,25 +266,18 @@ void shrink(Path& path) {
 }  // namespace
 
 Node* insert(Word& root, Node& node, Hint& hint) {
+  Node* result = &node;
   if (root == 0) {
     node.left = node.right = SM_LINK_THREAD;
     root = address_of(&node);
-    hint = {&root, root, &node};
-    return &node;
+  } else if (hint.root == &root && hint.word == root) {
+    result = insert_beside(root, node, hint);
+  } else {
+    result = insert_below(root, node, hint.deep);
   }
-  const bool hinted = hint.root == &root && hint.word == root;
-  const Place place = hinted ? locate(root, node.key, hint.last) : descend(root, node.key);
-  Node* result = place.node;
-  if (!place.held) {
-    result = &node;
-    Node* beyond = target(*place.node, place.side);
-    link_of(node, place.side) = address_of(beyond) | SM_LINK_THREAD;
-    link_of(node, opposite(place.side)) = address_of(place.node) | SM_LINK_THREAD;
-    set_child(*place.node, place.side, &node);
-    const bool in_front = place.side == Side::left;
-    grow(root, &node, in_front ? beyond : place.node, in_front ? place.node : beyond);
-  }
-  hint = {&root, root, result};
+  hint.root = &root;
+  hint.word = root;
+  hint.last = result;
   return result;
 }
 
@@ -263,7 +301,7 @@ bool remove(Word& root, std::int64_t key, Hint& hint) {
     node = has_child(*node, side) ? target(*node, side) : nullptr;
   }
   if (!node) return false;
-  hint = {};
+  hint.root = nullptr;
   if (has_child(*node, Side::left) && has_child(*node, Side::right)) {
     unlink_inner(path, node);
   } else {

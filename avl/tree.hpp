@@ -21,7 +21,9 @@ struct Hint {
   const Word* root;
   Word word;
   Node* last;
+  std::int64_t deep;  // descents of insertions that went below kDeep nodes, for whoever wants to know
 };
+constexpr int kDeep = 12;
 
 // Links `node` in under its key and returns it, or returns the node that holds the key. Cost: constant when the key
 // is that of the hint's node, or falls on or before its neighbour on either side; else one descent from the root. To it

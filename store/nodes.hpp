@@ -13,8 +13,40 @@ inline MemoryPool* tree_pool(SmMatrix& m) { return is_symmetric_sparse(m) ? m.as
 // Sizes slabs and roots for row_capacity rows and takes the first slab and the roots from the trees' pool.
 [[nodiscard]] SmStatus start_trees(SmMatrix& m, i64 slab_nodes);
 
+// A fresh slab, its first node the spare one. On failure there is no spare node, and entries are refused from then on.
+[[nodiscard]] SmStatus take_slab(SmMatrix& m);
+
 // Enters (row, col), growing the matrix when the index is past its size. 101, 105, or 0.
 [[nodiscard]] SmStatus enter_node(SmMatrix& m, i64 row, i64 col, bool add, double value);
+
+inline i64 node_stride(const SmMatrix& m) { return (m.node_size + 7) & ~i64{7}; }
+
+// The spare node has been linked in: count it and make the next one ready.
+[[nodiscard]] inline SmStatus advance_spare(SmMatrix& m) {
+  ++m.nnz;
+  m.slab_used += node_stride(m);
+  if (m.slab_used > m.slab_bytes) return take_slab(m);
+  m.spare_node = m.next_node;
+  m.next_node = m.spare_node + 1;
+  return SM_OK;
+}
+
+// Enters a column into the tree at `root` of a matrix that covers it, has a spare node and is not full. 101 or 0.
+[[nodiscard]] inline SmStatus enter_covered(SmMatrix& m, uint64_t* root, i64 col, bool add, double value) {
+  NonzeroNode* spare = m.spare_node;
+  spare->key = col;
+  spare->value = value;
+  NonzeroNode* node = m.tree->insert(m.tree, root, spare);
+  if (node == spare) return advance_spare(m);
+  node->value = add ? node->value + value : value;
+  return SM_OK;
+}
+
+// An open symmetric sparse matrix keeps a word behind its roots: the address of its first slab, in which the seeded
+// diagonal of row i is node i, as far as that slab goes.
+inline const NonzeroNode* seeded_diagonal(const SmMatrix& m, i64 row) {
+  return reinterpret_cast<const NonzeroNode*>(m.sym_roots[m.row_capacity]) + row;
+}
 
 inline NonzeroNode* first_node(SmMatrix& m, i64 row) {
   uint64_t* roots = roots_of(m);
