@@ -1,16 +1,22 @@
 #include "avl/hub.hpp"
 
+#include <algorithm>
 #include <bit>
-#include <limits>
 
 namespace sm::avl {
 namespace {
 
 using Bits = std::uint64_t;
 constexpr std::uint64_t kNone = ~std::uint64_t{0};
-constexpr std::uint64_t kUnit = 8;          // addresses of nodes are multiples of it
-constexpr Word kReach = Word{1} << 34;      // half of what 32 bits of units span
-constexpr std::uint64_t kLeastMargin = 64;  // keys that may follow on either side, and a 16th of the span
+constexpr std::uint64_t kMiddle = std::uint64_t{1} << 63;
+constexpr std::uint64_t kUnit = 8;        // addresses of nodes are multiples of it
+constexpr Word kReach = Word{1} << 34;    // half of what 32 bits of units span
+constexpr std::uint64_t kLeastRoom = 64;  // for keys beyond those held, on either side, and a 16th of the span
+constexpr std::uint64_t kShareOfRoom = 16;
+
+std::uint64_t place_of(const Hub& hub, std::int64_t key) {
+  return static_cast<std::uint64_t>(key) - static_cast<std::uint64_t>(hub.low);
+}
 
 std::uint64_t last_of(Bits word) { return 63U - static_cast<unsigned>(std::countl_zero(word)); }
 std::uint64_t first_of(Bits word) { return static_cast<unsigned>(std::countr_zero(word)); }
@@ -44,18 +50,22 @@ Node* node_for(const Hub& hub, std::uint64_t place) {
   return place == kNone ? nullptr : node_in(hub, hub.slots[place]);
 }
 
+void mark(Hub& hub, std::uint64_t place) {
+  for (int level = 0; level < hub.levels; ++level, place /= 64) {
+    Bits& word = hub.keys[level][place / 64];
+    const bool known_above = word != 0;
+    word |= Bits{1} << place % 64;
+    if (known_above) return;
+  }
+}
+
 // Notes the node under its key; false when its address is out of reach.
 bool note(Hub& hub, std::uint64_t place, const Node* node) {
   const Word distance = address_of(node) - hub.base;
   if (distance % kUnit != 0 || distance == 0 || distance >= 2 * kReach) return false;
   hub.slots[place] = static_cast<std::uint32_t>(distance / kUnit);
+  mark(hub, place);
   ++hub.count;
-  for (int level = 0; level < hub.levels; ++level, place /= 64) {
-    Bits& word = hub.keys[level][place / 64];
-    const bool known_above = word != 0;
-    word |= Bits{1} << place % 64;
-    if (known_above) break;
-  }
   return true;
 }
 
@@ -69,16 +79,13 @@ unsigned height_of(Node* top) {
   }
 }
 
-// A span of keys with room on either side.
-void set_span(Hub& hub, std::int64_t least, std::int64_t most) {
-  const std::uint64_t held = static_cast<std::uint64_t>(most) - static_cast<std::uint64_t>(least);
-  const std::uint64_t margin = held / 16 + kLeastMargin;
-  const std::uint64_t below = static_cast<std::uint64_t>(least) - (std::uint64_t{1} << 63);
-  const std::uint64_t above =
-      static_cast<std::uint64_t>(std::numeric_limits<std::int64_t>::max()) - static_cast<std::uint64_t>(most);
-  const std::uint64_t down = below < margin ? below : margin;
-  hub.low = static_cast<std::int64_t>(static_cast<std::uint64_t>(least) - down);
-  hub.span = held + 1 + down + (above < margin ? above : margin);
+// A span of keys with room on either side, as far as there are keys.
+void set_span(Hub& hub, std::int64_t least, std::int64_t most, std::uint64_t room_below, std::uint64_t room_above) {
+  const std::uint64_t first = static_cast<std::uint64_t>(least) + kMiddle;  // from 0, in the order of the keys
+  const std::uint64_t last = static_cast<std::uint64_t>(most) + kMiddle;
+  const std::uint64_t down = std::min(first, room_below);
+  hub.low = static_cast<std::int64_t>(first - down - kMiddle);
+  hub.span = last - first + 1 + down + std::min(kNone - last, room_above);
 }
 
 // Everything in one block: the levels, and the slots behind them.
@@ -106,6 +113,30 @@ bool take_table(Hub& hub, HostServices& services) {
     block += sizes[level];
   }
   hub.slots = reinterpret_cast<std::uint32_t*>(block);
+  return true;
+}
+
+bool is_dense(const Hub& hub, std::uint64_t count) { return hub.span != 0 && hub.span / kHubSparsest <= count; }
+
+// A larger table, so that `key` is inside and others may follow on its side. False when the keys are too sparse for it
+// or memory is short.
+bool widen(Hub& hub, HostServices& services, std::int64_t key) {
+  const auto most = static_cast<std::int64_t>(static_cast<std::uint64_t>(hub.low) + hub.span - 1);
+  const std::uint64_t room = hub.span / 2;  // what is copied is paid for by the insertions in between
+  Hub wide = hub;
+  if (key < hub.low) {
+    set_span(wide, key, most, room, 0);
+  } else {
+    set_span(wide, hub.low, key, 0, room);
+  }
+  if (!is_dense(wide, hub.count) || !take_table(wide, services)) return false;
+  const std::uint64_t shift = static_cast<std::uint64_t>(hub.low) - static_cast<std::uint64_t>(wide.low);
+  std::copy_n(hub.slots, hub.span, wide.slots + shift);
+  for (std::uint64_t place = shift; place < shift + hub.span; ++place) {
+    if (wide.slots[place] != 0) mark(wide, place);
+  }
+  close_hub(hub);
+  hub = wide;
   return true;
 }
 
@@ -159,27 +190,33 @@ class Balancer {
 bool open_hub(Hub& hub, HostServices& services, Word root, std::uint64_t& visited) {
   Node* top = node_at(root);
   Node* node = outermost(top, Side::left);
-  set_span(hub, node->key, outermost(top, Side::right)->key);
+  const std::int64_t most = outermost(top, Side::right)->key;
+  const std::uint64_t room =
+      (static_cast<std::uint64_t>(most) - static_cast<std::uint64_t>(node->key)) / kShareOfRoom + kLeastRoom;
+  set_span(hub, node->key, most, room, room);
   // A tree of that height holds half as many nodes as would fill it, give or take; the walk tells.
   const std::uint64_t likely = std::uint64_t{1} << (height_of(top) - 1);
   visited = 0;
-  if (hub.span / kHubSparsest > likely || !take_table(hub, services)) return false;
+  if (!is_dense(hub, likely) || !take_table(hub, services)) return false;
   hub.word = root;
   hub.count = 0;
   hub.base = address_of(top) - kReach;
   bool reached = true;
   for (; node && reached; node = sm_node_next(node)) {
-    reached = note(hub, static_cast<std::uint64_t>(node->key) - static_cast<std::uint64_t>(hub.low), node);
+    reached = note(hub, place_of(hub, node->key), node);
   }
   visited = hub.count;
-  if (reached && hub.span / kHubSparsest <= hub.count) return true;
+  if (reached && is_dense(hub, hub.count)) return true;
   close_hub(hub);
   return false;
 }
 
-Node* insert(Hub& hub, Node& node) {
-  const std::uint64_t place = static_cast<std::uint64_t>(node.key) - static_cast<std::uint64_t>(hub.low);
-  if (place >= hub.span) return nullptr;
+Node* insert(Hub& hub, HostServices& services, Node& node) {
+  std::uint64_t place = place_of(hub, node.key);
+  if (place >= hub.span) {
+    if (!widen(hub, services, node.key)) return nullptr;
+    place = place_of(hub, node.key);
+  }
   if (const std::uint32_t slot = hub.slots[place]) return node_in(hub, slot);
   Node* before = node_for(hub, key_below(hub, place));
   Node* after = node_for(hub, key_above(hub, place));
@@ -194,7 +231,7 @@ Node* insert(Hub& hub, Node& node) {
 }
 
 Node* find(const Hub& hub, std::int64_t key) {
-  const std::uint64_t place = static_cast<std::uint64_t>(key) - static_cast<std::uint64_t>(hub.low);
+  const std::uint64_t place = place_of(hub, key);
   return place < hub.span && hub.slots[place] != 0 ? node_in(hub, hub.slots[place]) : nullptr;
 }
 

@@ -30,14 +30,14 @@ struct Hub {
 };
 
 // Enters the tree into `hub` if its keys are dense enough and there is memory. Answers whether; `visited` is the number
-// of nodes looked at. The table takes 4 bytes for a key between the smallest and the largest one, at most
-// kHubSparsest of them for a node.
+// of nodes looked at. The table takes 4 bytes for every key between the smallest and the largest one and for some room
+// beyond, kHubSparsest of them for a node at most.
 constexpr std::uint64_t kHubSparsest = 16;
 bool open_hub(Hub& hub, HostServices& services, Word root, std::uint64_t& visited);
 
-// Links `node` in under its key and returns it, or returns the node that holds the key; null, with nothing changed, for
-// a key or an address beyond the reach of the hub's table.
-Node* insert(Hub& hub, Node& node);
+// Links `node` in under its key and returns it, or returns the node that holds the key. Null, with the tree unchanged,
+// for a key or an address that no table of this density can reach, or when memory for a larger one is short.
+Node* insert(Hub& hub, HostServices& services, Node& node);
 
 // The node that holds `key`, or null.
 Node* find(const Hub& hub, std::int64_t key);

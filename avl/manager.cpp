@@ -28,7 +28,7 @@ struct Manager {
   Extension* extension;
   Manager* previous;
   Manager* next;
-  Hint hint;
+  Hints hints;
   std::int64_t patience;  // deep descents before the next look
   std::int64_t hub_count;
   Hub hubs[kHubs];
@@ -69,16 +69,16 @@ void end_hub(Manager& m, Word& root) {
   const Word before = root;
   settle(*hub, root);
   m.patience = std::max(kDeepDescents, static_cast<std::int64_t>(hub->count / 4));
-  m.hint.deep = 0;
-  m.hint.root = nullptr;
+  m.hints.deep = 0;
   hub->word = before;
   drop_hub(m, *hub);
-  forget_hub_at(m, root);
+  if (root != before) forget_hub_at(m, root);
+  forget(m.hints, root);
 }
 
 // Insertions went deep of late, the last of them in the tree at `root`.
 void look_for_hub(Manager& m, Word root) {
-  m.hint.deep = 0;
+  m.hints.deep = 0;
   m.patience = kDeepDescents;
   if (m.hub_count == kHubs || hub_at(m, root)) return;
   std::uint64_t visited = 0;
@@ -92,12 +92,11 @@ void look_for_hub(Manager& m, Word root) {
 
 NonzeroNode* insert_with_hubs(Manager& m, Word& root, Node& node) {
   if (Hub* hub = hub_at(m, root)) {
-    m.hint.root = nullptr;
-    if (Node* result = insert(*hub, node)) return result;
+    if (Node* result = insert(*hub, *m.extension->services, node)) return result;
     end_hub(m, root);
   }
   const Word before = root;
-  Node* result = insert(root, node, m.hint);
+  Node* result = insert(root, node, m.hints);
   if (root != before) forget_hub_at(m, root);
   return result;
 }
@@ -114,8 +113,8 @@ void destroy_manager(NonzeroTree* tree) {
 
 NonzeroNode* insert_node(NonzeroTree* tree, std::uint64_t* root, NonzeroNode* node) {
   Manager& m = manager_of(tree);
-  Node* result = m.hub_count == 0 ? insert(*root, *node, m.hint) : insert_with_hubs(m, *root, *node);
-  if (m.hint.deep >= m.patience) look_for_hub(m, *root);
+  Node* result = m.hub_count == 0 ? insert(*root, *node, m.hints) : insert_with_hubs(m, *root, *node);
+  if (m.hints.deep >= m.patience) look_for_hub(m, *root);
   return result;
 }
 
@@ -128,7 +127,7 @@ std::int64_t remove_node(NonzeroTree* tree, std::uint64_t* root, const std::int6
   Manager& m = manager_of(tree);
   end_hub(m, *root);
   const Word before = *root;
-  const bool removed = remove(*root, *key, m.hint);
+  const bool removed = remove(*root, *key, m.hints);
   if (*root != before) forget_hub_at(m, *root);
   return removed ? 1 : 0;
 }

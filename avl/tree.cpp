@@ -166,11 +166,10 @@ inline Node* insert_below(Word& root, Node& node, std::int64_t& deep) {
   return &node;
 }
 
-// Insertion beside `last`, without a descent where its neighbours tell the place.
-Node* insert_beside(Word& root, Node& node, Hint& hint) {
-  const Place place = locate(node.key, hint.last);
-  if (!place.node) return insert_below(root, node, hint.deep);
-  if (place.held) return place.node;
+// Insertion beside `last`: null, with nothing changed, where its neighbours do not tell the place.
+Node* insert_beside(Word& root, Node& node, Node* last) {
+  const Place place = locate(node.key, last);
+  if (!place.node || place.held) return place.node;
   Node* beyond = target(*place.node, place.side);
   link_of(node, place.side) = address_of(beyond) | SM_LINK_THREAD;
   link_of(node, opposite(place.side)) = address_of(place.node) | SM_LINK_THREAD;
@@ -179,6 +178,11 @@ Node* insert_beside(Word& root, Node& node, Hint& hint) {
   grow(root, &node, in_front ? beyond : place.node, in_front ? place.node : beyond);
   return &node;
 }
+
+// A hint that was no help for a while is looked at now and then only: its node may be far from any cache.
+constexpr std::uint64_t kTrusted = 4;
+constexpr std::uint64_t kNowAndThen = 16;
+bool is_promising(const Hint& hint) { return hint.misses < kTrusted || hint.misses % kNowAndThen == 0; }
 
 // A tree of height h holds at least F(h + 2) - 1 nodes, F the Fibonacci numbers (Adelson-Velsky and Landis), which puts
 // h below 1.4405 log2(n + 2). Nodes take 32 of at most 2^64 bytes, so n < 2^59 and h < 86.
@@ -265,19 +269,27 @@ void shrink(Path& path) {
 
 }  // namespace
 
-Node* insert(Word& root, Node& node, Hint& hint) {
-  Node* result = &node;
-  if (root == 0) {
+Node* insert(Word& root, Node& node, Hints& hints) {
+  const Word word = root;
+  if (word == 0) {
     node.left = node.right = SM_LINK_THREAD;
     root = address_of(&node);
-  } else if (hint.root == &root && hint.word == root) {
-    result = insert_beside(root, node, hint);
-  } else {
-    result = insert_below(root, node, hint.deep);
+    hint_of(hints, root) = {root, &node, 0, 0};
+    return &node;
   }
-  hint.root = &root;
-  hint.word = root;
-  hint.last = result;
+  const Hint& hint = hint_of(hints, word);
+  Node* result = nullptr;
+  std::uint64_t misses = 0;
+  if (hint.word == word) {
+    misses = hint.misses + 1;
+    if (is_promising(hint)) result = insert_beside(root, node, hint.last);
+  }
+  if (result) {
+    misses = 0;
+  } else {
+    result = insert_below(root, node, hints.deep);
+  }
+  hint_of(hints, root) = {root, result, misses, 0};
   return result;
 }
 
@@ -290,7 +302,7 @@ Node* find(Word root, std::int64_t key) {
   return node;
 }
 
-bool remove(Word& root, std::int64_t key, Hint& hint) {
+bool remove(Word& root, std::int64_t key, Hints& hints) {
   Path path;
   path.root = &root;
   path.length = 0;
@@ -301,13 +313,14 @@ bool remove(Word& root, std::int64_t key, Hint& hint) {
     node = has_child(*node, side) ? target(*node, side) : nullptr;
   }
   if (!node) return false;
-  hint.root = nullptr;
+  forget(hints, root);
   if (has_child(*node, Side::left) && has_child(*node, Side::right)) {
     unlink_inner(path, node);
   } else {
     unlink_edge(path, node);
   }
   shrink(path);
+  forget(hints, root);
   return true;
 }
 

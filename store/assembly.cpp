@@ -108,7 +108,7 @@ inline bool is_plain_entry(const SmMatrix& m, i64 row, i64 col) {
 SmStatus assign(SmMatrix& m, i64 row, i64 col, bool add, double value) {
   if (is_plain_entry(m, row, col)) {
     // In random order the row's diagonal is as far away as its root word, and is wanted right after it.
-    __builtin_prefetch(seeded_diagonal(m, row));
+    __builtin_prefetch(seeded_diagonal(m).slab + row);
     SM_TRY(enter_covered(m, m.sym_roots + row, col, add, value));
     void_results(m);
     return SM_OK;

@@ -12,9 +12,11 @@ namespace {
 
 constexpr i64 kRootSlack = 21;  // a root array that grows reaches this many words past the row that made it grow
 
-// One word more than there are roots: seeded_diagonal().
+constexpr i64 kSeededWords = sizeof(SeededDiagonal) / sizeof(uint64_t);
+
+// Behind the root words there is room for seeded_diagonal().
 SmStatus take_roots(SmMatrix& m, i64 capacity, uint64_t*& roots) {
-  return allocate(tree_pool(m), capacity + 1, Fill::zero, roots);
+  return allocate(tree_pool(m), capacity + kSeededWords, Fill::zero, roots);
 }
 
 SmStatus grow_roots(SmMatrix& m, i64 row) {
@@ -23,7 +25,7 @@ SmStatus grow_roots(SmMatrix& m, i64 row) {
   SM_TRY(take_roots(m, row + kRootSlack, grown));
   uint64_t*& roots = roots_of(m);
   std::copy_n(roots, m.row_capacity, grown);
-  grown[row + kRootSlack] = roots[m.row_capacity];
+  std::copy_n(roots + m.row_capacity, kSeededWords, grown + row + kRootSlack);
   give_back(tree_pool(m), roots);
   roots = grown;
   m.row_capacity = row + kRootSlack;
@@ -64,9 +66,7 @@ SmStatus start_trees(SmMatrix& m, i64 slab_nodes) {
   m.slab_nodes = slab_nodes;
   m.slab_bytes = m.node_size * slab_nodes;
   SM_TRY(take_slab(m));
-  SM_TRY(take_roots(m, m.row_capacity, roots_of(m)));
-  roots_of(m)[m.row_capacity] = reinterpret_cast<uint64_t>(m.spare_node);
-  return SM_OK;
+  return take_roots(m, m.row_capacity, roots_of(m));
 }
 
 SmStatus enter_node(SmMatrix& m, i64 row, i64 col, bool add, double value) {
@@ -75,6 +75,13 @@ SmStatus enter_node(SmMatrix& m, i64 row, i64 col, bool add, double value) {
   uint64_t* root = roots_of(m) + row;
   if (m.nnz >= SM_MAX_ELEMENTS && !m.tree->find(m.tree, root, &col)) return SM_TOO_LARGE;
   return enter_covered(m, root, col, add, value);
+}
+
+SmStatus seed_diagonal(SmMatrix& m) {
+  NonzeroNode* slab = m.spare_node;
+  for (i64 i = 0; i < m.rows; ++i) SM_TRY(enter_covered(m, m.sym_roots + i, i, false, 0.0));
+  seeded_diagonal(m) = {slab, std::min(m.rows, m.slab_nodes)};
+  return SM_OK;
 }
 
 }  // namespace sm

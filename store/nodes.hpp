@@ -16,6 +16,9 @@ inline MemoryPool* tree_pool(SmMatrix& m) { return is_symmetric_sparse(m) ? m.as
 // A fresh slab, its first node the spare one. On failure there is no spare node, and entries are refused from then on.
 [[nodiscard]] SmStatus take_slab(SmMatrix& m);
 
+// Enters a zero on every diagonal position of a symmetric matrix whose trees were just started. 101 or 0.
+[[nodiscard]] SmStatus seed_diagonal(SmMatrix& m);
+
 // Enters (row, col), growing the matrix when the index is past its size. 101, 105, or 0.
 [[nodiscard]] SmStatus enter_node(SmMatrix& m, i64 row, i64 col, bool add, double value);
 
@@ -42,10 +45,15 @@ inline i64 node_stride(const SmMatrix& m) { return (m.node_size + 7) & ~i64{7}; 
   return SM_OK;
 }
 
-// An open symmetric sparse matrix keeps a word behind its roots: the address of its first slab, in which the seeded
-// diagonal of row i is node i, as far as that slab goes.
-inline const NonzeroNode* seeded_diagonal(const SmMatrix& m, i64 row) {
-  return reinterpret_cast<const NonzeroNode*>(m.sym_roots[m.row_capacity]) + row;
+// What an open symmetric sparse matrix keeps behind its root words: where the zeros of its diagonal were entered. The
+// node of row i is slab + i for every row below `rows`. It is the first of its row for as long as the matrix is open,
+// because nothing left of the diagonal is taken and nothing is removed but by closing, which spares the diagonal.
+struct SeededDiagonal {
+  NonzeroNode* slab;
+  i64 rows;
+};
+inline SeededDiagonal& seeded_diagonal(const SmMatrix& m) {
+  return *reinterpret_cast<SeededDiagonal*>(m.sym_roots + m.row_capacity);
 }
 
 inline NonzeroNode* first_node(SmMatrix& m, i64 row) {
