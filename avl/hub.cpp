@@ -188,16 +188,17 @@ class Balancer {
 }  // namespace
 
 bool open_hub(Hub& hub, HostServices& services, Word root, std::uint64_t& visited) {
+  visited = 0;
   Node* top = node_at(root);
+  const unsigned height = height_of(top);
+  if (height < kHubLeastHeight) return false;
   Node* node = outermost(top, Side::left);
   const std::int64_t most = outermost(top, Side::right)->key;
   const std::uint64_t room =
       (static_cast<std::uint64_t>(most) - static_cast<std::uint64_t>(node->key)) / kShareOfRoom + kLeastRoom;
   set_span(hub, node->key, most, room, room);
   // A tree of that height holds half as many nodes as would fill it, give or take; the walk tells.
-  const std::uint64_t likely = std::uint64_t{1} << (height_of(top) - 1);
-  visited = 0;
-  if (!is_dense(hub, likely) || !take_table(hub, services)) return false;
+  if (!is_dense(hub, std::uint64_t{1} << (height - 1)) || !take_table(hub, services)) return false;
   hub.word = root;
   hub.count = 0;
   hub.base = address_of(top) - kReach;

@@ -21,7 +21,7 @@ struct Extension {
 };
 
 constexpr std::int64_t kHubs = 8;
-constexpr std::int64_t kDeepDescents = 64;  // so many go before a tree is looked at as a hub
+constexpr Word kNoSample = SM_LINK_TAGS;  // no root word reads that
 
 struct Manager {
   NonzeroTree table;
@@ -29,8 +29,8 @@ struct Manager {
   Manager* previous;
   Manager* next;
   Hints hints;
-  std::int64_t patience;  // deep descents before the next look
   std::int64_t hub_count;
+  std::int64_t patience;  // samples to pass over before the next one is looked at
   Hub hubs[kHubs];
 };
 
@@ -68,29 +68,28 @@ void end_hub(Manager& m, Word& root) {
   if (!hub) return;
   const Word before = root;
   settle(*hub, root);
-  m.patience = std::max(kDeepDescents, static_cast<std::int64_t>(hub->count / 4));
-  m.hints.deep = 0;
+  m.patience = static_cast<std::int64_t>(hub->count / (4 * kSampled));
   hub->word = before;
   drop_hub(m, *hub);
   if (root != before) forget_hub_at(m, root);
   forget(m.hints, root);
 }
 
-// Insertions went deep of late, the last of them in the tree at `root`.
+// The tree at `root` was taken as a sample. Where insertions go to a few large trees the samples do too.
 void look_for_hub(Manager& m, Word root) {
-  m.hints.deep = 0;
-  m.patience = kDeepDescents;
-  if (m.hub_count == kHubs || hub_at(m, root)) return;
+  m.hints.sample = kNoSample;
+  if (m.patience-- > 0 || m.hub_count == kHubs || hub_at(m, root)) return;
+  m.patience = 0;
   std::uint64_t visited = 0;
-  Hub& hub = m.hubs[m.hub_count];
-  if (open_hub(hub, *m.extension->services, root, visited)) {
+  if (open_hub(m.hubs[m.hub_count], *m.extension->services, root, visited)) {
     ++m.hub_count;
   } else {
-    m.patience += static_cast<std::int64_t>(visited);
+    m.patience = static_cast<std::int64_t>(visited / kSampled);
   }
 }
 
-NonzeroNode* insert_with_hubs(Manager& m, Word& root, Node& node) {
+[[gnu::noinline]] NonzeroNode* insert_with_hubs(Manager& m, Word& root, Node& node) {
+  if (root == m.hints.sample) look_for_hub(m, root);
   if (Hub* hub = hub_at(m, root)) {
     if (Node* result = insert(*hub, *m.extension->services, node)) return result;
     end_hub(m, root);
@@ -113,9 +112,8 @@ void destroy_manager(NonzeroTree* tree) {
 
 NonzeroNode* insert_node(NonzeroTree* tree, std::uint64_t* root, NonzeroNode* node) {
   Manager& m = manager_of(tree);
-  Node* result = m.hub_count == 0 ? insert(*root, *node, m.hints) : insert_with_hubs(m, *root, *node);
-  if (m.hints.deep >= m.patience) look_for_hub(m, *root);
-  return result;
+  if (m.hub_count != 0 || *root == m.hints.sample) return insert_with_hubs(m, *root, *node);
+  return insert(*root, *node, m.hints);
 }
 
 NonzeroNode* find_node(NonzeroTree* tree, std::uint64_t* root, const std::int64_t* key) {
@@ -147,7 +145,7 @@ NonzeroTree* create_manager(TreeExtension* extension, const TreeParms* parms, vo
   manager->next = owner->managers;
   if (owner->managers) owner->managers->previous = manager;
   owner->managers = manager;
-  manager->patience = kDeepDescents;
+  manager->hints.sample = kNoSample;
   manager->table.destroy = destroy_manager;
   manager->table.insert = insert_node;
   manager->table.find = find_node;

@@ -124,28 +124,45 @@ void grow(Word& root, Node* node, Node* before, Node* after) {
   }
 }
 
-// Insertion with a descent from the root (Knuth's algorithm A): what can change its balance is the last uneven node on
-// the way, or the root, and the even ones below it.
-inline Node* insert_below(Word& root, Node& node, std::int64_t& deep) {
+// Insertion beside `last`: null, with nothing changed, where its neighbours do not tell the place.
+Node* insert_beside(Word& root, Node& node, Node* last) {
+  const Place place = locate(node.key, last);
+  if (!place.node || place.held) return place.node;
+  Node* beyond = target(*place.node, place.side);
+  link_of(node, place.side) = address_of(beyond) | SM_LINK_THREAD;
+  link_of(node, opposite(place.side)) = address_of(place.node) | SM_LINK_THREAD;
+  set_child(*place.node, place.side, &node);
+  const bool in_front = place.side == Side::left;
+  grow(root, &node, in_front ? beyond : place.node, in_front ? place.node : beyond);
+  return &node;
+}
+
+// On what the functions below leave undone: an insertion waits for nodes that may be far from any cache, and what a
+// processor can hold of the insertions after it decides how many of these waits go on at once. Stores are what it holds
+// fewest of. So the usual ways have no frame, and end in calls.
+
+void note(Hints& hints, Word root, const Node* last, Word misses) {
+  hint_of(hints, root) = {root, address_of(last) | misses};
+}
+
+// The last step of an insertion: rotation below `critical`.
+[[gnu::noinline]] Node* rotate_below(Word& root, Node& node, Word* critical, Hints& hints, Word misses) {
+  Node& top = *node_at(*critical);
+  replace_below(*critical, restore(top, towards(node.key, top)).top);
+  note(hints, root, &node, misses);
+  return &node;
+}
+
+// Links `node` in below `at`, where the descent ended. What can change its balance is the last uneven node on the way, or
+// else the root, to which `critical` leads, and the even ones below it (Knuth's algorithm A).
+[[gnu::noinline]] Node* link_below(Word& root, Node& node, Node* at, Word* critical, Hints& hints, Word misses) {
   const std::int64_t key = node.key;
-  Word* critical = &root;  // leads to the last uneven node so far
-  Word* link = &root;      // leads to `at`
-  Node* at = node_at(root);
-  Word word = 0;
-  Side side = Side::left;
-  for (int depth = 0;; ++depth) {
-    if (depth == kDeep) ++deep;
-    if (key == at->key) return at;
-    side = towards(key, *at);
-    critical = (at->left | at->right) & SM_LINK_BALANCE ? link : critical;
-    link = &link_of(*at, side);
-    word = *link;
-    if (is_thread(word)) break;
-    at = node_at(word);
-  }
-  link_of(node, side) = word & ~SM_LINK_BALANCE;
+  Side side = towards(key, *at);
+  const Word gap = link_of(*at, side);
+  link_of(node, side) = gap & ~SM_LINK_BALANCE;
   link_of(node, opposite(side)) = address_of(at) | SM_LINK_THREAD;
-  *link = address_of(&node) | (word & SM_LINK_BALANCE);
+  link_of(*at, side) = address_of(&node) | (gap & SM_LINK_BALANCE);
+  if (address_of(&node) / sizeof(Node) % kSampled == 0) hints.sample = root;
 
   Node& top = *node_at(*critical);
   side = towards(key, top);
@@ -161,28 +178,51 @@ inline Node* insert_below(Word& root, Node& node, std::int64_t& deep) {
   } else if (!(near & SM_LINK_BALANCE)) {
     near |= SM_LINK_BALANCE;
   } else {
-    replace_below(*critical, restore(top, side).top);
+    return rotate_below(root, node, critical, hints, misses);
   }
+  note(hints, root, &node, misses);
   return &node;
 }
 
-// Insertion beside `last`: null, with nothing changed, where its neighbours do not tell the place.
-Node* insert_beside(Word& root, Node& node, Node* last) {
-  const Place place = locate(node.key, last);
-  if (!place.node || place.held) return place.node;
-  Node* beyond = target(*place.node, place.side);
-  link_of(node, place.side) = address_of(beyond) | SM_LINK_THREAD;
-  link_of(node, opposite(place.side)) = address_of(place.node) | SM_LINK_THREAD;
-  set_child(*place.node, place.side, &node);
-  const bool in_front = place.side == Side::left;
-  grow(root, &node, in_front ? beyond : place.node, in_front ? place.node : beyond);
-  return &node;
+// Insertion with a descent from the root.
+inline Node* insert_from_root(Word& root, Node& node, Hints& hints, Word misses) {
+  const std::int64_t key = node.key;
+  Word* critical = &root;
+  Word* link = &root;  // leads to `at`
+  Node* at = node_at(root);
+  while (key != at->key) {
+    critical = (at->left | at->right) & SM_LINK_BALANCE ? link : critical;
+    link = &link_of(*at, towards(key, *at));
+    const Word word = *link;
+    if (is_thread(word)) return link_below(root, node, at, critical, hints, misses);
+    at = node_at(word);
+  }
+  note(hints, root, at, misses);
+  return at;
 }
 
-// A hint that was no help for a while is looked at now and then only: its node may be far from any cache.
-constexpr std::uint64_t kTrusted = 4;
-constexpr std::uint64_t kNowAndThen = 16;
-bool is_promising(const Hint& hint) { return hint.misses < kTrusted || hint.misses % kNowAndThen == 0; }
+// A tired hint is tried now and then only: its node may be far from any cache.
+constexpr std::int64_t kNowAndThen = 16;
+static_assert(kTired < alignof(Node), "the low bits of an address");
+
+[[gnu::noinline]] Node* insert_hinted(Word& root, Node& node, Hints& hints) {
+  const Word word = hint_of(hints, root).last;
+  const Word misses = word % alignof(Node);
+  if (misses < kTired || node.key % kNowAndThen == 0) {
+    if (Node* result = insert_beside(root, node, reinterpret_cast<Node*>(word - misses))) {
+      note(hints, root, result, 0);
+      return result;
+    }
+  }
+  return insert_from_root(root, node, hints, misses < kTired ? misses + 1 : kTired);
+}
+
+[[gnu::noinline]] Node* plant(Word& root, Node& node, Hints& hints) {
+  node.left = node.right = SM_LINK_THREAD;
+  root = address_of(&node);
+  note(hints, root, &node, 0);
+  return &node;
+}
 
 // A tree of height h holds at least F(h + 2) - 1 nodes, F the Fibonacci numbers (Adelson-Velsky and Landis), which puts
 // h below 1.4405 log2(n + 2). Nodes take 32 of at most 2^64 bytes, so n < 2^59 and h < 86.
@@ -271,26 +311,9 @@ void shrink(Path& path) {
 
 Node* insert(Word& root, Node& node, Hints& hints) {
   const Word word = root;
-  if (word == 0) {
-    node.left = node.right = SM_LINK_THREAD;
-    root = address_of(&node);
-    hint_of(hints, root) = {root, &node, 0, 0};
-    return &node;
-  }
-  const Hint& hint = hint_of(hints, word);
-  Node* result = nullptr;
-  std::uint64_t misses = 0;
-  if (hint.word == word) {
-    misses = hint.misses + 1;
-    if (is_promising(hint)) result = insert_beside(root, node, hint.last);
-  }
-  if (result) {
-    misses = 0;
-  } else {
-    result = insert_below(root, node, hints.deep);
-  }
-  hint_of(hints, root) = {root, result, misses, 0};
-  return result;
+  if (word == 0) return plant(root, node, hints);
+  if (hint_of(hints, word).word == word) return insert_hinted(root, node, hints);
+  return insert_from_root(root, node, hints, 0);
 }
 
 Node* find(Word root, std::int64_t key) {

@@ -20,17 +20,17 @@ namespace sm::avl {
 // its tree. A tree must therefore stay with one set of hints, that is, one manager.
 struct Hint {
   Word word;  // 0: none
-  Node* last;
-  std::uint64_t misses;  // insertions since the last one that it helped
-  std::uint64_t unused;  // as large as a node, so that a word finds its hint without a multiplication
+  Word last;  // the address of the node; in its low bits how often in a row the hint was no help, kTired at most
 };
+constexpr Word kTired = 4;
 constexpr Word kHints = 64;
 
 struct Hints {
   Hint slots[kHints];
-  std::int64_t deep;  // insertions that went below kDeep nodes from the root, for whoever wants to know
+  Word sample;  // the root word of some tree that a key was new to, for whoever looks at trees
 };
-constexpr int kDeep = 12;
+// One in that many new nodes, chosen by address, makes its tree the sample.
+constexpr Word kSampled = 64;
 
 inline Hint& hint_of(Hints& hints, Word word) { return hints.slots[word / sizeof(Node) % kHints]; }
 

@@ -103,20 +103,22 @@ inline bool is_plain_entry(const SmMatrix& m, i64 row, i64 col) {
          m.spare_node && m.sym_roots && m.nnz < SM_MAX_ELEMENTS;
 }
 
-}  // namespace
-
-SmStatus assign(SmMatrix& m, i64 row, i64 col, bool add, double value) {
-  if (is_plain_entry(m, row, col)) {
-    // In random order the row's diagonal is as far away as its root word, and is wanted right after it.
-    __builtin_prefetch(seeded_diagonal(m).slab + row);
-    SM_TRY(enter_covered(m, m.sym_roots + row, col, add, value));
-    void_results(m);
-    return SM_OK;
-  }
+[[gnu::noinline]] SmStatus assign_any(SmMatrix& m, i64 row, i64 col, bool add, double value) {
   if (m.rows < 1) return SM_OK;
   if (m.kind == SM_KIND_NONE) return SM_UNTYPED;
   if (row < 0 || col < 0) return SM_BAD_ARGUMENT;
   SM_TRY(assign_by_kind(m, row, col, add, value));
+  void_results(m);
+  return SM_OK;
+}
+
+}  // namespace
+
+SmStatus assign(SmMatrix& m, i64 row, i64 col, bool add, double value) {
+  if (!is_plain_entry(m, row, col)) return assign_any(m, row, col, add, value);
+  // In random order the row's diagonal is as far away as its root word, and is wanted right after it.
+  __builtin_prefetch(seeded_diagonal(m).slab + row);
+  SM_TRY(enter_covered(m, m.sym_roots + row, col, add, value));
   void_results(m);
   return SM_OK;
 }

@@ -22,8 +22,9 @@ inline Gate may_read(const SmMatrix& m) {
 
 // What was computed from the entries is no longer known.
 inline void void_results(SmMatrix& m) {
-  m.rank = 0;
-  m.log_det = missing();
+  // Entered elements void them time and again, and a look costs less than a store.
+  if (m.rank != 0) m.rank = 0;
+  if (std::bit_cast<std::uint64_t>(m.log_det) != SM_MISSING_BITS) m.log_det = missing();
 }
 
 // Entries of a matrix with a value array are about to change: a separate factor or inverse no longer belongs to them.

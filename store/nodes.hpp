@@ -36,12 +36,12 @@ inline i64 node_stride(const SmMatrix& m) { return (m.node_size + 7) & ~i64{7}; 
 
 // Enters a column into the tree at `root` of a matrix that covers it, has a spare node and is not full. 101 or 0.
 [[nodiscard]] inline SmStatus enter_covered(SmMatrix& m, uint64_t* root, i64 col, bool add, double value) {
-  NonzeroNode* spare = m.spare_node;
-  spare->key = col;
-  spare->value = value;
-  NonzeroNode* node = m.tree->insert(m.tree, root, spare);
-  if (node == spare) return advance_spare(m);
-  node->value = add ? node->value + value : value;
+  m.spare_node->key = col;
+  m.spare_node->value = value;
+  NonzeroNode* node = m.tree->insert(m.tree, root, m.spare_node);
+  // What is not kept over the call need not be saved for it.
+  if (node == m.spare_node) return advance_spare(m);
+  node->value = add ? node->value + m.spare_node->value : m.spare_node->value;
   return SM_OK;
 }
 
