@@ -336,7 +336,6 @@ bool remove(Word& root, std::int64_t key, Hints& hints) {
     node = has_child(*node, side) ? target(*node, side) : nullptr;
   }
   if (!node) return false;
-  forget(hints, root);
   if (has_child(*node, Side::left) && has_child(*node, Side::right)) {
     unlink_inner(path, node);
   } else {

@@ -256,6 +256,43 @@ TEST_F(HubTest, a_dropped_tree_is_forgotten_when_its_root_node_serves_again) {
   }
 }
 
+TEST_F(HubTest, a_node_that_balancing_makes_the_root_brings_no_hint_from_a_tree_it_was_the_root_of) {
+  constexpr std::size_t n = 9000;
+  constexpr std::size_t kPlaces = 64;  // hints lie by the place of the root node, modulo that
+  struct alignas(sizeof(NonzeroNode) * kPlaces) Slab {
+    std::array<NonzeroNode, 2 * n> nodes;
+  };
+  const auto slab = std::make_unique<Slab>();
+  constexpr std::size_t kPlace = 5;
+  NonzeroNode& top = slab->nodes[kPlace];
+  NonzeroNode& stale = slab->nodes[1];
+  std::uint64_t dropped = 0;
+  top.key = 1;
+  stale.key = 2;
+  manager->insert(manager, &dropped, &top);
+  manager->insert(manager, &dropped, &stale);
+  dropped = 0;
+  stale = {SM_LINK_THREAD, SM_LINK_THREAD, n, 0.0};
+  // The hub's other nodes have other places.
+  std::size_t used = kPlace;
+  for (const std::int64_t rank : Dice(17).permutation(n)) {
+    if (rank == n / 2) continue;
+    if (++used % kPlaces == kPlace) ++used;
+    NonzeroNode& node = slab->nodes[used];
+    node.key = 2 * rank;
+    ASSERT_EQ(&node, manager->insert(manager, &root, &node));
+  }
+  ASSERT_EQ(1, hubs());
+  top.key = n;
+  ASSERT_EQ(&top, manager->insert(manager, &root, &top));
+  ASSERT_NE(nullptr, manager->first(manager, &root));
+  ASSERT_EQ(reinterpret_cast<std::uint64_t>(&top), root);
+  NonzeroNode beside = {0, 0, n + 1, 0.0};
+  ASSERT_EQ(&beside, manager->insert(manager, &root, &beside));
+  EXPECT_EQ(&beside, manager->find(manager, &root, &beside.key));
+  EXPECT_EQ(&beside, sm_node_next(&top));
+}
+
 TEST_F(HubTest, without_memory_for_a_table_trees_stay_as_they_are) {
   for (const std::int64_t request : {0, 1}) {  // its pool, its block
     CheckedTree tree(manager, &root);
