@@ -11,13 +11,51 @@ namespace {
 
 NonzeroNode* target(uint64_t link) { return reinterpret_cast<NonzeroNode*>(link & ~SM_LINK_TAGS); }
 
-// The successor of a node, as sm_node_next has it; on the way down what is walked after the nodes passed is asked for.
-NonzeroNode* next_of(const NonzeroNode* node) {
-  NonzeroNode* next = target(node->right);
-  if (node->right & SM_LINK_THREAD) return next;
-  for (; !(next->left & SM_LINK_THREAD); next = target(next->left)) __builtin_prefetch(target(next->right));
-  return next;
-}
+// The walk of one row, node by node as sm_node_next does it. In random order every node is a miss that waits for the one
+// before it; before a subtree of some height is walked, all of it is therefore asked for level by level, where the nodes
+// of a level do not wait for each other.
+class RowWalk {
+ public:
+  NonzeroNode* next_of(const NonzeroNode* node) {
+    NonzeroNode* next = target(node->right);
+    if (node->right & SM_LINK_THREAD) {
+      asked_for_ -= asked_for_ > 0;
+      return next;
+    }
+    const bool asked = asked_for_ > 0;
+    asked_for_ -= asked;
+    if (next->left & SM_LINK_THREAD) return next;
+    NonzeroNode* way[kHeight];  // the last nodes on the way down
+    int depth = 0;
+    for (way[0] = next; !(next->left & SM_LINK_THREAD); way[depth % kHeight] = next) {
+      next = target(next->left);
+      ++depth;
+    }
+    if (!asked && depth >= kLow) ask_for(way[depth < kHeight ? 0 : (depth + 1) % kHeight]);
+    return next;
+  }
+
+ private:
+  static constexpr int kHeight = 8;    // of what is asked for at a time, along its left edge
+  static constexpr int kLow = 2;       // lower subtrees are walked as they come
+  static constexpr int kNodes = 1024;  // asked for at a time at most
+
+  void ask_for(const NonzeroNode* top) {
+    const NonzeroNode* nodes[kNodes];
+    nodes[0] = top;
+    int count = 1;
+    for (int i = 0; i < count; ++i) {
+      for (const uint64_t link : {nodes[i]->left, nodes[i]->right}) {
+        if ((link & SM_LINK_THREAD) || count == kNodes) continue;
+        nodes[count] = target(link);
+        __builtin_prefetch(nodes[count++]);
+      }
+    }
+    asked_for_ = count;
+  }
+
+  int asked_for_ = 0;  // so many nodes ahead have been
+};
 
 // The first nodes of the rows, one row after the other. In random order every node is a miss that waits for the one
 // before it, so what the rows ahead begin with is asked for early: two nodes of each, a row's second node when the
@@ -51,8 +89,9 @@ i64 drop_small_nodes(SmMatrix& m, double tolerance) {
   for (i64 row = 0; row < m.rows; ++row) {
     NonzeroNode* node = starts.of(row);
     if (!node || node->key != row) ++without_diagonal;
+    RowWalk walk;
     while (node) {
-      NonzeroNode* next = next_of(node);
+      NonzeroNode* next = walk.next_of(node);
       if (std::fabs(node->value) <= tolerance) {
         if (keep_diagonal && node->key == row) {
           node->value = 0.0;
@@ -91,7 +130,8 @@ void fill_rows(SmMatrix& m, i64* row_start, i64* col_index, double* nz_values) {
       col_index[k] = row;
       nz_values[k++] = 0.0;
     }
-    for (; node; node = next_of(node)) {
+    RowWalk walk;
+    for (; node; node = walk.next_of(node)) {
       col_index[k] = node->key;
       nz_values[k++] = node->value;
     }
