@@ -85,8 +85,8 @@ bool hangs_on(Node* before, const Node* top) {
 
 // The word that leads to the subtree `top` between `before` and `after`.
 Word& word_above(Word& root, const Node* top, Node* before, Node* after) {
-  if (node_at(root) == top) return root;
-  return hangs_on(before, top) ? before->right : after->left;
+  if (hangs_on(before, top)) return before->right;
+  return after && node_at(root) != top ? after->left : root;
 }
 
 // Makes `child` what `above` leads to, without touching the tags.

@@ -79,7 +79,10 @@ SmStatus enter_node(SmMatrix& m, i64 row, i64 col, bool add, double value) {
 
 SmStatus seed_diagonal(SmMatrix& m) {
   NonzeroNode* slab = m.spare_node;
-  for (i64 i = 0; i < m.rows; ++i) SM_TRY(enter_covered(m, m.sym_roots + i, i, false, 0.0));
+  for (i64 i = 0; i < m.rows; ++i) {
+    if (!m.spare_node) return SM_NO_MEMORY;
+    SM_TRY(enter_covered(m, m.sym_roots + i, i, false, 0.0));
+  }
   seeded_diagonal(m) = {slab, std::min(m.rows, m.slab_nodes)};
   return SM_OK;
 }
