@@ -24,8 +24,9 @@ inline Gate may_read(const SmMatrix& m) {
 
 // What was computed from the entries is no longer known.
 inline void void_results(SmMatrix& m) {
-  m.rank = 0;
-  m.log_det = missing();
+  // Entered elements void them time and again, and a look costs less than a store.
+  if (m.rank != 0) m.rank = 0;
+  if (std::bit_cast<std::uint64_t>(m.log_det) != SM_MISSING_BITS) m.log_det = missing();
 }
 
 // Whether an array of nnz elements at `p` shares any with the value array of the compressed rows, wherever it begins.
