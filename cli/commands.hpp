@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "cli/orderings.hpp"
 #include "cli/progress.hpp"
@@ -69,6 +70,42 @@ struct ConvertOptions {
   std::string to;
 };
 
+// Each of them a path, or empty: not asked for.
+struct PedigreeOptions {
+  std::string pedigree;
+  std::string a;
+  std::string ainv;
+  std::string inbreeding;
+  std::string mendelian;
+  std::string ids;
+  bool report_inbreeding = false;  // of each animal
+  bool report_mendelian = false;
+};
+
+// A mixed model. Lists have an element for each time that an option was given.
+struct ModelOptions {
+  std::string data;
+  std::string formula;
+  bool ml = false;
+  std::string weights;
+  std::vector<std::string> factors;  // "g,f"
+  std::vector<std::string> levels;   // "f=a,b,c"
+  std::string contrasts = "treatment";
+  std::string missing = "drop";
+  std::string pedigree;
+  std::vector<std::string> kinv;       // "name=K.mtx"
+  std::vector<std::string> ids;        // "name=ids.txt"
+  std::vector<std::string> variances;  // "animal=20"
+  std::string start;
+  std::vector<std::string> tests;
+  std::vector<std::string> ratios;
+  std::string predict;
+  bool pev = false;
+  std::string folder;
+  std::string plots;
+  bool dry_run = false;
+};
+
 struct GridOptions {
   std::int64_t nx = 0;
   std::int64_t ny = 0;
@@ -85,6 +122,10 @@ Report run_trace(const TraceOptions& options, const CommonOptions& common, Progr
 Report run_hermite(const HermiteOptions& options, const CommonOptions& common, Progress& progress);
 Report run_estimable(const EstimableOptions& options, const CommonOptions& common, Progress& progress);
 Report run_convert(const ConvertOptions& options, const CommonOptions& common, Progress& progress);
+Report run_pedigree(const PedigreeOptions& options, const CommonOptions& common, Progress& progress);
+Report run_lmm(const ModelOptions& options, const CommonOptions& common, Progress& progress);
+Report run_reml(const ModelOptions& options, const CommonOptions& common, Progress& progress);
+Report run_blup(const ModelOptions& options, const CommonOptions& common, Progress& progress);
 Report run_grid(const GridOptions& options, const CommonOptions& common, Progress& progress);
 
 // A b is called inconsistent with a singular A when its relative residual is above this.

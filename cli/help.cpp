@@ -3,16 +3,25 @@
 namespace sm::cli::help {
 
 const char* const kMain =
-    R"(qxsm - inspect, factor and solve with sparse symmetric matrices
+    R"(qxsm - fit mixed models, and inspect, factor and solve with sparse symmetric matrices
 
-Reads Matrix Market files and works on them through the qxesm module: a fill-reducing order, the factorization
-A = U'DU with rank and log-determinant, solutions of A x = b, and what else is made of a matrix and its inverse.
-Singular matrices are welcome: a pivot that is zero to tolerance is dropped, and what is solved with is then a
-generalized inverse.
+Fits linear mixed models, animal models and Gaussian fields to a table of data (lmm, reml, blup, pedigree). Reads Matrix
+Market files and works on them through the qxesm module: a fill-reducing order, the factorization A = U'DU with rank and
+log-determinant, solutions of A x = b, and what else is made of a matrix and its inverse. Singular matrices are welcome:
+a pivot that is zero to tolerance is dropped, and what is solved with is then a generalized inverse.
 
-Example: solve A x = b for a stiffness matrix, with b = A * 1.
+Example: reaction times of 18 subjects, each with an intercept and a slope of its own.
 
-  $ qxsm solve data/bcsstk13.mtx
+  $ qxsm lmm examples/sleepstudy.csv 'reaction ~ days + (days | subject)'
+  REML criterion at convergence: 1743.6283
+   subject   (Intercept)  612.0899    288.7827   24.74045
+             days          35.0717     14.7821    5.92213  0.066
+   Residual               654.9410     77.1855   25.59182
+  (Intercept)  251.4051      6.8246  17.00   36.838   < 2e-16
+  days          10.4673      1.5458  17.00    6.771  3.26e-06
+  ...
+
+  $ qxsm solve data/bcsstk13.mtx     # a stiffness matrix, with b = A * 1
   matrix             data/bcsstk13.mtx (coordinate real symmetric)
   order              2003 x 2003
   rank               2003 of 2003
@@ -230,6 +239,94 @@ Example: a stiffness matrix as a packed triangle, and back.
   ...
 )";
 
+const char* const kPedigree =
+    R"(Find inbreeding and the inverse relationship matrix of a pedigree
+
+Reads who descends from whom: a table with the columns id, sire and dam (by these names, else its first three), rows in
+any order. Empty fields, NA, 0 and . are unknown parents; a parent without a row of its own is added as a founder. Of A,
+the numerator relationship matrix, the inverse with inbreeding follows from the pedigree alone by Henderson's rules; it
+is sparse, and a million animals take seconds. Animals that descend from themselves are refused and named.
+
+Example: six animals, two of them inbred.
+
+  $ qxsm pedigree data/six_animals.csv --ainv ainv.mtx --inbreeding f.csv
+  animals          6
+  founders         2
+  inbred           2
+  mean F           0.0416667
+  largest F        0.125
+  log-determinant  -2.431662135269186 (of A)
+  A-inverse        16 entries in its lower triangle
+  ...
+)";
+
+const char* const kLmm =
+    R"(Fit a linear mixed model to a table of data
+
+Fits by restricted maximum likelihood (or --ml): fixed effects, variances and covariances of random effects, and the
+random effects themselves. The formula is written as for lme4: (1 | g) is an intercept for each level of g, (x | g) an
+intercept and a slope with their covariance, (x || g) the same without it, (1 | a/b) means (1 | a) + (1 | a:b). A
+variance that is estimated as zero is said in words, and so is every column of X that depends on those before it; what
+is not estimable gets no number. On a terminal a line for each iteration shows criterion, largest scaled score and step.
+Ctrl-C stops, writes what there is, and ends with exit code 1; --start goes on from there.
+
+Example: does sleep deprivation slow reactions, and how much do subjects differ?
+
+  $ qxsm lmm examples/sleepstudy.csv 'reaction ~ days + (days | subject)' --test 'day 9: 1*(Intercept) + 9*days'
+  Linear mixed model fit by REML
+  REML criterion at convergence: 1743.6283
+  days          10.4673      1.5458  17.00    6.771  3.26e-06
+  day 9   345.611      14.629  17.00   23.625  1.94e-14  estimable
+  ...
+  $ qxsm lmm examples/penicillin.csv 'diameter ~ 1 + (1 | plate) + (1 | sample)' --out fit --plot plots
+  REML criterion at convergence: 330.8606
+   plate     (Intercept)  0.716908    0.226365   0.846704
+  ...
+  $ qxsm lmm examples/sleepstudy.csv 'reaction ~ days + (days | subject)' --dry-run
+  observations    180
+  fixed effects   2 columns, rank 2
+  equations       38 unknowns
+  ...
+)";
+
+const char* const kReml =
+    R"(Fit a model with a pedigree or another known precision
+
+As 'qxsm lmm', for terms whose levels are related: (1 | animal; pedigree) has the variance times the relationship matrix
+of --pedigree, (1 | g; name) the variance times the (Moore-Penrose) inverse of the matrix of --kinv name=K.mtx. That may
+be singular, as that of an intrinsic autoregression is. Each variance over their total is printed with its standard
+error, or what --ratio asks for.
+
+Example: how much of the variance is between batches; and the heritability of a trait, from a pedigree.
+
+  $ qxsm reml examples/dyestuff.csv 'yield ~ 1 + (1 | batch)' --ratio 'icc = batch / (batch + residual)'
+  REML criterion at convergence: 319.6543
+   batch     (Intercept)   1764.05     1432.75    42.0006
+   Residual                2451.25      707.61    49.5101
+  icc    0.4185      0.2162
+  ...
+
+  qxsm reml birds.csv 'weight ~ sex + (1 | bird; pedigree) + (1 | nest)' --pedigree birds_pedigree.csv \
+    --ratio 'h2 = bird / total'
+)";
+
+const char* const kBlup =
+    R"(Predict random effects with given variances
+
+As 'qxsm reml', with the variances told and not estimated: solves the mixed-model equations for fixed and random
+effects, their standard errors, and the prediction error variances and reliabilities (--pev prints them).
+
+Example: breeding values of eight calves, five of them weighed, with a ratio of variances of 2.
+
+  $ qxsm blup examples/calves.csv 'gain ~ 0 + sex + (1 | calf; pedigree)' --pedigree examples/calves_pedigree.csv \
+      --var calf=20 --var residual=40 --pev
+  Linear mixed model with given variances
+  REML criterion at these variances: 19.3092
+   1      0.0984446    4.0760    4.3409     0.057812
+   8      0.1826147    3.4820    4.1103     0.155272
+  ...
+)";
+
 const char* const kGrid =
     R"(Write the matrix of a five-point grid, for trials of any size
 
@@ -250,7 +347,7 @@ const char* const kExitCodes =
   0  done
   1  a numerical "no": not positive semidefinite, an inconsistent right-hand side, not converged, a row that is not
      estimable, or a result that overflows
-  2  wrong usage, or a file that cannot be read, understood or written
+  2  wrong usage, a file that cannot be read, understood or written, or a model that does not suit its data
   3  out of memory (see --memory), or the module cannot be loaded)";
 
 }  // namespace sm::cli::help

@@ -13,6 +13,10 @@ extern const char* const kTrace;
 extern const char* const kHermite;
 extern const char* const kEstimable;
 extern const char* const kConvert;
+extern const char* const kPedigree;
+extern const char* const kLmm;
+extern const char* const kReml;
+extern const char* const kBlup;
 extern const char* const kGrid;
 extern const char* const kExitCodes;
 

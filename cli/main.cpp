@@ -6,6 +6,7 @@
 #include <new>
 #include <stdexcept>
 
+#include "cli/model_error.hpp"
 #include "cli/options.hpp"
 
 namespace sm::cli {
@@ -42,16 +43,20 @@ ExitCode run(int argc, const char* const* argv) {
 }
 
 // The last words. They may meet the same closed pipe that they are about; the exit code then has to do.
+ExitCode explain(ExitCode code, const std::string& text, const Json& error, bool json) {
+  try {
+    write_all(STDERR_FILENO, "qxsm: " + text + "\n", "standard error");
+  } catch (const CommandError&) {
+  }
+  try {
+    if (json) write_all(STDOUT_FILENO, json_text(Json{{"error", error}}), "standard output");
+  } catch (const CommandError&) {
+  }
+  return code;
+}
+
 ExitCode explain(const Problem& problem, bool json) {
-  try {
-    write_all(STDERR_FILENO, "qxsm: " + describe(problem) + "\n", "standard error");
-  } catch (const CommandError&) {
-  }
-  try {
-    if (json) write_all(STDOUT_FILENO, json_text(Json{{"error", error_object(problem)}}), "standard output");
-  } catch (const CommandError&) {
-  }
-  return problem.code;
+  return explain(problem.code, describe(problem), error_object(problem), json);
 }
 
 }  // namespace
@@ -67,6 +72,8 @@ int run_guarded(int argc, const char* const* argv) {
     return static_cast<int>(run(argc, argv));
   } catch (const CommandError& error) {
     return static_cast<int>(explain(error.problem(), json));
+  } catch (const mixed::ModelError& error) {
+    return static_cast<int>(explain(exit_code_of(error), error.what(), error_object(error), json));
   } catch (const std::bad_alloc&) {
     return static_cast<int>(explain(no_memory, json));
   } catch (const std::length_error&) {

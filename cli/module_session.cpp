@@ -65,6 +65,9 @@ void ModuleSession::find_steps() {
   find(steps_.qxsmreorder, "qxsmreorder");
   find(steps_.qxsmsymbfact, "qxsmsymbfact");
   find(steps_.qxsmnumfact, "qxsmnumfact");
+  find(steps_.qxsmrefill, "qxsmrefill");
+  find(steps_.qxsminvpattern, "qxsminvpattern");
+  find(steps_.qxsminvdiag, "qxsminvdiag");
   find(steps_.qxsminvmultv, "qxsminvmultv");
   find(steps_.qxsmtraceinvAB, "qxsmtraceinvAB");
   find(steps_.qxsmcopyv, "qxsmcopyv");

@@ -16,6 +16,9 @@ struct ExportedSteps {
   SmStatus (*qxsmreorder)(SmMatrix* matrix) = nullptr;
   SmStatus (*qxsmsymbfact)(SmMatrix* matrix) = nullptr;
   SmStatus (*qxsmnumfact)(SmMatrix* matrix) = nullptr;
+  SmStatus (*qxsmrefill)(SmMatrix* matrix, const double* values) = nullptr;
+  SmStatus (*qxsminvpattern)(SmMatrix* matrix, double* values) = nullptr;
+  SmStatus (*qxsminvdiag)(SmMatrix* matrix, double* x) = nullptr;
   SmStatus (*qxsminvmultv)(SmMatrix* matrix, const double* b, double* x, int64_t count) = nullptr;
   SmStatus (*qxsmtraceinvAB)(SmMatrix* a, SmMatrix* b, int64_t start, double* result) = nullptr;
   SmStatus (*qxsmcopyv)(const double* values, SmMatrix* matrix, int64_t rows, int64_t cols, int32_t kind,

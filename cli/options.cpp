@@ -13,6 +13,7 @@
 #include "cli/fields.hpp"
 #include "cli/format.hpp"
 #include "cli/help.hpp"
+#include "cli/model_options.hpp"
 #include "cli/orderings.hpp"
 
 namespace sm::cli {
@@ -267,6 +268,28 @@ void add_convert(CLI::App& app, Options& options) {
   add_common(*command, options);
 }
 
+void add_pedigree(CLI::App& app, Options& options) {
+  CLI::App* command = add_command<run_pedigree, &Options::pedigree>(app, options, "pedigree", help::kPedigree);
+  PedigreeOptions& pedigree = options.pedigree;
+  add_file(*command, pedigree.pedigree, "PEDIGREE.csv", "CSV or TSV file, plain or gzip;\n- is standard input");
+  const auto add = [&](const char* name, std::string& path, const char* type, const char* text) {
+    return command->add_option(name, path, text)->type_name(type);
+  };
+  add("--ainv", pedigree.ainv, "AINV.mtx", "Write the inverse of A as coordinates, rows in\nthe order of the file");
+  add("--a", pedigree.a, "A.mtx", "Write A itself as a symmetric array; for small\npedigrees");
+  add("--inbreeding", pedigree.inbreeding, "F.csv",
+      "Write the inbreeding coefficient of each animal;\nwithout a file, report it")
+      ->expected(0, 1);
+  add("--mendelian", pedigree.mendelian, "D.csv",
+      "Write the Mendelian sampling variance of each\nanimal, as a part of the additive variance; without\n"
+      "a file, report it")
+      ->expected(0, 1);
+  add("--ids", pedigree.ids, "IDS.txt",
+      "Write the animals in the order of the rows of A,\none a line. Each result is compressed when its\n"
+      "name ends in .gz; - is standard output for one\nof them, and the report then goes to standard\nerror");
+  add_common(*command, options);
+}
+
 void add_grid(CLI::App& app, Options& options) {
   CLI::App* command = add_command<run_grid, &Options::grid>(app, options, "grid", help::kGrid);
   command->add_option("NX", options.grid.nx, "Points in the first direction")
@@ -288,6 +311,13 @@ void add_grid(CLI::App& app, Options& options) {
   add_reports(*command, options);
 }
 
+template <auto run>
+void add_model(CLI::App& app, Options& options, const char* name, const char* help, ModelCommand which) {
+  CLI::App* command = add_command<run, &Options::model>(app, options, name, help);
+  add_model_options(*command, options.model, which);
+  add_common(*command, options);
+}
+
 void add_subcommands(CLI::App& app, Options& options) {
   add_info(app, options);
   add_factor(app, options);
@@ -298,6 +328,10 @@ void add_subcommands(CLI::App& app, Options& options) {
   add_hermite(app, options);
   add_estimable(app, options);
   add_convert(app, options);
+  add_pedigree(app, options);
+  add_model<run_lmm>(app, options, "lmm", help::kLmm, ModelCommand::lmm);
+  add_model<run_reml>(app, options, "reml", help::kReml, ModelCommand::reml);
+  add_model<run_blup>(app, options, "blup", help::kBlup, ModelCommand::blup);
   add_grid(app, options);
 }
 
@@ -349,6 +383,16 @@ void settle(const CLI::App& app, Options& options) {
   require_use_of_ordering(app, options);
   options.filter = app.got_subcommand("convert") || app.got_subcommand("grid");
   if (app.got_subcommand("grid") && options.common.output.empty()) options.common.output = "-";
+  PedigreeOptions& pedigree = options.pedigree;
+  const auto bare = [&](const char* name, const std::string& path) {
+    return app.got_subcommand("pedigree") && app.get_subcommand("pedigree")->count(name) > 0 && path.empty();
+  };
+  pedigree.report_inbreeding = bare("--inbreeding", pedigree.inbreeding);
+  pedigree.report_mendelian = bare("--mendelian", pedigree.mendelian);
+  for (const std::string* path :
+       {&pedigree.a, &pedigree.ainv, &pedigree.inbreeding, &pedigree.mendelian, &pedigree.ids}) {
+    if (*path == "-") options.common.output = "-";
+  }
   options.common.ceiling =
       options.common.memory.empty() ? machine_memory() : parse_memory(options.common.memory).value_or(0);
 }

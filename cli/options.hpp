@@ -20,6 +20,8 @@ struct Options {
   HermiteOptions hermite;
   EstimableOptions estimable;
   ConvertOptions convert;
+  PedigreeOptions pedigree;
+  ModelOptions model;
   GridOptions grid;
   std::string answer;  // help or version that was asked for: to be printed instead of a run
 

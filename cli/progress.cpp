@@ -47,7 +47,14 @@ void Progress::phase(std::string name) {
   phase_ = std::move(name);
   phase_start_ = std::chrono::steady_clock::now();
   update(-1.0);
+  expect(0.0);
   iteration(0, 0.0);
+}
+
+void Progress::keep(const std::string& text) {
+  if (!thread_.joinable()) return;
+  const std::lock_guard lock(mutex_);
+  put(file_, std::string(kEraseLine) + text + "\n");
 }
 
 std::string Progress::line(const std::string& phase, double fraction, double seconds) {
@@ -55,6 +62,10 @@ std::string Progress::line(const std::string& phase, double fraction, double sec
   const double share = std::min(fraction, 1.0);
   const int full = static_cast<int>(share * kBarWidth);
   return fmt::format("{} [{:#>{}}{:.>{}}] {:3.0f} %", phase, "", full, "", kBarWidth - full, 100.0 * share);
+}
+
+double Progress::share_by_clock(double seconds, double expected) {
+  return expected > 0.0 ? std::min(seconds / expected, 0.99) : -1.0;
 }
 
 std::string Progress::iteration_text(std::int64_t step, double residual) {
@@ -73,7 +84,9 @@ void Progress::run() {
 void Progress::draw() {
   if (phase_.empty()) return;
   const std::chrono::duration<double> seconds = std::chrono::steady_clock::now() - phase_start_;
-  put(file_, std::string(kEraseLine) + line(phase_, fraction_.load(std::memory_order_relaxed), seconds.count()) +
+  const double told = fraction_.load(std::memory_order_relaxed);
+  const double share = told < 0.0 ? share_by_clock(seconds.count(), expected_.load(std::memory_order_relaxed)) : told;
+  put(file_, std::string(kEraseLine) + line(phase_, share, seconds.count()) +
                  iteration_text(step_.load(std::memory_order_relaxed), residual_.load(std::memory_order_relaxed)));
   drawn_ = true;
 }

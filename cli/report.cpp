@@ -26,6 +26,7 @@ void Report::fail(const Problem& problem) {
 }
 
 std::string Report::text() const {
+  if (!text_.empty()) return text_;
   std::size_t width = 0;
   for (const auto& [label, text] : lines_) width = std::max(width, label.size());
   std::string out;
@@ -33,7 +34,7 @@ std::string Report::text() const {
   return out;
 }
 
-std::string Report::json() const { return json_text(json_); }
+std::string Report::json() const { return json_text_.empty() ? json_text(json_) : json_text_; }
 
 Json error_object(const Problem& problem) {
   Json error;

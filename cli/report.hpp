@@ -22,6 +22,12 @@ class Report {
   // A line whose facts are in the JSON object by other means, such as one row of a table.
   void add_text(std::string label, std::string text);
 
+  // Prints what was made elsewhere in place of the facts.
+  void replace(std::string text, std::string json) {
+    text_ = std::move(text);
+    json_text_ = std::move(json);
+  }
+
   // A numerical answer "no": what was found out stands, and the command ends with the problem's exit code.
   void fail(const Problem& problem);
   ExitCode code() const { return code_; }
@@ -33,6 +39,8 @@ class Report {
  private:
   Json json_;
   std::vector<std::pair<std::string, std::string>> lines_;  // label and text
+  std::string text_;
+  std::string json_text_;
   ExitCode code_ = ExitCode::fine;
   std::string failure_;
 };

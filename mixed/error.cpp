@@ -14,6 +14,7 @@ std::string describe(const Fault& fault) {
   text += fault.what;
   if (!fault.expected.empty()) text += ", expected " + fault.expected;
   if (!fault.advice.empty()) text += "; " + fault.advice;
+  if (!fault.excerpt.empty()) text += "\n" + fault.excerpt;
   return text;
 }
 

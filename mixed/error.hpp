@@ -15,6 +15,7 @@ struct Fault {
   std::string what{};       // what was found, as a clause
   std::string expected{};   // what should have been there; may be empty
   std::string advice{};     // what to do next
+  std::string excerpt{};    // lines to show below it: a formula, and a caret under the place; may be empty
 };
 
 // "milk.csv:17:9: 'yield': found "12,5", expected a number; write a decimal point"

@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace sm::mixed {
@@ -41,6 +42,7 @@ struct RandomTerm {
   std::vector<std::int64_t> level;             // of each row of the data, 0-based
   std::vector<double> z;                       // rows x k by rows: the coefficients' covariates
   std::shared_ptr<const Precision> precision;  // null: the levels are independent
+  std::string known{};                         // the name of the precision in the formula: "pedigree"
 
   std::int64_t coef_count() const { return static_cast<std::int64_t>(coefs.size()); }
   std::int64_t level_count() const { return static_cast<std::int64_t>(levels.size()); }
@@ -59,6 +61,14 @@ struct FixedDesign {
   std::int64_t rank() const { return static_cast<std::int64_t>(kept.size()); }
 };
 
+// A column of the table that stands as a factor in the fixed part.
+struct ModelFactor {
+  std::string name;
+  std::vector<std::string> levels;  // in order; the first is the reference of treatment contrasts
+};
+
+struct DesignRecipe;  // mixed/design.hpp: how rows of data become rows of X and Z
+
 struct Model {
   std::string formula;          // as written
   std::string response;         // "y", "log(y)"
@@ -68,6 +78,11 @@ struct Model {
   std::vector<RandomTerm> random;  // most levels first, then as in the formula
   std::vector<std::int64_t> row;   // the row of the table (0-based) that each observation comes from
   std::int64_t rows_dropped = 0;   // for missing values
+  std::vector<std::pair<std::string, std::int64_t>> missing{};  // how many each variable lacks, where it lacks any
+  std::vector<ModelFactor> factors{};
+  bool sum_contrasts = false;        // else treatment contrasts
+  std::vector<std::string> notes{};  // in words: what a user may want to know about data and formula
+  std::shared_ptr<const DesignRecipe> recipe{};
 
   std::int64_t rows() const { return static_cast<std::int64_t>(y.size()); }
 };

@@ -24,6 +24,12 @@ struct Module {
   // Does not return for any status but 0; `doing` names the phase: "factoring the mixed-model equations".
   std::function<void(SmStatus status, const std::string& doing)> expect_ok;
 
+  // Told before each long step, with the multiplications and additions it is expected to take; may be empty.
+  std::function<void(const std::string& doing, double flops)> begin{};
+  void tell(const std::string& doing, double flops) const {
+    if (begin) begin(doing, flops);
+  }
+
   const SmFunctionTable& fn() const { return *instance->functions; }
 };
 

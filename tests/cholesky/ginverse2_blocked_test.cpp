@@ -311,6 +311,7 @@ TEST(SinglePivot, is_inverted_and_judged_as_a_matrix_of_order_1) {
   for (int k = 0; k < 100; ++k) elements.push_back(std::fabs(random.dyadic()) / 3.0);
   for (const double tolerance : {1e-12, 0.5, 2.0, 0.0})
     for (const double a : elements) {
+      constexpr double kUntouched = -777.0;
       double array = a, log_det = 0.0, inverse = kUntouched;
       std::int64_t rank = 0;
       std::int16_t definite = 0;

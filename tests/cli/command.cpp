@@ -9,6 +9,7 @@
 #include <fstream>
 #include <iterator>
 #include <sstream>
+#include <thread>
 
 namespace sm::test {
 namespace {
@@ -67,8 +68,11 @@ Outcome qxsm(const std::vector<std::string>& arguments, const Streams& streams) 
   const int err_file = streams.err_file >= 0 ? streams.err_file : err.file();
   const pid_t child = fork();
   if (child == 0) start(arguments, streams, in_file, out_file, err_file);
+  std::thread user;
+  if (streams.beside) user = std::thread([&] { streams.beside(child); });
   int status = 0;
   EXPECT_EQ(waitpid(child, &status, 0), child);
+  if (user.joinable()) user.join();
   return {.code = WIFEXITED(status) ? WEXITSTATUS(status) : -1, .out = out.content(), .err = err.content()};
 }
 

@@ -3,6 +3,7 @@
 
 #include <gtest/gtest.h>
 
+#include <functional>
 #include <string>
 #include <tuple>
 #include <vector>
@@ -28,9 +29,10 @@ struct Streams {
   int in_file = -1;
   int out_file = -1;
   int err_file = -1;
-  std::string library_path{};      // LD_LIBRARY_PATH
-  std::string folder{};            // working directory
-  const char* terminal = nullptr;  // TERM
+  std::string library_path{};                 // LD_LIBRARY_PATH
+  std::string folder{};                       // working directory
+  const char* terminal = nullptr;             // TERM
+  std::function<void(int process)> beside{};  // runs in a thread of its own, beside the program
 };
 
 Outcome qxsm(const std::vector<std::string>& arguments, const Streams& streams = {});
@@ -51,6 +53,7 @@ class CommandTest : public ::testing::Test {
   std::string scattered(const std::string& name, int rows, int cols, bool lower, std::uint64_t seed) const;
   static std::string read(const std::string& path);
   static std::string shipped(const std::string& name) { return std::string(QXSM_SOURCE) + "/data/" + name; }
+  static std::string example(const std::string& name) { return std::string(QXSM_SOURCE) + "/examples/" + name; }
 
  private:
   std::string folder_;

@@ -1,6 +1,7 @@
 // The help teaches by examples; they are run here, and must print what the help shows.
 #include <algorithm>
 #include <iterator>
+#include <regex>
 #include <sstream>
 
 #include "cli/command.hpp"
@@ -8,8 +9,8 @@
 namespace sm::test {
 namespace {
 
-const std::vector<std::string> kSubcommands{"info",  "factor",  "solve",     "invdiag", "quad",
-                                            "trace", "hermite", "estimable", "convert", "grid"};
+const std::vector<std::string> kSubcommands{"info",      "factor",  "solve",    "invdiag", "quad", "trace", "hermite",
+                                            "estimable", "convert", "pedigree", "lmm",     "reml", "blup",  "grid"};
 
 class Help : public CommandTest {
  protected:
@@ -41,14 +42,36 @@ class Help : public CommandTest {
     return lines;
   }
 
+  // As a shell takes a line apart, which may have words in single quotes.
+  static std::vector<std::string> words_of(const std::string& line) {
+    std::vector<std::string> words;
+    bool open = false;
+    bool quoted = false;
+    for (const char c : line) {
+      if (c == '\'') {
+        quoted = !quoted;
+      } else if (c == ' ' && !quoted) {
+        open = false;
+        continue;
+      }
+      if (!open) words.emplace_back();
+      open = true;
+      if (c != '\'') words.back() += c;
+    }
+    return words;
+  }
+
+  // Lines that end in a backslash go on in the next.
+  static std::string joined(const std::string& help) { return std::regex_replace(help, std::regex(" \\\\\n +"), " "); }
+
   // Runs "qxsm ..." in a copy of the place where the help's paths lead somewhere.
   Outcome run_line(const std::string& line) const {
-    std::istringstream words(line);
-    std::vector<std::string> arguments;
-    std::string word;
-    words >> word;
-    EXPECT_EQ(word, "qxsm");
-    while (words >> word) arguments.push_back(word.rfind("data/", 0) == 0 ? QXSM_SOURCE "/" + word : word);
+    std::vector<std::string> arguments = words_of(line);
+    EXPECT_EQ(arguments.front(), "qxsm");
+    arguments.erase(arguments.begin());
+    for (std::string& word : arguments) {
+      if (word.rfind("data/", 0) == 0 || word.rfind("examples/", 0) == 0) word.insert(0, QXSM_SOURCE "/");
+    }
     return qxsm(arguments, {.folder = path("")});
   }
 
@@ -56,7 +79,7 @@ class Help : public CommandTest {
   int repeat_examples(const std::string& help) const {
     int compared = 0;
     Outcome run;
-    for (const std::string& line : lines_of(help)) {
+    for (const std::string& line : lines_of(joined(help))) {
       if (line.rfind("  $ ", 0) == 0) {
         const std::size_t code_at = line.find("# exit code ");
         run = run_line(line.substr(4, line.find('#') - 4));
@@ -100,7 +123,8 @@ TEST_F(Help, lists_the_subcommands_with_their_purpose) {
        {"  info       Show what a file holds", "  factor     Order and factor", "  solve      Solve A x = b",
         "  invdiag    Compute the diagonal", "  quad       Compute the form", "  trace      Compute the trace",
         "  hermite    Compute the Hermite form", "  estimable  Tell which rows",
-        "  convert    Write a matrix in another form", "  grid       Write the matrix", "Exit codes:"}) {
+        "  convert    Write a matrix in another form", "  pedigree   Find inbreeding", "  lmm        Fit a linear",
+        "  reml       Fit a model", "  blup       Predict random", "  grid       Write the matrix", "Exit codes:"}) {
     EXPECT_NE(run.out.find(part), std::string::npos) << part << " in\n" << run.out;
   }
 }

@@ -1,0 +1,252 @@
+// Gram-Schmidt with every projection made twice, which leaves nothing but rounding behind: L. Giraud, J. Langou,
+// M. Rozloznik, J. van den Eshof, "Rounding error analysis of the classical Gram-Schmidt orthogonalization process",
+// Numer. Math. 101 (2005) 87-100.
+#include "mixed/aliasing.hpp"
+
+#include <algorithm>
+#include <cmath>
+#include <numeric>
+
+#include "mixed/alias_roads.hpp"
+
+namespace sm::mixed {
+namespace {
+
+constexpr double kSlack = 1e-11;
+constexpr double kDoubtful = 1e-4;  // what is left of a column when it is looked at twice
+constexpr int kLargestDenominator = 60;
+constexpr double kSmallPart = 1e-8;  // of a null vector: rounding
+// Beyond these the columns are not held as a dense array.
+constexpr double kMostNumbers = 2e7;
+constexpr double kMostWork = 4e9;
+
+using Vector = std::vector<double>;
+
+double dot(const Vector& a, const Vector& b) { return std::inner_product(a.begin(), a.end(), b.begin(), 0.0); }
+double norm_of(const Vector& a) { return std::sqrt(dot(a, a)); }
+
+void subtract(double factor, const Vector& b, Vector& a) {
+  for (std::size_t i = 0; i < a.size(); ++i) a[i] -= factor * b[i];
+}
+
+// The nearest fraction of small denominator, when there is one that rounding explains.
+double nearest_fraction(double value) {
+  for (int q = 1; q <= kLargestDenominator; ++q) {
+    const double p = std::round(value * q);
+    if (std::fabs(value * q - p) <= std::min(1e-8 * std::max(1.0, std::fabs(value)), 1e-3)) return p / q;
+  }
+  return value;
+}
+
+// The norm of column j less a combination of the kept ones, at the cost of the entries of those that take part.
+class Residual {
+ public:
+  explicit Residual(const WeightedColumns& x) : x_(x), work_(static_cast<std::size_t>(x.rows()), 0.0) {}
+
+  double norm(std::int64_t j, const std::vector<std::int64_t>& kept, const Vector& b) {
+    x_.add(1.0, j, work_);
+    for (std::size_t k = 0; k < b.size(); ++k) {
+      if (b[k] != 0.0) x_.add(-b[k], kept[k], work_);
+    }
+    double sum = take(j);
+    for (std::size_t k = 0; k < b.size(); ++k) {
+      if (b[k] != 0.0) sum += take(kept[k]);
+    }
+    return std::sqrt(sum);
+  }
+
+ private:
+  double take(std::int64_t j) {
+    double sum = 0.0;
+    x_.for_each(j, [&](std::size_t row, double) {
+      sum += work_[row] * work_[row];
+      work_[row] = 0.0;
+    });
+    return sum;
+  }
+
+  const WeightedColumns& x_;
+  Vector work_;
+};
+
+class GramSchmidt {
+ public:
+  explicit GramSchmidt(const WeightedColumns& x) : x_(x) {}
+
+  Dependences run() {
+    for (std::int64_t j = 0; j < x_.cols(); ++j) take(j);
+    for (Vector& dependence : found_.dependence) dependence.resize(found_.kept.size(), 0.0);
+    return std::move(found_);
+  }
+
+ private:
+  // Projections of `values` on the directions so far, which are taken off it.
+  Vector project(Vector& values) const {
+    Vector parts(directions_.size(), 0.0);
+    for (int pass = 0; pass < 2; ++pass) {
+      for (std::size_t k = 0; k < directions_.size(); ++k) {
+        const double part = dot(directions_[k], values);
+        subtract(part, directions_[k], values);
+        parts[k] += part;
+      }
+    }
+    return parts;
+  }
+
+  void take(std::int64_t j) {
+    Vector left = x_.column(j);
+    const double size = norm_of(left);
+    Vector parts = project(left);
+    const double rest = norm_of(left);
+    if (rest <= kDoubtful * size) {
+      Vector b = dependence(j, parts);
+      if (rest <= kNothing * size + kRounding * sum_of_lengths(b)) {
+        found_.aliased.push_back(j);
+        found_.dependence.push_back(std::move(b));
+        return;
+      }
+    }
+    sizes_.push_back(size);
+    found_.kept.push_back(j);
+    for (double& value : left) value /= rest;
+    directions_.push_back(std::move(left));
+    parts.push_back(rest);
+    triangle_.push_back(std::move(parts));
+  }
+
+  // R b = parts, R the triangle whose columns are the projections of the kept columns.
+  Vector solve(Vector parts) const {
+    for (std::size_t k = parts.size(); k-- > 0;) {
+      parts[k] /= triangle_[k][k];
+      for (std::size_t i = 0; i < k; ++i) parts[i] -= triangle_[k][i] * parts[k];
+    }
+    return parts;
+  }
+
+  Vector dependence(std::int64_t j, Vector parts) const {
+    Vector b = solve(std::move(parts));
+    Vector left = x_.column(j);
+    for (std::size_t k = 0; k < b.size(); ++k) x_.add(-b[k], found_.kept[k], left);
+    const Vector correction = solve(project(left));
+    for (std::size_t k = 0; k < b.size(); ++k) b[k] += correction[k];
+    return b;
+  }
+
+  double sum_of_lengths(const Vector& b) const {
+    double sum = 0.0;
+    for (std::size_t k = 0; k < b.size(); ++k) sum += std::fabs(b[k]) * sizes_[k];
+    return sum;
+  }
+
+  const WeightedColumns& x_;
+  Dependences found_;
+  Vector sizes_;                    // of the kept columns
+  std::vector<Vector> directions_;  // orthonormal
+  std::vector<Vector> triangle_;    // column k: the parts of kept column k
+};
+
+}  // namespace
+
+WeightedColumns::WeightedColumns(const SparseColumns& x, const std::vector<double>& weights) : x_(x) {
+  roots_.reserve(weights.size());
+  for (const double weight : weights) roots_.push_back(std::sqrt(weight));
+}
+
+std::int64_t WeightedColumns::entries(std::int64_t j) const {
+  return x_.start[static_cast<std::size_t>(j) + 1] - x_.start[static_cast<std::size_t>(j)];
+}
+
+double WeightedColumns::norm(std::int64_t j) const {
+  double sum = 0.0;
+  for_each(j, [&](std::size_t, double value) { sum += value * value; });
+  return std::sqrt(sum);
+}
+
+std::vector<double> WeightedColumns::column(std::int64_t j) const {
+  Vector values(static_cast<std::size_t>(x_.rows), 0.0);
+  add(1.0, j, values);
+  return values;
+}
+
+void WeightedColumns::add(double factor, std::int64_t j, std::vector<double>& values) const {
+  for_each(j, [&](std::size_t row, double value) { values[row] += factor * value; });
+}
+
+Dependences dense_dependences(const WeightedColumns& x) { return GramSchmidt(x).run(); }
+
+Dependences last_columns(std::vector<std::vector<double>> null, const std::vector<double>& sizes) {
+  for (Vector& vector : null) {
+    double largest = 0.0;
+    for (std::size_t j = 0; j < vector.size(); ++j) largest = std::max(largest, std::fabs(vector[j] *= sizes[j]));
+    for (double& value : vector) value /= largest;
+  }
+  std::vector<std::int64_t> pivot(null.size(), -1);
+  for (std::size_t j = sizes.size(); j-- > 0;) {
+    std::size_t best = null.size();
+    for (std::size_t v = 0; v < null.size(); ++v) {
+      if (pivot[v] >= 0 || std::fabs(null[v][j]) <= kSmallPart) continue;
+      if (best == null.size() || std::fabs(null[v][j]) > std::fabs(null[best][j])) best = v;
+    }
+    if (best == null.size()) continue;
+    pivot[best] = static_cast<std::int64_t>(j);
+    const double value = null[best][j];
+    for (double& part : null[best]) part /= value;
+    for (std::size_t v = 0; v < null.size(); ++v) {
+      const double part = null[v][j];
+      if (v == best || part == 0.0) continue;
+      for (std::size_t k = 0; k <= j; ++k) null[v][k] -= part * null[best][k];
+      null[v][j] = 0.0;
+    }
+  }
+  Dependences found;
+  for (std::size_t j = 0; j < sizes.size(); ++j) {
+    const bool aliased = std::find(pivot.begin(), pivot.end(), static_cast<std::int64_t>(j)) != pivot.end();
+    (aliased ? found.aliased : found.kept).push_back(static_cast<std::int64_t>(j));
+  }
+  for (const std::int64_t a : found.aliased) {
+    const Vector& vector = null[static_cast<std::size_t>(std::find(pivot.begin(), pivot.end(), a) - pivot.begin())];
+    Vector dependence;
+    for (const std::int64_t k : found.kept) {
+      const auto at = static_cast<std::size_t>(k);
+      dependence.push_back(-vector[at] * sizes[static_cast<std::size_t>(a)] / sizes[at]);
+    }
+    found.dependence.push_back(std::move(dependence));
+  }
+  return found;
+}
+
+void tidy(const WeightedColumns& x, Dependences& found) {
+  Residual residual(x);
+  Vector sizes;
+  for (const std::int64_t k : found.kept) sizes.push_back(x.norm(k));
+  for (std::size_t a = 0; a < found.aliased.size(); ++a) {
+    Vector& b = found.dependence[a];
+    const double size = x.norm(found.aliased[a]);
+    double felt = kNothing * size;
+    for (std::size_t k = 0; k < b.size(); ++k) felt += kRounding * std::fabs(b[k]) * sizes[k];
+    for (std::size_t k = 0; k < b.size(); ++k) {
+      if (std::fabs(b[k]) * sizes[k] <= felt) b[k] = 0.0;
+    }
+    Vector clean = b;
+    for (double& value : clean) value = nearest_fraction(value);
+    if (clean == b) continue;
+    const double after = residual.norm(found.aliased[a], found.kept, clean);
+    if (after <= kSlack * size || after <= 10.0 * residual.norm(found.aliased[a], found.kept, b)) b = std::move(clean);
+  }
+}
+
+void find_aliased(FixedDesign& design, const std::vector<double>& weights) {
+  const WeightedColumns x(design.x, weights);
+  const double numbers = static_cast<double>(x.rows()) * static_cast<double>(x.cols());
+  const bool small = numbers <= kMostNumbers && numbers * static_cast<double>(x.cols()) <= kMostWork;
+  Dependences found = small ? dense_dependences(x) : sparse_dependences(x, design.term);
+  tidy(x, found);
+  design.kept = std::move(found.kept);
+  design.aliased = std::move(found.aliased);
+  design.dependence.clear();
+  for (const Vector& dependence : found.dependence) {
+    design.dependence.insert(design.dependence.end(), dependence.begin(), dependence.end());
+  }
+}
+
+}  // namespace sm::mixed

@@ -1,0 +1,232 @@
+#include "mixed/frame.hpp"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <charconv>
+#include <cmath>
+#include <numeric>
+
+#include "mixed/error.hpp"
+#include "mixed/expression.hpp"
+#include "mixed/formula.hpp"
+#include "mixed/words.hpp"
+
+namespace sm::mixed {
+namespace {
+
+// A column of text with this many different numbers, and hardly anything else, is one of numbers with slips in it.
+constexpr std::size_t kSlipNumbers = 10;
+constexpr double kSlipShare = 0.9;
+
+bool parse_integer(const std::string& text, std::int64_t& value) {
+  const auto [stop, error] = std::from_chars(text.data(), text.data() + text.size(), value);
+  return error == std::errc() && stop == text.data() + text.size();
+}
+
+bool looks_like_number(std::string text) {
+  double value = 0.0;
+  if (parse_number(text, value)) return true;
+  std::replace(text.begin(), text.end(), ',', '.');
+  return parse_number(text, value);
+}
+
+std::string advice_for(const std::string& cell) {
+  double value = 0.0;
+  std::string decimal = cell;
+  std::replace(decimal.begin(), decimal.end(), ',', '.');
+  if (parse_number(decimal, value)) return "write a decimal point";
+  return "correct it, or write NA if the value is missing";
+}
+
+Factor distinct_numbers(const std::vector<double>& values, std::vector<std::size_t>& first) {
+  std::vector<double> sorted = values;
+  std::sort(sorted.begin(), sorted.end());
+  sorted.erase(std::unique(sorted.begin(), sorted.end()), sorted.end());
+  Factor factor;
+  factor.code.reserve(values.size());
+  first.assign(sorted.size(), values.size());
+  for (std::size_t i = 0; i < values.size(); ++i) {
+    const auto place = std::lower_bound(sorted.begin(), sorted.end(), values[i]) - sorted.begin();
+    auto& seen = first[static_cast<std::size_t>(place)];
+    seen = std::min(seen, i);
+    factor.code.push_back(static_cast<std::int32_t>(place));
+  }
+  for (const double value : sorted) factor.levels.push_back(print_number(value));
+  return factor;
+}
+
+}  // namespace
+
+void sort_levels(std::vector<std::string>& levels) {
+  std::vector<std::pair<std::int64_t, std::string>> numbered;
+  numbered.reserve(levels.size());
+  for (const std::string& level : levels) {
+    std::int64_t value = 0;
+    if (!parse_integer(level, value)) break;
+    numbered.emplace_back(value, level);
+  }
+  if (numbered.size() < levels.size()) return std::sort(levels.begin(), levels.end());
+  std::sort(numbered.begin(), numbered.end());
+  for (std::size_t i = 0; i < levels.size(); ++i) levels[i] = std::move(numbered[i].second);
+}
+
+const Column& Frame::column(const Node& name) const {
+  const Column* const found = table_.find(name.text);
+  if (found) return *found;
+  const std::vector<std::string> names = table_.column_names();
+  const std::string nearest = nearest_name(name.text, names);
+  const std::string what = fmt::format("{} has no column of this name", table_.name());
+  const std::string advice = nearest.empty() ? fmt::format("its columns are {}", listed(names, 12))
+                                             : fmt::format("did you mean '{}'?", nearest);
+  if (name.column == 0) throw ModelError({.variable = name.text, .what = what, .advice = advice});
+  refuse_formula(formula_, {.column = name.column, .variable = name.text, .what = what, .advice = advice});
+}
+
+const Column& Frame::use(const Node& name) {
+  const Column& found = column(name);
+  if (std::find(used_.begin(), used_.end(), &found) == used_.end()) used_.push_back(&found);
+  return found;
+}
+
+void Frame::take_rows(MissingValues policy) {
+  const std::int64_t all = table_.rows();
+  std::vector<char> lacks(static_cast<std::size_t>(all), 0);
+  std::int64_t first_row = all;
+  const Column* first_column = nullptr;
+  for (const Column* column : used_) {
+    if (column->missing == 0) continue;
+    missing_.emplace_back(column->name, column->missing);
+    for (std::int64_t row = 0; row < all; ++row) {
+      if (!column->missing_at(row)) continue;
+      lacks[static_cast<std::size_t>(row)] = 1;
+      if (row < first_row) {
+        first_row = row;
+        first_column = column;
+      }
+    }
+  }
+  if (policy == MissingValues::fail && first_column) {
+    const Cell cell = table_.cell(*first_column, first_row);
+    throw ModelError({.file = table_.name(),
+                      .line = cell.line,
+                      .column = cell.column,
+                      .variable = first_column->name,
+                      .what = "a value is missing",
+                      .expected = "none to be",
+                      .advice = "complete it, or drop such rows with --na drop"});
+  }
+  rows_.clear();
+  for (std::int64_t row = 0; row < all; ++row) {
+    if (!lacks[static_cast<std::size_t>(row)]) rows_.push_back(row);
+  }
+  if (!rows_.empty()) return;
+  std::string counts;
+  for (const auto& [name, count] : missing_)
+    counts += fmt::format("{}'{}' {}", counts.empty() ? "" : ", ", name, count);
+  throw ModelError(
+      {.file = table_.name(),
+       .what = fmt::format("no observation is left: each of the {} lacks a value ({})", count_of(all, "row"), counts),
+       .advice = "leave the emptiest variable out of the model"});
+}
+
+void Frame::keep_rows(const std::vector<char>& keep) {
+  std::vector<std::int64_t> kept;
+  for (std::size_t i = 0; i < rows_.size(); ++i) {
+    if (keep[i]) kept.push_back(rows_[i]);
+  }
+  rows_ = std::move(kept);
+}
+
+void Frame::not_a_number(const Column& column, const std::string& advice) const {
+  std::int64_t row = 0;
+  double value = 0.0;
+  const auto is_number = [&](std::int64_t at) {
+    const std::int32_t code = column.code[static_cast<std::size_t>(at)];
+    return code < 0 || parse_number(column.labels[static_cast<std::size_t>(code)], value);
+  };
+  while (is_number(row)) ++row;
+  const Cell cell = table_.cell(column, row);
+  throw ModelError({.file = table_.name(),
+                    .line = cell.line,
+                    .column = cell.column,
+                    .variable = column.name,
+                    .what = "found " + quote(cell.text),
+                    .expected = "a number",
+                    .advice = advice.empty() ? advice_for(cell.text) : advice_for(cell.text) + advice});
+}
+
+std::vector<double> Frame::column_numbers(const Node& name) const {
+  const Column& found = column(name);
+  if (!found.numeric) not_a_number(found, "");
+  std::vector<double> values;
+  values.reserve(rows_.size());
+  for (const std::int64_t row : rows_) values.push_back(found.number[static_cast<std::size_t>(row)]);
+  return values;
+}
+
+std::vector<double> Frame::numbers(const Node& expression, const std::string& label) const {
+  std::vector<double> values =
+      evaluate(expression, rows_.size(), [this](const Node& name) { return column_numbers(name); });
+  const auto bad = std::find_if(values.begin(), values.end(), [](double value) { return !std::isfinite(value); });
+  if (bad == values.end()) return values;
+  const std::vector<const Node*> names = names_in(expression);
+  const Cell cell =
+      names.empty() ? Cell{} : this->cell(column(*names.front()), static_cast<std::size_t>(bad - values.begin()));
+  throw ModelError({.file = table_.name(),
+                    .line = cell.line,
+                    .column = cell.column,
+                    .variable = label,
+                    .what = fmt::format("the value is {} where {} is {}", *bad,
+                                        names.empty() ? "it" : "'" + names.front()->text + "'", quote(cell.text)),
+                    .expected = "a finite number",
+                    .advice = "write NA for the cell, or use another expression"});
+}
+
+Factor Frame::distinct(const Column& column) const {
+  Factor factor;
+  if (!column.numeric) {
+    std::vector<std::int32_t> renumbered(column.labels.size(), -1);
+    factor.code.reserve(rows_.size());
+    for (const std::int64_t row : rows_) {
+      const auto code = static_cast<std::size_t>(column.code[static_cast<std::size_t>(row)]);
+      if (renumbered[code] < 0) {
+        renumbered[code] = static_cast<std::int32_t>(factor.levels.size());
+        factor.levels.push_back(column.labels[code]);
+      }
+      factor.code.push_back(renumbered[code]);
+    }
+    return factor;
+  }
+  std::vector<double> values;
+  values.reserve(rows_.size());
+  for (const std::int64_t row : rows_) values.push_back(column.number[static_cast<std::size_t>(row)]);
+  std::vector<std::size_t> first;
+  factor = distinct_numbers(values, first);
+  if (!column.plain) take_labels(column, first, factor);
+  return factor;
+}
+
+// The text of the first cell of each level.
+void Frame::take_labels(const Column& column, const std::vector<std::size_t>& first, Factor& factor) const {
+  std::vector<std::size_t> by_row(first.size());
+  std::iota(by_row.begin(), by_row.end(), 0);
+  std::sort(by_row.begin(), by_row.end(), [&](std::size_t a, std::size_t b) { return first[a] < first[b]; });
+  std::vector<std::int64_t> rows;
+  rows.reserve(first.size());
+  for (const std::size_t level : by_row) rows.push_back(rows_[first[level]]);
+  const std::vector<Cell> cells = table_.cells(column, rows);
+  for (std::size_t i = 0; i < cells.size(); ++i) factor.levels[by_row[i]] = cells[i].text;
+}
+
+void Frame::refuse_slip(const Column& column) const {
+  if (column.numeric) return;
+  const auto numbers =
+      static_cast<std::size_t>(std::count_if(column.labels.begin(), column.labels.end(), looks_like_number));
+  if (numbers < kSlipNumbers || static_cast<double>(numbers) < kSlipShare * static_cast<double>(column.labels.size())) {
+    return;
+  }
+  not_a_number(column, fmt::format("; if the column is a factor, name it: --factor {}", column.name));
+}
+
+}  // namespace sm::mixed
