@@ -121,7 +121,7 @@ TEST_F(ModelCommand, is_least_squares_without_random_terms) {
     const Outcome run = qxsm(
         with({"lmm", data, "y ~ x", "--json"}, ml ? std::vector<std::string>{"--ml"} : std::vector<std::string>{}));
     ASSERT_EQ(run.code, 0) << run.err;
-    const json fit = run.json();
+    const json fit = parsed(run);
     EXPECT_NEAR(fit.at("fixef").at(0).at("estimate").get<double>(), 1.5, 1e-12);
     EXPECT_NEAR(fit.at("fixef").at(1).at("estimate").get<double>(), 1.0, 1e-12);
     EXPECT_NEAR(fit.at("varcomp").at(0).at("vcov").get<double>(), 1.0 / (ml ? 4.0 : 2.0) * 1.0, 1e-12);
