@@ -38,7 +38,7 @@ Equations::Equations(Module& module, const ScaledDesign& design, const Gram& gra
     order_rows();
     module_.expect_ok(module_.qxsmreorder(matrix_), "ordering the mixed-model equations");
     module_.expect_ok(module_.qxsmsymbfact(matrix_), "finding the structure of the factor");
-    if (order_ > 0) flops_ = facts().flops;
+    flops_ = facts().flops;
   } catch (...) {
     if (matrix_) module_.fn().qxsmDestroyMatrix(module_.instance, &matrix_);
     throw;
@@ -168,7 +168,7 @@ void Equations::refill(const std::vector<std::int64_t>& cleared) {
 
 bool Equations::factor(const Factors& factors, const std::vector<std::int64_t>& superfluous) {
   inverse_known_ = false;
-  if (order_ == 0) return true;  // a model without random terms, or without anything
+  if (order_ == 0) return true;  // the module has no answers about an empty matrix
   for (const std::vector<double>& factor : factors) {
     for (const double element : factor) {
       if (!std::isfinite(element)) return false;

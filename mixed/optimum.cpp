@@ -21,13 +21,14 @@ class Finder {
   Optimum find(const Factors& start) {
     Optimum best = settle(search(Parameters(start)));
     if (!options_.several_starts || likelihood_.design().unknowns() > kCheapUnknowns) return best;
+    if (best.convergence == Convergence::stopped) return best;
+    quiet_ = true;
     for (const Factors& other_start : other_starts(start)) {
-      if (best.convergence == Convergence::stopped) break;
       Optimum other = settle(search(Parameters(other_start)));
       const bool lower = other.criterion < best.criterion - noise(best.criterion);
       const bool sounder = best.convergence != Convergence::converged && other.convergence == Convergence::converged &&
                            other.criterion < best.criterion + noise(best.criterion);
-      if (lower || sounder || other.convergence == Convergence::stopped) best = std::move(other);
+      if (lower || sounder) best = std::move(other);
     }
     return best;
   }
@@ -70,7 +71,7 @@ class Finder {
     MinimiseOptions options;
     options.max_iterations = options_.max_iterations;
     options.derivative_free = options_.derivative_free;
-    options.progress = options_.progress;
+    if (!quiet_) options.progress = options_.progress;
     Minimum minimum = minimise(objective, parameters.values(), options);
     return {.parameters = std::move(parameters),
             .values = std::move(minimum.x),
@@ -156,6 +157,7 @@ class Finder {
 
   Likelihood& likelihood_;
   const SearchOptions& options_;
+  bool quiet_ = false;  // searches that only make sure are not reported
 };
 
 }  // namespace
