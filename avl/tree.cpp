@@ -3,7 +3,7 @@
 namespace sm::avl {
 namespace {
 
-Side towards(std::int64_t key, const Node& node) { return key < node.key ? Side::left : Side::right; }
+Side towards(std::int64_t key, const Node& node) { return static_cast<Side>(key >= node.key); }
 
 // Turns the child on `side` up into the place of `top`, and returns it. Heights are the caller's business.
 Node* rotate(Node& top, Side side) {
@@ -56,32 +56,21 @@ Balanced restore(Node& top, Side side) {
 
 // Where a key is: at `node`, or else in the gap that the node's thread on `side` spans.
 struct Place {
-  Node* node;
+  Node* node;  // null: not found
   Side side;
   bool held;
 };
 
 Place held_at(Node* node) { return {node, Side::left, true}; }
 
-Place descend(Word root, std::int64_t key) {
-  Node* node = node_at(root);
-  while (key != node->key) {
-    const bool before = key < node->key;
-    const Word link = before ? node->left : node->right;
-    if (is_thread(link)) return {node, before ? Side::left : Side::right, false};
-    node = node_at(link);
-  }
-  return held_at(node);
-}
-
-// The place of `key` if it is at `node`, at a neighbour, or in a gap beside it; else by a descent.
-Place locate(Word root, std::int64_t key, Node* node) {
+// The place of `key` if it is at `node`, at a neighbour, or in a gap beside it.
+Place locate(std::int64_t key, Node* node) {
   if (key == node->key) return held_at(node);
   const Side side = towards(key, *node);
   Node* next = neighbour(node, side);
   if (next) {
     if (key == next->key) return held_at(next);
-    if (towards(key, *next) == side) return descend(root, key);
+    if (towards(key, *next) == side) return {};
     // Of two neighbours one lies below the other, and only that one has a thread across the gap.
     if (has_child(*node, side)) return {next, opposite(side), false};
   }
@@ -96,8 +85,8 @@ bool hangs_on(Node* before, const Node* top) {
 
 // The word that leads to the subtree `top` between `before` and `after`.
 Word& word_above(Word& root, const Node* top, Node* before, Node* after) {
-  if (node_at(root) == top) return root;
-  return hangs_on(before, top) ? before->right : after->left;
+  if (hangs_on(before, top)) return before->right;
+  return after && node_at(root) != top ? after->left : root;
 }
 
 // Makes `child` what `above` leads to, without touching the tags.
@@ -133,6 +122,106 @@ void grow(Word& root, Node* node, Node* before, Node* after) {
     set_higher(*parent, side);
     top = parent;
   }
+}
+
+// Insertion beside `last`: null, with nothing changed, where its neighbours do not tell the place.
+Node* insert_beside(Word& root, Node& node, Node* last) {
+  const Place place = locate(node.key, last);
+  if (!place.node || place.held) return place.node;
+  Node* beyond = target(*place.node, place.side);
+  link_of(node, place.side) = address_of(beyond) | SM_LINK_THREAD;
+  link_of(node, opposite(place.side)) = address_of(place.node) | SM_LINK_THREAD;
+  set_child(*place.node, place.side, &node);
+  const bool in_front = place.side == Side::left;
+  grow(root, &node, in_front ? beyond : place.node, in_front ? place.node : beyond);
+  return &node;
+}
+
+// On what the functions below leave undone: an insertion waits for nodes that may be far from any cache, and what a
+// processor can hold of the insertions after it decides how many of these waits go on at once. Stores are what it holds
+// fewest of. So the usual ways have no frame, and end in calls.
+
+void note(Hints& hints, Word root, const Node* last, Word misses) {
+  hint_of(hints, root) = {root, address_of(last) | misses};
+}
+
+// The last step of an insertion: rotation below `critical`.
+[[gnu::noinline]] Node* rotate_below(Word& root, Node& node, Word* critical, Hints& hints, Word misses) {
+  Node& top = *node_at(*critical);
+  replace_below(*critical, restore(top, towards(node.key, top)).top);
+  note(hints, root, &node, misses);
+  return &node;
+}
+
+// Links `node` in below `at`, where the descent ended. What can change its balance is the last uneven node on the way, or
+// else the root, to which `critical` leads, and the even ones below it (Knuth's algorithm A).
+[[gnu::noinline]] Node* link_below(Word& root, Node& node, Node* at, Word* critical, Hints& hints, Word misses) {
+  const std::int64_t key = node.key;
+  Side side = towards(key, *at);
+  const Word gap = link_of(*at, side);
+  link_of(node, side) = gap & ~SM_LINK_BALANCE;
+  link_of(node, opposite(side)) = address_of(at) | SM_LINK_THREAD;
+  link_of(*at, side) = address_of(&node) | (gap & SM_LINK_BALANCE);
+  if (address_of(&node) / sizeof(Node) % kSampled == 0) hints.sample = root;
+
+  Node& top = *node_at(*critical);
+  side = towards(key, top);
+  for (Node* p = target(top, side); p != &node;) {
+    Word& below = link_of(*p, towards(key, *p));
+    p = node_at(below);
+    below |= SM_LINK_BALANCE;
+  }
+  Word& far = link_of(top, opposite(side));
+  Word& near = link_of(top, side);
+  if (far & SM_LINK_BALANCE) {
+    far &= ~SM_LINK_BALANCE;
+  } else if (!(near & SM_LINK_BALANCE)) {
+    near |= SM_LINK_BALANCE;
+  } else {
+    return rotate_below(root, node, critical, hints, misses);
+  }
+  note(hints, root, &node, misses);
+  return &node;
+}
+
+// Insertion with a descent from the root.
+inline Node* insert_from_root(Word& root, Node& node, Hints& hints, Word misses) {
+  const std::int64_t key = node.key;
+  Word* critical = &root;
+  Word* link = &root;  // leads to `at`
+  Node* at = node_at(root);
+  while (key != at->key) {
+    critical = (at->left | at->right) & SM_LINK_BALANCE ? link : critical;
+    link = &link_of(*at, towards(key, *at));
+    const Word word = *link;
+    if (is_thread(word)) return link_below(root, node, at, critical, hints, misses);
+    at = node_at(word);
+  }
+  note(hints, root, at, misses);
+  return at;
+}
+
+// A tired hint is tried now and then only: its node may be far from any cache.
+constexpr std::int64_t kNowAndThen = 16;
+static_assert(kTired < alignof(Node), "the low bits of an address");
+
+[[gnu::noinline]] Node* insert_hinted(Word& root, Node& node, Hints& hints) {
+  const Word word = hint_of(hints, root).last;
+  const Word misses = word % alignof(Node);
+  if (misses < kTired || node.key % kNowAndThen == 0) {
+    if (Node* result = insert_beside(root, node, reinterpret_cast<Node*>(word - misses))) {
+      note(hints, root, result, 0);
+      return result;
+    }
+  }
+  return insert_from_root(root, node, hints, misses < kTired ? misses + 1 : kTired);
+}
+
+[[gnu::noinline]] Node* plant(Word& root, Node& node, Hints& hints) {
+  node.left = node.right = SM_LINK_THREAD;
+  root = address_of(&node);
+  note(hints, root, &node, 0);
+  return &node;
 }
 
 // A tree of height h holds at least F(h + 2) - 1 nodes, F the Fibonacci numbers (Adelson-Velsky and Landis), which puts
@@ -220,27 +309,11 @@ void shrink(Path& path) {
 
 }  // namespace
 
-Node* insert(Word& root, Node& node, Hint& hint) {
-  if (root == 0) {
-    node.left = node.right = SM_LINK_THREAD;
-    root = address_of(&node);
-    hint = {&root, root, &node};
-    return &node;
-  }
-  const bool hinted = hint.root == &root && hint.word == root;
-  const Place place = hinted ? locate(root, node.key, hint.last) : descend(root, node.key);
-  Node* result = place.node;
-  if (!place.held) {
-    result = &node;
-    Node* beyond = target(*place.node, place.side);
-    link_of(node, place.side) = address_of(beyond) | SM_LINK_THREAD;
-    link_of(node, opposite(place.side)) = address_of(place.node) | SM_LINK_THREAD;
-    set_child(*place.node, place.side, &node);
-    const bool in_front = place.side == Side::left;
-    grow(root, &node, in_front ? beyond : place.node, in_front ? place.node : beyond);
-  }
-  hint = {&root, root, result};
-  return result;
+Node* insert(Word& root, Node& node, Hints& hints) {
+  const Word word = root;
+  if (word == 0) return plant(root, node, hints);
+  if (hint_of(hints, word).word == word) return insert_hinted(root, node, hints);
+  return insert_from_root(root, node, hints, 0);
 }
 
 Node* find(Word root, std::int64_t key) {
@@ -252,7 +325,7 @@ Node* find(Word root, std::int64_t key) {
   return node;
 }
 
-bool remove(Word& root, std::int64_t key, Hint& hint) {
+bool remove(Word& root, std::int64_t key, Hints& hints) {
   Path path;
   path.root = &root;
   path.length = 0;
@@ -263,13 +336,13 @@ bool remove(Word& root, std::int64_t key, Hint& hint) {
     node = has_child(*node, side) ? target(*node, side) : nullptr;
   }
   if (!node) return false;
-  hint = {};
   if (has_child(*node, Side::left) && has_child(*node, Side::right)) {
     unlink_inner(path, node);
   } else {
     unlink_edge(path, node);
   }
   shrink(path);
+  forget(hints, root);
   return true;
 }
 

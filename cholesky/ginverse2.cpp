@@ -100,6 +100,14 @@ SmStatus ginverse2_by_columns(MemoryPool* pool, const PackedJob& job, PackedRepo
   return SM_OK;
 }
 
+SmStatus invert_pivot(double a, double tolerance, double& inverse) {
+  double root = 0.0;
+  SM_TRY(find_root(a, tolerance, a, root));
+  const double reciprocal = root > 0.0 ? 1.0 / root : 0.0;
+  inverse = reciprocal * reciprocal;
+  return SM_OK;
+}
+
 SmStatus ginverse2(SmInstance* instance, double* array, i64 n, double* log_det, i64* rank, std::int32_t mode,
                    double tolerance, std::int32_t format, std::int16_t* definite) {
   const PackedJob job = {array, n, format, mode, tolerance};

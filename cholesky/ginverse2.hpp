@@ -19,4 +19,7 @@ inline constexpr std::int32_t kPackedFactorToInverse = 6;  // R -> A^-
 [[nodiscard]] SmStatus ginverse2(SmInstance* instance, double* array, i64 n, double* log_det, i64* rank,
                                  std::int32_t mode, double tolerance, std::int32_t format, std::int16_t* definite);
 
+// The same of a single element, without the report: what a diagonal preconditioner asks for, once a row. 103.
+[[nodiscard]] SmStatus invert_pivot(double a, double tolerance, double& inverse);
+
 }  // namespace sm

@@ -20,7 +20,7 @@ Gate may_read_inverse(const SmMatrix& m) {
 // Every stored entry is on the pattern of the factor.
 SmStatus inverse_on_pattern(SmMatrix& m, double* values) {
   SM_PASS(may_read_inverse(m));
-  if (!values || values == m.nz_values) return SM_BAD_ARGUMENT;
+  if (!values || overlaps_nz_values(m, values)) return SM_BAD_ARGUMENT;
   SM_TRY(factor(m, false));
   SM_TRY(need_closing_places(m));
   SelectedInverse inverse(m);

@@ -21,7 +21,7 @@ Gate may_refill(const SmMatrix& m) {
 
 SmStatus refill(SmMatrix& m, const double* values) {
   SM_PASS(may_refill(m));
-  if (!values || values == m.nz_values) return SM_BAD_ARGUMENT;
+  if (!values || overlaps_nz_values(m, values)) return SM_BAD_ARGUMENT;
   if (m.state < SM_STATE_REORDERED) {
     std::copy_n(values, m.nnz, m.nz_values);
   } else {

@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include "cli/orderings.hpp"
 #include "cli/progress.hpp"
 #include "cli/report.hpp"
 
@@ -18,6 +19,7 @@ struct CommonOptions {
   std::string memory;         // as given: "4G"
   std::uint64_t ceiling = 0;  // in bytes; what the machine has when not given
   std::string output;         // where the result goes; empty: it is not written
+  std::string ordering;       // of those that factor, as given: "amd"; empty: md
 };
 
 struct InfoOptions {

@@ -24,10 +24,16 @@ Factorization::Factorization(ModuleSession& session, const LoadedMatrix& upper, 
   counts_.entries = matrix_->nnz;
 }
 
-void Factorization::analyse() {
+SmStatus Factorization::order(Ordering ordering, std::uint64_t limit) {
+  if (ordering == Ordering::md) return session_.steps().qxsmmd(matrix_);
+  const UpperPattern upper{.n = order_, .start = matrix_->row_start, .col = matrix_->col_index};
+  return session_.steps().qxsmorder(matrix_, find_order(ordering, upper, limit).data());
+}
+
+void Factorization::analyse(Ordering ordering, std::uint64_t limit) {
   if (order_ == 0) return;
   const ExportedSteps& steps = session_.steps();
-  const SmStatus ordered = clock_.timed("ordering", [&] { return steps.qxsmmd(matrix_); });
+  const SmStatus ordered = clock_.timed("ordering", [&] { return order(ordering, limit); });
   session_.expect_ok(ordered, "ordering the matrix");
   const SmStatus moved = clock_.timed("reordering", [&] { return steps.qxsmreorder(matrix_); });
   session_.expect_ok(moved, "applying the order");

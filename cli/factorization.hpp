@@ -6,6 +6,7 @@
 
 #include "cli/loading.hpp"
 #include "cli/module_session.hpp"
+#include "cli/orderings.hpp"
 #include "cli/phases.hpp"
 
 namespace sm::cli {
@@ -28,8 +29,10 @@ class Factorization {
   // CommandError.
   Factorization(ModuleSession& session, const LoadedMatrix& upper, PhaseClock& clock);
 
-  void analyse();  // qxsmmd, qxsmreorder, qxsmsymbfact
-  bool factor();   // qxsmnumfact; false when the matrix is not positive semidefinite
+  // qxsmmd or qxsmorder, qxsmreorder, qxsmsymbfact. `limit` as in require_memory, for an order that is found outside
+  // the module.
+  void analyse(Ordering ordering, std::uint64_t limit);
+  bool factor();  // qxsmnumfact; false when the matrix is not positive semidefinite
 
   // b and x hold n doubles for each of `count` right-hand sides. After factor().
   void solve(const double* b, double* x, std::int64_t count);
@@ -45,6 +48,7 @@ class Factorization {
   SmMatrix* matrix() { return matrix_; }           // for operations of the module that need no more than the factor
 
  private:
+  SmStatus order(Ordering ordering, std::uint64_t limit);
   void count();
 
   ModuleSession& session_;

@@ -33,6 +33,10 @@ void report_matrix(Report& report, const LoadedMatrix& matrix) {
   report.add("stored_entries", matrix.file_entries, "stored entries", text);
 }
 
+void report_ordering(Report& report, Ordering ordering) {
+  report.add("ordering", ordering_name(ordering), "ordered by", ordering_text(ordering));
+}
+
 void report_outcome(Report& report, const Factorization& factorization) {
   const std::int64_t n = factorization.order();
   const bool definite = factorization.rank() == n;

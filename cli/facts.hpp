@@ -16,6 +16,8 @@ namespace sm::cli {
 std::uint64_t pool_ceiling(const CommonOptions& common);
 
 void report_matrix(Report& report, const LoadedMatrix& matrix);
+// By which order; how long finding it took is among the phases.
+void report_ordering(Report& report, Ordering ordering);
 // Rank, determinant, definiteness, dropped rows.
 void report_outcome(Report& report, const Factorization& factorization);
 void report_counts(Report& report, const FactorCounts& counts, std::int64_t order);

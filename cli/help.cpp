@@ -56,7 +56,7 @@ Example: how much the factor of a power network would fill in.
 const char* const kFactor =
     R"(Order and factor a symmetric matrix, and say what that took
 
-Factors A = U'DU in a minimum-degree order. Reported are the rank and the log-determinant over the accepted pivots,
+Factors A = U'DU in a fill-reducing order. Reported are the rank and the log-determinant over the accepted pivots,
 whether A is positive definite, semidefinite or neither (exit code 1), the rows whose pivots were dropped, the size of
 U (entries off the diagonal, fill ratio, subscripts stored in compressed form), operations and seconds by phase, and
 the peak of memory.
@@ -64,9 +64,16 @@ the peak of memory.
 General files are accepted when they are symmetric in value. Entries at one position are added together; zeros off the
 diagonal are not kept.
 
-Example:
+The order decides how much U fills in. --ordering md, minimum degree, is found fast and good for most matrices: mixed
+models, pedigrees, 2-D grids with five points. --ordering metis, nested dissection, takes about ten times as long to
+find and saves a third of the operations on wide stencils in the plane (13 points), more than half of them on 3-D
+grids: it is worth it where 'numeric' takes most of the time. --ordering amd is of md's kind, and often a little better
+on grids; --ordering natural is for a matrix whose file has it in a good order already, such as a narrow band.
+
+Examples:
 
   $ qxsm factor data/bcsstk13.mtx
+  ordered by       md, the module's minimum degree
   rank             2003 of 2003
   log-determinant  38330.04461650225
   definiteness     positive definite
@@ -77,6 +84,10 @@ Example:
   subscripts       27599 stored
   flops            61128103 (sum of L(L+2) over the rows of U, L entries off the diagonal)
   numeric          0.014 s, 4.449 GFLOP/s
+  ...
+  $ qxsm factor data/bcsstk13.mtx --ordering natural
+  ordered by       natural, as in the file
+  rank             2003 of 2003
   ...
 )";
 

@@ -14,6 +14,7 @@
 #include "cli/format.hpp"
 #include "cli/help.hpp"
 #include "cli/model_options.hpp"
+#include "cli/orderings.hpp"
 
 namespace sm::cli {
 namespace {
@@ -112,6 +113,21 @@ void add_reports(CLI::App& command, Options& options) {
                    "with --json, the object only");
 }
 
+// Of those that factor; `when` says when they do, if not always.
+void add_ordering(CLI::App& command, Options& options, const std::string& when = "") {
+  command
+      .add_option("--ordering", options.common.ordering,
+                  when +
+                      "The order of elimination.\n"
+                      "md: minimum degree (the default)\n"
+                      "amd: approximate minimum degree, by AMD\n"
+                      "metis: nested dissection, by METIS; takes longer\n"
+                      "to find, and pays on 3-D grids and wide stencils\n"
+                      "natural: as in the file")
+      ->check(one_of(ordering_names()))
+      ->type_name("NAME");
+}
+
 // What every subcommand with a matrix ends with.
 void add_common(CLI::App& command, Options& options) {
   add_reports(command, options);
@@ -132,12 +148,14 @@ void add_info(CLI::App& app, Options& options) {
                     "Also order the matrix and count the entries of\n"
                     "its factor, the operations and the memory that\n"
                     "factoring takes (symmetric matrices only)");
+  add_ordering(*command, options, "With --fill. ");
   add_common(*command, options);
 }
 
 void add_factor(CLI::App& app, Options& options) {
   CLI::App* command = add_command<run_factor, &Options::factor>(app, options, "factor", help::kFactor);
   add_file(*command, options.factor.matrix);
+  add_ordering(*command, options);
   add_common(*command, options);
 }
 
@@ -172,6 +190,7 @@ void add_solve(CLI::App& app, Options& options) {
                    "order of A, plus 2")
       ->check(count())
       ->type_name("K");
+  add_ordering(*command, options, "direct: ");
   add_common(*command, options);
 }
 
@@ -179,6 +198,7 @@ void add_invdiag(CLI::App& app, Options& options) {
   CLI::App* command = add_command<run_invdiag, &Options::invdiag>(app, options, "invdiag", help::kInvdiag);
   add_file(*command, options.invdiag.matrix);
   add_output(*command, options, "D.mtx", "Write the diagonal as a Matrix Market array of\none column");
+  add_ordering(*command, options);
   add_common(*command, options);
 }
 
@@ -191,6 +211,7 @@ void add_quad(CLI::App& app, Options& options) {
              "Write the form as a symmetric Matrix Market\n"
              "file: an array with --inverse or for a general\n"
              "array X, else coordinates;");
+  add_ordering(*command, options, "With --inverse. ");
   add_common(*command, options);
 }
 
@@ -201,6 +222,7 @@ void add_trace(CLI::App& app, Options& options) {
   command->add_flag("--inverse", options.trace.inverse,
                     "tr(A^-) or tr(A^- B), with A symmetric; A is\n"
                     "factored");
+  add_ordering(*command, options, "With --inverse. ");
   add_common(*command, options);
 }
 
@@ -208,6 +230,7 @@ void add_hermite(CLI::App& app, Options& options) {
   CLI::App* command = add_command<run_hermite, &Options::hermite>(app, options, "hermite", help::kHermite);
   add_file(*command, options.hermite.matrix);
   add_output(*command, options, "H.mtx", "Write H as Matrix Market coordinates");
+  add_ordering(*command, options);
   add_common(*command, options);
 }
 
@@ -222,6 +245,7 @@ void add_estimable(CLI::App& app, Options& options) {
                    "of l. Default: 1e-6")
       ->check(tolerance())
       ->type_name("T");
+  add_ordering(*command, options);
   add_common(*command, options);
 }
 
@@ -334,6 +358,20 @@ std::string help_text(const CLI::App& app) {
   return chosen.empty() ? app.help() : chosen.front()->help("qxsm");
 }
 
+// An order is for those that factor.
+void require_use_of_ordering(const CLI::App& app, const Options& options) {
+  if (options.common.ordering.empty()) return;
+  const char* const wanted = app.got_subcommand("info") && !options.info.fill              ? "--fill"
+                             : app.got_subcommand("quad") && !options.quad.inverse         ? "--inverse"
+                             : app.got_subcommand("trace") && !options.trace.inverse       ? "--inverse"
+                             : app.got_subcommand("solve") && options.solve.method == "cg" ? "--method direct"
+                                                                                           : nullptr;
+  if (!wanted) return;
+  throw CommandError({.what = "--ordering is given",
+                      .expected = fmt::format("{} with it", wanted),
+                      .advice = "see " + help_command(app)});
+}
+
 // What the options say together.
 void settle(const CLI::App& app, Options& options) {
   const SolveOptions& solve = options.solve;
@@ -342,6 +380,7 @@ void settle(const CLI::App& app, Options& options) {
                         .expected = "--method cg with it",
                         .advice = "see " + help_command(app)});
   }
+  require_use_of_ordering(app, options);
   options.filter = app.got_subcommand("convert") || app.got_subcommand("grid");
   if (app.got_subcommand("grid") && options.common.output.empty()) options.common.output = "-";
   PedigreeOptions& pedigree = options.pedigree;

@@ -8,10 +8,16 @@
 
 namespace sm::cli {
 
+Report::Report(std::string command) { json_["command"] = std::move(command); }
+
 void Report::add(const std::string& key, Json value, std::string label, std::string text) {
   json_[key] = std::move(value);
   lines_.emplace_back(std::move(label), std::move(text));
 }
+
+void Report::add_json(const std::string& key, Json value) { json_[key] = std::move(value); }
+
+void Report::add_text(std::string label, std::string text) { lines_.emplace_back(std::move(label), std::move(text)); }
 
 void Report::fail(const Problem& problem) {
   code_ = problem.code;
@@ -40,11 +46,6 @@ Json error_object(const Problem& problem) {
   error["advice"] = problem.advice;
   error["message"] = describe(problem);
   return error;
-}
-
-std::string json_text(const Json& json) {
-  // File names need not be UTF-8, but JSON must be.
-  return json.dump(2, ' ', false, Json::error_handler_t::replace) + "\n";
 }
 
 void write_all(int file, std::string_view text, const std::string& name) {

@@ -1,27 +1,26 @@
 // What a subcommand found out: each fact once, for the text and for the JSON object.
 #pragma once
 
-#include <nlohmann/json.hpp>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
 #include "cli/error.hpp"
+#include "cli/json.hpp"
 
 namespace sm::cli {
 
-using Json = nlohmann::ordered_json;
-
 class Report {
  public:
-  explicit Report(std::string command) { json_["command"] = std::move(command); }
+  explicit Report(std::string command);
 
   // A fact with its line of text.
   void add(const std::string& key, Json value, std::string label, std::string text);
   // A fact that the text states elsewhere.
-  void add_json(const std::string& key, Json value) { json_[key] = std::move(value); }
+  void add_json(const std::string& key, Json value);
   // A line whose facts are in the JSON object by other means, such as one row of a table.
-  void add_text(std::string label, std::string text) { lines_.emplace_back(std::move(label), std::move(text)); }
+  void add_text(std::string label, std::string text);
 
   // Prints what was made elsewhere in place of the facts.
   void replace(std::string text, std::string json) {
@@ -48,7 +47,6 @@ class Report {
 
 // The object that stands for a failure in JSON output.
 Json error_object(const Problem& problem);
-std::string json_text(const Json& json);
 
 // Writes all of `text` to a file descriptor. Throws CommandError, naming `name`, when that is not possible.
 void write_all(int file, std::string_view text, const std::string& name);

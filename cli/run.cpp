@@ -43,7 +43,9 @@ ModuleSession& Run::session() {
 Factorization& Run::analysed() {
   require_symmetric(matrix_);
   factorization_.emplace(session(), matrix_, clock_);
-  factorization_->analyse();
+  const Ordering ordering = common_.ordering.empty() ? Ordering::md : ordering_named(common_.ordering);
+  factorization_->analyse(ordering, common_.ceiling);
+  report_ordering(report_, ordering);
   return *factorization_;
 }
 

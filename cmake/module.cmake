@@ -54,10 +54,14 @@ add_library(qxesm_objects OBJECT
   forms/inverse_forms.cpp
   forms/kernels.cpp
   forms/multiply.cpp
+  forms/passes_avx2.cpp
+  forms/passes_avx512.cpp
+  forms/passes_portable.cpp
   forms/products.cpp
   forms/quadratic.cpp
   forms/scaling.cpp
   forms/sum.cpp
+  forms/tree_products.cpp
   forms/vector_forms.cpp
   ginv/accumulation.cpp
   ginv/addition.cpp

@@ -26,8 +26,8 @@ if(QXESM_SANITIZE)
   define_property(TARGET PROPERTY PLAIN_CODE INITIALIZE_FROM_VARIABLE QXESM_PLAIN_CODE
     BRIEF_DOCS "Compile without the sanitizers")
   set(instrumented $<NOT:$<BOOL:$<TARGET_PROPERTY:PLAIN_CODE>>>)
-  target_compile_options(qxesm_options INTERFACE -fno-omit-frame-pointer -g
-    "$<${instrumented}:-fsanitize=address,undefined;-fno-sanitize-recover=undefined>")
+  target_compile_options(qxesm_options INTERFACE
+    "$<${instrumented}:-fno-omit-frame-pointer;-g;-fsanitize=address,undefined;-fno-sanitize-recover=undefined>")
   target_link_options(qxesm_options INTERFACE -fsanitize=address,undefined)
 endif()
 if(QXESM_COVERAGE)

@@ -17,11 +17,11 @@ namespace {
 
 constexpr std::int32_t kLongSum = 250;
 constexpr i64 kLongDot = 500;
-constexpr i64 kLongestDot = INT_MAX;  // what a BLAS counts
+constexpr i64 kLongest = INT_MAX;  // what a BLAS counts
 constexpr int kUnit = 1;
 
 double blas_dot(const double* x, const double* y, i64 n) {
-  const int length = static_cast<int>(std::min(n, kLongestDot));
+  const int length = static_cast<int>(std::min(n, kLongest));
   return ddot_(&length, x, &kUnit, y, &kUnit);
 }
 
@@ -35,10 +35,21 @@ void hzvaxpy(double* z, const double* x, const double* y, std::int32_t n, double
   for (std::int32_t i = 0; i < n; ++i) z[i] = x[i] + a * y[i];
 }
 
+void add_multiple(double* z, const double* y, i64 n, double a) {
+  if (n < kLongSum) {
+    hzvaxpy(z, z, y, static_cast<std::int32_t>(std::max(n, i64{0})), a);
+    return;
+  }
+  for (i64 done = 0; done < n; done += kLongest) {
+    const int length = static_cast<int>(std::min(n - done, kLongest));
+    daxpy_(&length, &a, y + done, &kUnit, z + done, &kUnit);
+  }
+}
+
 double hzvdot11(const double* x, const double* y, i64 n) {
   if (n < kLongDot) return lane_dot(x, y, n);
   double sum = blas_dot(x, y, n);
-  for (i64 done = kLongestDot; done < n; done += kLongestDot) sum += blas_dot(x + done, y + done, n - done);
+  for (i64 done = kLongest; done < n; done += kLongest) sum += blas_dot(x + done, y + done, n - done);
   return sum;
 }
 

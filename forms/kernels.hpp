@@ -10,6 +10,9 @@ namespace sm {
 // updates in place only, so a third array stays in the loop here, however long it is.
 void hzvaxpy(double* z, const double* x, const double* y, std::int32_t n, double a);
 
+// z += a y for any n: hzvaxpy in place, in pieces when there are more elements than it can count.
+void add_multiple(double* z, const double* y, i64 n, double a);
+
 // Sum of x[i] y[i]; from 500 elements on, ddot, in pieces when there are more than it can count.
 double hzvdot11(const double* x, const double* y, i64 n);
 

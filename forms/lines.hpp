@@ -16,29 +16,29 @@
 namespace sm {
 
 // Entries of a line that lie side by side: v[0] is at index `first`.
-struct Run {
+struct Stretch {
   const double* v;
   i64 first;
   i64 count;
 };
 
-inline Run run_of(const FullArray& a, i64 o) {
-  return a.layout.col_step == 1 ? Run{a.find(o, 0), 0, a.cols} : Run{a.find(0, o), 0, a.rows};
+inline Stretch run_of(const FullArray& a, i64 o) {
+  return a.layout.col_step == 1 ? Stretch{a.find(o, 0), 0, a.cols} : Stretch{a.find(0, o), 0, a.rows};
 }
-inline Run run_of(const DiagonalArray& a, i64 o) { return {a.values + o, o, 1}; }
+inline Stretch run_of(const DiagonalArray& a, i64 o) { return {a.values + o, o, 1}; }
 // Without the diagonal, which is at one end.
-inline Run run_of(const Packed<PackedColumns>& a, i64 o) { return {a.diagonal(o) - o, 0, o}; }
-inline Run run_of(const Packed<PackedRows>& a, i64 o) { return {a.diagonal(o) + 1, o + 1, a.cols - 1 - o}; }
+inline Stretch run_of(const Packed<PackedColumns>& a, i64 o) { return {a.diagonal(o) - o, 0, o}; }
+inline Stretch run_of(const Packed<PackedRows>& a, i64 o) { return {a.diagonal(o) + 1, o + 1, a.cols - 1 - o}; }
 
 template <class View>
 concept InRuns = requires(const View& a) {
   run_of(a, i64{0});
 };
 
-inline Run clip(const Run& run, Range range) {
+inline Stretch clip(const Stretch& run, Range range) {
   const i64 first = std::max(run.first, range.first);
   const i64 last = std::min(run.first + run.count - 1, range.last);
-  return first > last ? Run{nullptr, first, 0} : Run{run.v + (first - run.first), first, last - first + 1};
+  return first > last ? Stretch{nullptr, first, 0} : Stretch{run.v + (first - run.first), first, last - first + 1};
 }
 
 inline NonzeroNode* node_of(uint64_t link) { return reinterpret_cast<NonzeroNode*>(link & ~SM_LINK_TAGS); }
@@ -109,7 +109,7 @@ template <class View>
 LineSum line_sum(const View& a, i64 o, Range range, const double* x) {
   LineSum sum;
   if constexpr (InRuns<View>) {
-    const Run run = clip(run_of(a, o), range);
+    const Stretch run = clip(run_of(a, o), range);
     if (run.count > 0) sum.add_off(lane_dot(run.v, x + (run.first - range.first), run.count));
     if (View::one_triangle && range.has(o)) sum.add_diagonal(*a.diagonal(o) * x[o - range.first]);
   } else {
@@ -125,7 +125,7 @@ LineSum line_sum(const View& a, i64 o, Range range, const double* x) {
 template <class View>
 void line_add(const View& a, i64 o, Range range, double t, double* y) {
   if constexpr (InRuns<View>) {
-    const Run run = clip(run_of(a, o), range);
+    const Stretch run = clip(run_of(a, o), range);
     if (run.count > 0) lane_add(y + (run.first - range.first), run.v, run.count, t);
   } else {
     for_line(a, o, range, [&](i64 k, double v) {
@@ -144,7 +144,7 @@ inline bool lines_are_rows(const FullArray& a) { return a.layout.col_step == 1; 
 // Both ways at once for a whole line of a triangle.
 template <class View>
 void line_exchange(const View& a, i64 o, const double* x, double* y) {
-  const Run run = run_of(a, o);
+  const Stretch run = run_of(a, o);
   line_add(a, o, {0, a.cols - 1}, x[o], y);
   y[o] += *a.diagonal(o) * x[o] + lane_dot(run.v, x + run.first, run.count);
 }
@@ -158,7 +158,7 @@ inline void line_exchange(const UpperRows& a, i64 o, const double* x, double* y)
   y[o] += sum;
 }
 
-// y += A x for a whole matrix.
+// y += A x for a whole matrix. Compressed rows have passes of their own (forms/passes.hpp); this is their plain road.
 template <class View>
 requires View::one_triangle void add_product(const View& a, const double* x, double* y) {
   for (i64 o = 0; o < a.rows; ++o) line_exchange(a, o, x, y);

@@ -9,6 +9,8 @@
 //
 // A' X is formed for whole matrices, of every kind and format.
 #include "forms/lines.hpp"
+#include "forms/passes.hpp"
+#include "forms/tree_products.hpp"
 #include "store/checks.hpp"
 
 namespace sm {
@@ -38,6 +40,36 @@ void clear(const Block& block, i64 length) {
   if (!block.accumulate && block.count > 0) std::fill_n(block.y, length * block.count, 0.0);
 }
 
+// Whether most entries lie so near to the diagonal that vectors side by side profit from it, judged by a few rows.
+bool stays_near(const UpperRows& a) {
+  constexpr i64 looks = 256;
+  const i64 step = a.rows / looks + 1;
+  i64 entries = 0, far = 0;
+  for (i64 i = 0; i < a.rows; i += step) {
+    a.row(i, [&](i64 k, double) {
+      entries += k != i;
+      far += k - i >= kProductReach;
+    });
+  }
+  return 2 * far <= entries;
+}
+
+void multiply_whole(const UpperRows& a, const Block& block) {
+  const Passes& pass = passes();
+  const bool together = block.count > 1 && a.is_ascending && stays_near(a);
+  for (i64 v = 0; v < block.count;) {
+    const int group = together ? static_cast<int>(std::min<i64>(block.count - v, kProductLanes)) : 1;
+    const double* x = block.x + v * a.rows;
+    double* y = block.y + v * a.rows;
+    if (group > 1) {
+      pass.multiply_several(a, x, y, group, block.accumulate);
+    } else {
+      pass.multiply(a, x, y, block.accumulate);
+    }
+    v += group;
+  }
+}
+
 // y += A[outs, ins] x, or y += (A[ins, outs])' x when transposed.
 template <class View>
 void add_block(const View& a, Range outs, Range ins, const double* x, double* y, bool transposed) {
@@ -47,12 +79,7 @@ void add_block(const View& a, Range outs, Range ins, const double* x, double* y,
   const i64 last = std::max(sums ? outs.last : ins.last, adds ? ins.last : outs.last);
   for (i64 o = first; o <= last; ++o) {
     if (sums && outs.has(o)) y[o - outs.first] += line_sum(a, o, ins, x).total();
-    if (adds && ins.has(o)) {
-      const double t = x[o - ins.first];
-      // Rows of trees are added in the transposed product only, which leaves out those that meet an exact zero.
-      if (std::is_same_v<View, TreeRows> && t == 0.0) continue;
-      line_add(a, o, outs, t, y);
-    }
+    if (adds && ins.has(o)) line_add(a, o, outs, x[o - ins.first], y);
   }
 }
 
@@ -70,12 +97,23 @@ void add_each(const View& a, Range outs, Range ins, const Block& block, bool tra
     add_block(a, outs, ins, x, y, transposed);
   }
 }
+void add_each(const TreeRows& a, Range outs, Range ins, const Block& block, bool transposed) {
+  if (transposed) {
+    add_transposed_tree_product(a, block);
+  } else {
+    add_tree_product(a, block, outs, ins);
+  }
+}
 
 }  // namespace
 
 SmStatus multiply(SmMatrix& a, const Block& block, Range rows, Range cols) {
   SM_PASS(may_multiply(a, block));
   if (!rows.is_within(a.rows) || !cols.is_within(a.cols)) return SM_BAD_ARGUMENT;
+  if (is_symmetric_sparse(a) && rows.size() == a.rows && cols.size() == a.cols) {
+    multiply_whole(UpperRows(a), block);
+    return SM_OK;
+  }
   clear(block, rows.size());
   if (block.count < 1) return SM_OK;
   SM_PASS(may_take_block(a, rows, cols));
@@ -88,6 +126,10 @@ SmStatus multiply(SmMatrix& a, const Block& block, Range rows, Range cols) {
 
 SmStatus multiply_transposed(SmMatrix& a, const Block& block) {
   SM_PASS(may_multiply(a, block));
+  if (is_symmetric_sparse(a)) {
+    multiply_whole(UpperRows(a), block);
+    return SM_OK;
+  }
   clear(block, a.cols);
   if (block.count < 1) return SM_OK;
   const auto add = [&](const auto& view) {

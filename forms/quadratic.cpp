@@ -6,6 +6,7 @@
 //
 //   G S G'                  G general 21, S a packed array, the result symmetric 21; else 124
 #include "forms/lines.hpp"
+#include "forms/passes.hpp"
 #include "forms/results.hpp"
 #include "forms/rows.hpp"
 
@@ -61,13 +62,20 @@ double row_times(Rows& rows, i64 j, const double* w, i64 n, bool finite, double*
   return sum;
 }
 
+// w <- A x.
+template <class View>
+void form_product(const View& a, const double* x, double* w) {
+  std::fill_n(w, a.rows, 0.0);
+  add_product(a, x, w);
+}
+void form_product(const UpperRows& a, const double* x, double* w) { passes().multiply(a, x, w, false); }
+
 // Row i of X meets A once; the rows from i on then meet the product.
 template <class Rows, class View>
 SmStatus enter_forms(Rows& rows, const View& view, i64 count, double* x, double* w, double tolerance, SmMatrix& r) {
   for (i64 i = 0; i < count; ++i) {
     if (!scatter_row(rows, i, x, view.rows)) continue;
-    std::fill_n(w, view.rows, 0.0);
-    add_product(view, x, w);
+    form_product(view, x, w);
     const bool finite = is_finite(w, view.rows);
     for (i64 j = i; j < count; ++j) {
       const double sum = row_times(rows, j, w, view.rows, finite, x);

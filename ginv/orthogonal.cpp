@@ -40,7 +40,7 @@ SmStatus sweep_row(SmMatrix& a, i64 i, std::int16_t* active, double tolerance, d
     SM_TRY(row(a, k, v, 0));
     const double c = hzvdot11(u, v, a.cols) / s;
     if (!(std::fabs(c) > tolerance)) continue;
-    hzvaxpy(v, v, u, static_cast<std::int32_t>(a.cols), -c);
+    add_multiple(v, u, a.cols, -c);
     SM_TRY(rewrite_row(a, k, v, a.instance->tolerances[0]));
   }
   return SM_OK;

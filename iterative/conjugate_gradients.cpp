@@ -8,7 +8,10 @@
 
 #include "cholesky/ginverse2.hpp"
 #include "cholesky/steps.hpp"
-#include "forms/kernels.hpp"
+#include "forms/lanes.hpp"
+#include "forms/operations.hpp"
+#include "forms/passes.hpp"
+#include "frame/memory.hpp"
 #include "iterative/operations.hpp"
 #include "store/checks.hpp"
 #include "store/layouts.hpp"
@@ -30,36 +33,24 @@ struct ProgressWords {
 
 ProgressWords* progress_words(SmInstance& instance) { return reinterpret_cast<ProgressWords*>(instance.spare_word); }
 
-// One entry of the preconditioner: 1 and the generalized inverse of the diagonal element.
-struct PreconditionerBlock {
-  double one;
-  double inverse;
-};
-
-// The table of blocks, given back whatever happens.
-class Preconditioner {
+class ConjugateGradients {
  public:
-  explicit Preconditioner(SmMatrix& m) : m_(m) {}
-  ~Preconditioner() {
-    for (PreconditionerBlock*& block : table_.span()) give_back(m_.pool, block);
-  }
-  Preconditioner(const Preconditioner&) = delete;
-  Preconditioner& operator=(const Preconditioner&) = delete;
+  ConjugateGradients(SmMatrix& m, const IterativeTask& task) : m_(m), task_(task) {}
 
-  [[nodiscard]] SmStatus build() {
-    SM_TRY(table_.take(m_.pool, m_.rows, Fill::zero));
-    for (i64 i = 0; i < m_.rows; ++i) {
-      PreconditionerBlock*& block = table_.data()[i];
-      SM_TRY(allocate(m_.pool, 1, Fill::none, block));
-      *block = {1.0, diagonal(i)};
-      SM_TRY(invert(block->inverse));
+  [[nodiscard]] SmStatus prepare() {
+    SM_TRY(need_pool(m_));
+    SM_TRY(inverse_.take(m_.pool, m_.rows));
+    for (i64 i = 0; i < m_.rows; ++i) SM_TRY(invert_pivot(diagonal(i), singularity_tolerance(m_), inverse_.data()[i]));
+    std::fill_n(task_.x, task_.count * m_.rows, 0.0);
+    if (m_.format == SM_FORMAT_SPARSE) {
+      SM_TRY(strips_.take(m_.pool, strip_words(m_.rows)));
+      passes_.list_strips(UpperRows(m_), strips_.data());
     }
-    return SM_OK;
+    SM_TRY(r_.take(m_.pool, m_.rows));
+    SM_TRY(p_.take(m_.pool, m_.rows));
+    return q_.take(m_.pool, m_.rows);
   }
-
-  void apply(const double* r, double* z) {
-    for (i64 i = 0; i < m_.rows; ++i) z[i] = table_.data()[i]->inverse * r[i];
-  }
+  [[nodiscard]] SmStatus solve(const double* b, double* x);
 
  private:
   double diagonal(i64 i) const {
@@ -69,42 +60,19 @@ class Preconditioner {
     const i64 p = m_.row_start[i];
     return p < m_.row_start[i + 1] && m_.col_index[p] == i ? m_.nz_values[p] : 0.0;
   }
-  SmStatus invert(double& d) {
-    double log_det = 0.0;
-    i64 rank = 0;
-    std::int16_t definite = 0;
-    return ginverse2(m_.instance, &d, 1, &log_det, &rank, kPackedInverse, singularity_tolerance(m_), SM_FORMAT_ROWS,
-                     &definite);
-  }
-
-  SmMatrix& m_;
-  Scratch<PreconditionerBlock*> table_;
-};
-
-class ConjugateGradients {
- public:
-  ConjugateGradients(SmMatrix& m, const IterativeTask& task) : m_(m), task_(task), preconditioner_(m) {}
-
-  [[nodiscard]] SmStatus prepare() {
-    SM_TRY(need_pool(m_));
-    SM_TRY(preconditioner_.build());
-    std::fill_n(task_.x, task_.count * m_.rows, 0.0);
-    SM_TRY(r_.take(m_.pool, m_.rows));
-    SM_TRY(p_.take(m_.pool, m_.rows));
-    return q_.take(m_.pool, m_.rows);
-  }
-  [[nodiscard]] SmStatus solve(const double* b, double* x);
-
- private:
   SmStatus product(const double* from, double* to) {
-    return qxsmmultv(&m_, from, to, 0, m_.rows - 1, 0, m_.rows - 1, 1, 0);
+    const Range all = {0, m_.rows - 1};
+    return multiply(m_, {from, to, 1, false}, all, all);
   }
-  SmStatus exact_residual(const double* b, const double* x) {
+  // r <- b - A x; q is used up. Answers rho.
+  SmStatus exact_residual(const double* b, const double* x, double& rho) {
     SM_TRY(product(x, q_.data()));
-    for (i64 i = 0; i < m_.rows; ++i) r_.data()[i] = b[i] - q_.data()[i];
+    rho = passes_.measure(m_.rows, b, q_.data(), inverse_.data(), r_.data());
     return SM_OK;
   }
-  SmStatus step(const double* b, double* x, i64 k, double& rho);
+  // p <- M r + beta p, q <- A p, and p'q.
+  SmStatus direct(double beta, double& curvature);
+  SmStatus step(const double* b, double* x, i64 k, double beta, double& rho);
   bool told_to_stop(double rho, i64 k) {
     const ProgressWords* words = progress_words(*m_.instance);
     return words->callback && words->callback(words->context, rho, m_.solver_word, k) != 0;
@@ -112,45 +80,53 @@ class ConjugateGradients {
 
   SmMatrix& m_;
   const IterativeTask& task_;
-  Preconditioner preconditioner_;
+  const Passes& passes_ = passes();
+  Scratch<double> inverse_;  // of the diagonal elements, 0 for one that has none
+  Scratch<i64> strips_;      // of the rows of A, which stay the same from step to step
   Scratch<double> r_, p_, q_;
 };
 
-// q serves three times: for the direction's product, for A x when the residual is recomputed, and for the
-// preconditioned residual; each is used up before the next.
-SmStatus ConjugateGradients::step(const double* b, double* x, i64 k, double& rho) {
-  double* r = r_.data();
+SmStatus ConjugateGradients::direct(double beta, double& curvature) {
   double* p = p_.data();
   double* q = q_.data();
-  const std::int32_t n = static_cast<std::int32_t>(m_.rows);
-  SM_TRY(product(p, q));
-  const double alpha = rho / hzvdot11(p, q, m_.rows);
-  hzvaxpy(x, x, p, n, alpha);
-  if (k % kExactResidualEvery == 0) {
-    SM_TRY(exact_residual(b, x));
-  } else {
-    hzvaxpy(r, r, q, n, -alpha);
+  const Direction direction = {inverse_.data(), r_.data(), beta, p, q};
+  if (m_.format == SM_FORMAT_SPARSE) {
+    curvature = passes_.direct(UpperRows(m_), strips_.data(), direction);
+    return SM_OK;
   }
-  double* z = q;
-  preconditioner_.apply(r, z);
-  const double next = hzvdot11(r, z, m_.rows);
-  const double beta = next / rho;
-  for (i64 i = 0; i < m_.rows; ++i) p[i] = z[i] + beta * p[i];
-  rho = next;
+  for (i64 i = 0; i < m_.rows; ++i) p[i] = direction.inverse[i] * direction.r[i] + beta * p[i];
+  SM_TRY(product(p, q));
+  curvature = lane_dot(p, q, m_.rows);
+  return SM_OK;
+}
+
+// The direction of a step is made in the step, from the rho of the last two: its product with A then finds it in the
+// caches.
+SmStatus ConjugateGradients::step(const double* b, double* x, i64 k, double beta, double& rho) {
+  double curvature = 0.0;
+  SM_TRY(direct(beta, curvature));
+  const double alpha = rho / curvature;
+  if (k % kExactResidualEvery == 0) {
+    lane_add(x, p_.data(), m_.rows, alpha);
+    return exact_residual(b, x, rho);
+  }
+  rho = passes_.advance({m_.rows, alpha, p_.data(), q_.data(), inverse_.data(), x, r_.data()});
   return SM_OK;
 }
 
 SmStatus ConjugateGradients::solve(const double* b, double* x) {
-  SM_TRY(exact_residual(b, x));
-  preconditioner_.apply(r_.data(), p_.data());
   double& rho = task_.residual;
   i64& k = task_.iterations;
-  rho = hzvdot11(r_.data(), p_.data(), m_.rows);
+  SM_TRY(exact_residual(b, x, rho));
   const double bound = task_.tolerance * task_.tolerance * rho;
+  std::fill_n(p_.data(), m_.rows, 0.0);
+  double beta = 0.0;
   k = 0;
   // A measure that is not a number can neither converge nor improve.
   while (k < task_.max_iterations && !(rho <= bound) && !std::isnan(rho)) {
-    SM_TRY(step(b, x, k, rho));
+    const double before = rho;
+    SM_TRY(step(b, x, k, beta, rho));
+    beta = rho / before;
     ++k;
     if (told_to_stop(rho, k)) return SM_NOT_CONVERGED;
   }

@@ -5,15 +5,12 @@ root=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
 cd "$root" || exit 2
 exec </dev/null # nothing here asks
 jobs=$(nproc 2>/dev/null || echo 2)
-if command -v ccache >/dev/null; then
-  export CMAKE_C_COMPILER_LAUNCHER=ccache CMAKE_CXX_COMPILER_LAUNCHER=ccache
-fi
 
 # What the command and its libraries need, what the tests need on top, and what the checks with clang need. An entry
 # "package=command" counts as there when the command is, wherever it comes from.
-packages_build=(g++=g++ cmake=cmake ninja-build=ninja libblas-dev libcli11-dev libcsv-dev libeigen3-dev libfmt-dev libnlopt-dev
-  nlohmann-json3-dev zlib1g-dev)
-packages_tests=(pkgconf=pkg-config binutils=readelf libgtest-dev mandoc=mandoc)
+packages_build=(g++=g++ cmake=cmake ninja-build=ninja libblas-dev libcli11-dev libcsv-dev libeigen3-dev libfmt-dev
+  libmetis-dev libnlopt-dev libsuitesparse-dev nlohmann-json3-dev zlib1g-dev)
+packages_tests=(ccache=ccache pkgconf=pkg-config binutils=readelf libgtest-dev mandoc=mandoc)
 packages_clang=(clang=clang++ libclang-rt-dev clang-format=clang-format clang-tidy=run-clang-tidy)
 packages_coverage=(gcovr=gcovr)
 packages_bench=(libsuitesparse-dev libmetis-dev libeigen3-dev libopenblas-dev python3=python3)
@@ -49,4 +46,11 @@ need_packages() {
   "${sudo[@]}" apt-get update -qq || echo "apt-get update failed; trying with the lists that are there" >&2
   "${sudo[@]}" env DEBIAN_FRONTEND=noninteractive apt-get install -y -qq --no-install-recommends \
     -o DPkg::Lock::Timeout=300 "${missing[@]}" >/dev/null
+}
+
+# With a compiler cache the tests of a sanitizer build, which are compiled as in a release build, are compiled once.
+use_compiler_cache() {
+  if command -v ccache >/dev/null; then
+    export CMAKE_C_COMPILER_LAUNCHER=ccache CMAKE_CXX_COMPILER_LAUNCHER=ccache
+  fi
 }

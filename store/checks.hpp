@@ -1,6 +1,8 @@
 // Checks and bookkeeping that many operations share.
 #pragma once
 
+#include <cstdint>
+
 #include "frame/memory.hpp"
 #include "store/layouts.hpp"
 
@@ -22,8 +24,16 @@ inline Gate may_read(const SmMatrix& m) {
 
 // What was computed from the entries is no longer known.
 inline void void_results(SmMatrix& m) {
-  m.rank = 0;
-  m.log_det = missing();
+  // Entered elements void them time and again, and a look costs less than a store.
+  if (m.rank != 0) m.rank = 0;
+  if (std::bit_cast<std::uint64_t>(m.log_det) != SM_MISSING_BITS) m.log_det = missing();
+}
+
+// Whether an array of nnz elements at `p` shares any with the value array of the compressed rows, wherever it begins.
+inline bool overlaps_nz_values(const SmMatrix& m, const double* p) {
+  const auto given = reinterpret_cast<std::uintptr_t>(p);
+  const auto own = reinterpret_cast<std::uintptr_t>(m.nz_values);
+  return (given < own ? own - given : given - own) < static_cast<std::uintptr_t>(m.nnz) * sizeof(double);
 }
 
 // Entries of a matrix with a value array are about to change: a separate factor or inverse no longer belongs to them.

@@ -9,16 +9,100 @@ namespace sm {
 
 namespace {
 
-void drop_small_nodes(SmMatrix& m, double tolerance) {
-  const bool keep_diagonal = m.kind == SM_KIND_SYMMETRIC;
-  for_each_node(m, [&](i64 row, NonzeroNode& node) {
-    if (!(std::fabs(node.value) <= tolerance)) return;
-    if (keep_diagonal && node.key == row) {
-      node.value = 0.0;
-    } else {
-      unlink_node(m, row, node.key);
+NonzeroNode* target(uint64_t link) { return reinterpret_cast<NonzeroNode*>(link & ~SM_LINK_TAGS); }
+
+// The walk of one row, node by node as sm_node_next does it. In random order every node is a miss that waits for the one
+// before it; before a subtree of some height is walked, all of it is therefore asked for level by level, where the nodes
+// of a level do not wait for each other.
+class RowWalk {
+ public:
+  NonzeroNode* next_of(const NonzeroNode* node) {
+    NonzeroNode* next = target(node->right);
+    if (node->right & SM_LINK_THREAD) {
+      asked_for_ -= asked_for_ > 0;
+      return next;
     }
-  });
+    const bool asked = asked_for_ > 0;
+    asked_for_ -= asked;
+    if (next->left & SM_LINK_THREAD) return next;
+    NonzeroNode* way[kHeight];  // the last nodes on the way down
+    int depth = 0;
+    for (way[0] = next; !(next->left & SM_LINK_THREAD); way[depth % kHeight] = next) {
+      next = target(next->left);
+      ++depth;
+    }
+    if (!asked && depth >= kLow) ask_for(way[depth < kHeight ? 0 : (depth + 1) % kHeight]);
+    return next;
+  }
+
+ private:
+  static constexpr int kHeight = 8;    // of what is asked for at a time, along its left edge
+  static constexpr int kLow = 2;       // lower subtrees are walked as they come
+  static constexpr int kNodes = 1024;  // asked for at a time at most
+
+  void ask_for(const NonzeroNode* top) {
+    const NonzeroNode* nodes[kNodes];
+    nodes[0] = top;
+    int count = 1;
+    for (int i = 0; i < count; ++i) {
+      for (const uint64_t link : {nodes[i]->left, nodes[i]->right}) {
+        if ((link & SM_LINK_THREAD) || count == kNodes) continue;
+        nodes[count] = target(link);
+        __builtin_prefetch(nodes[count++]);
+      }
+    }
+    asked_for_ = count;
+  }
+
+  int asked_for_ = 0;  // so many nodes ahead have been
+};
+
+// The first nodes of the rows, one row after the other. In random order every node is a miss that waits for the one
+// before it, so what the rows ahead begin with is asked for early: two nodes of each, a row's second node when the
+// diagonal before it is there, and its third when the second is.
+class RowStarts {
+ public:
+  explicit RowStarts(SmMatrix& m) : m_(m), seeded_(is_symmetric_sparse(m) ? seeded_diagonal(m) : SeededDiagonal{}) {}
+  NonzeroNode* of(i64 row) {
+    if (row >= seeded_.rows) return first_node(m_, row);
+    NonzeroNode* diagonal = seeded_.slab + row;
+    if (row + kFar < seeded_.rows) {
+      __builtin_prefetch(target(diagonal[kFar].right));
+      if (const NonzeroNode* second = target(diagonal[kNear].right)) __builtin_prefetch(target(second->right));
+    }
+    return diagonal;
+  }
+
+ private:
+  static constexpr i64 kNear = 8;
+  static constexpr i64 kFar = 16;
+  SmMatrix& m_;
+  const SeededDiagonal seeded_;
+};
+
+// Unlinks what is small and answers how many rows have no diagonal: those that came in by growth may have none, and it
+// would be the first node, keys being at or above the row.
+i64 drop_small_nodes(SmMatrix& m, double tolerance) {
+  const bool keep_diagonal = m.kind == SM_KIND_SYMMETRIC;
+  i64 without_diagonal = 0;
+  RowStarts starts(m);
+  for (i64 row = 0; row < m.rows; ++row) {
+    NonzeroNode* node = starts.of(row);
+    if (!node || node->key != row) ++without_diagonal;
+    RowWalk walk;
+    while (node) {
+      NonzeroNode* next = walk.next_of(node);
+      if (std::fabs(node->value) <= tolerance) {
+        if (keep_diagonal && node->key == row) {
+          node->value = 0.0;
+        } else {
+          unlink_node(m, row, node->key);
+        }
+      }
+      node = next;
+    }
+  }
+  return without_diagonal;
 }
 
 // No branch in the body, so that it vectorises.
@@ -26,10 +110,10 @@ void drop_small_values(double* values, i64 count, double tolerance) {
   for (i64 i = 0; i < count; ++i) values[i] = std::fabs(values[i]) <= tolerance ? 0.0 : values[i];
 }
 
-// Rows that came in by growth have no diagonal until now; it would be the first node, keys being at or above the row.
+// The same count where nothing is dropped.
 i64 rows_without_diagonal(SmMatrix& m) {
   i64 count = 0;
-  for (i64 row = 0; row < m.rows; ++row) {
+  for (i64 row = seeded_diagonal(m).rows; row < m.rows; ++row) {
     const NonzeroNode* node = first_node(m, row);
     if (!node || node->key != row) ++count;
   }
@@ -38,10 +122,16 @@ i64 rows_without_diagonal(SmMatrix& m) {
 
 void fill_rows(SmMatrix& m, i64* row_start, i64* col_index, double* nz_values) {
   i64 k = 0;
+  row_start[0] = 0;
+  RowStarts starts(m);
   for (i64 row = 0; row < m.rows; ++row) {
-    const NonzeroNode* node = first_node(m, row);
-    if (!node || node->key != row) col_index[k++] = row;  // its value is the 0.0 of the fresh array
-    for (; node; node = sm_node_next(node)) {
+    const NonzeroNode* node = starts.of(row);
+    if (!node || node->key != row) {
+      col_index[k] = row;
+      nz_values[k++] = 0.0;
+    }
+    RowWalk walk;
+    for (; node; node = walk.next_of(node)) {
       col_index[k] = node->key;
       nz_values[k++] = node->value;
     }
@@ -49,15 +139,15 @@ void fill_rows(SmMatrix& m, i64* row_start, i64* col_index, double* nz_values) {
   }
 }
 
-SmStatus compress(SmMatrix& m) {
-  const i64 count = m.nnz + rows_without_diagonal(m);
+SmStatus compress(SmMatrix& m, i64 without_diagonal) {
+  const i64 count = m.nnz + without_diagonal;
   Scratch<i64> row_start;
   Scratch<i64> col_index;
   Scratch<double> nz_values;
   SM_TRY(need_pool(m));
-  SM_TRY(row_start.take(m.pool, m.rows + 1, Fill::zero));
-  SM_TRY(col_index.take(m.pool, count, Fill::zero));
-  SM_TRY(nz_values.take(m.pool, count, Fill::zero));
+  SM_TRY(row_start.take(m.pool, m.rows + 1, Fill::none));
+  SM_TRY(col_index.take(m.pool, count, Fill::none));
+  SM_TRY(nz_values.take(m.pool, count, Fill::none));
   fill_rows(m, row_start.data(), col_index.data(), nz_values.data());
   m.row_start = row_start.release();
   m.col_index = col_index.release();
@@ -85,8 +175,7 @@ SmStatus close(SmMatrix& m, double tolerance) {
   } else if (has_value_array(m)) {
     if (drops) drop_small_values(m.values, static_cast<i64>(m.value_count), tolerance);
   } else if (is_symmetric_sparse(m)) {
-    if (drops) drop_small_nodes(m, tolerance);
-    SM_TRY(compress(m));
+    SM_TRY(compress(m, drops ? drop_small_nodes(m, tolerance) : rows_without_diagonal(m)));
   } else {
     return SM_UNAVAILABLE;
   }

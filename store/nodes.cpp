@@ -12,34 +12,20 @@ namespace {
 
 constexpr i64 kRootSlack = 21;  // a root array that grows reaches this many words past the row that made it grow
 
-i64 node_stride(const SmMatrix& m) { return (m.node_size + 7) / 8 * 8; }
+constexpr i64 kSeededWords = sizeof(SeededDiagonal) / sizeof(uint64_t);
 
-// A fresh slab, its first node the spare one. On failure there is no spare node, and entries are refused from then on.
-SmStatus take_slab(SmMatrix& m) {
-  m.spare_node = nullptr;
-  m.next_node = nullptr;
-  SM_TRY(allocate(tree_pool(m), m.slab_nodes, Fill::zero, m.spare_node));
-  m.slab_used = node_stride(m);
-  m.next_node = m.spare_node + 1;
-  return SM_OK;
-}
-
-// The spare node has been linked in: count it and make the next one ready.
-SmStatus advance_spare(SmMatrix& m) {
-  ++m.nnz;
-  m.slab_used += node_stride(m);
-  if (m.slab_used > m.slab_bytes) return take_slab(m);
-  m.spare_node = m.next_node;
-  m.next_node = m.spare_node + 1;
-  return SM_OK;
+// Behind the root words there is room for seeded_diagonal().
+SmStatus take_roots(SmMatrix& m, i64 capacity, uint64_t*& roots) {
+  return allocate(tree_pool(m), capacity + kSeededWords, Fill::zero, roots);
 }
 
 SmStatus grow_roots(SmMatrix& m, i64 row) {
   if (row > SM_MAX_ELEMENTS - kRootSlack) return SM_TOO_LARGE;
   uint64_t* grown = nullptr;
-  SM_TRY(allocate(tree_pool(m), row + kRootSlack, Fill::zero, grown));
+  SM_TRY(take_roots(m, row + kRootSlack, grown));
   uint64_t*& roots = roots_of(m);
   std::copy_n(roots, m.row_capacity, grown);
+  std::copy_n(roots + m.row_capacity, kSeededWords, grown + row + kRootSlack);
   give_back(tree_pool(m), roots);
   roots = grown;
   m.row_capacity = row + kRootSlack;
@@ -67,11 +53,20 @@ SmStatus cover_general(SmMatrix& m, i64 row, i64 col) {
 
 }  // namespace
 
+SmStatus take_slab(SmMatrix& m) {
+  m.spare_node = nullptr;
+  m.next_node = nullptr;
+  SM_TRY(allocate(tree_pool(m), m.slab_nodes, Fill::zero, m.spare_node));
+  m.slab_used = node_stride(m);
+  m.next_node = m.spare_node + 1;
+  return SM_OK;
+}
+
 SmStatus start_trees(SmMatrix& m, i64 slab_nodes) {
   m.slab_nodes = slab_nodes;
   m.slab_bytes = m.node_size * slab_nodes;
   SM_TRY(take_slab(m));
-  return allocate(tree_pool(m), m.row_capacity, Fill::zero, roots_of(m));
+  return take_roots(m, m.row_capacity, roots_of(m));
 }
 
 SmStatus enter_node(SmMatrix& m, i64 row, i64 col, bool add, double value) {
@@ -79,12 +74,16 @@ SmStatus enter_node(SmMatrix& m, i64 row, i64 col, bool add, double value) {
   SM_TRY(is_symmetric_sparse(m) ? cover_symmetric(m, col) : cover_general(m, row, col));
   uint64_t* root = roots_of(m) + row;
   if (m.nnz >= SM_MAX_ELEMENTS && !m.tree->find(m.tree, root, &col)) return SM_TOO_LARGE;
-  NonzeroNode* spare = m.spare_node;
-  spare->key = col;
-  spare->value = value;
-  NonzeroNode* node = m.tree->insert(m.tree, root, spare);
-  if (node == spare) return advance_spare(m);
-  node->value = add ? node->value + value : value;
+  return enter_covered(m, root, col, add, value);
+}
+
+SmStatus seed_diagonal(SmMatrix& m) {
+  NonzeroNode* slab = m.spare_node;
+  for (i64 i = 0; i < m.rows; ++i) {
+    if (!m.spare_node) return SM_NO_MEMORY;
+    SM_TRY(enter_covered(m, m.sym_roots + i, i, false, 0.0));
+  }
+  seeded_diagonal(m) = {slab, std::min(m.rows, m.slab_nodes)};
   return SM_OK;
 }
 

@@ -13,8 +13,48 @@ inline MemoryPool* tree_pool(SmMatrix& m) { return is_symmetric_sparse(m) ? m.as
 // Sizes slabs and roots for row_capacity rows and takes the first slab and the roots from the trees' pool.
 [[nodiscard]] SmStatus start_trees(SmMatrix& m, i64 slab_nodes);
 
+// A fresh slab, its first node the spare one. On failure there is no spare node, and entries are refused from then on.
+[[nodiscard]] SmStatus take_slab(SmMatrix& m);
+
+// Enters a zero on every diagonal position of a symmetric matrix whose trees were just started. 101 or 0.
+[[nodiscard]] SmStatus seed_diagonal(SmMatrix& m);
+
 // Enters (row, col), growing the matrix when the index is past its size. 101, 105, or 0.
 [[nodiscard]] SmStatus enter_node(SmMatrix& m, i64 row, i64 col, bool add, double value);
+
+inline i64 node_stride(const SmMatrix& m) { return (m.node_size + 7) & ~i64{7}; }
+
+// The spare node has been linked in: count it and make the next one ready.
+[[nodiscard]] inline SmStatus advance_spare(SmMatrix& m) {
+  ++m.nnz;
+  m.slab_used += node_stride(m);
+  if (m.slab_used > m.slab_bytes) return take_slab(m);
+  m.spare_node = m.next_node;
+  m.next_node = m.spare_node + 1;
+  return SM_OK;
+}
+
+// Enters a column into the tree at `root` of a matrix that covers it, has a spare node and is not full. 101 or 0.
+[[nodiscard]] inline SmStatus enter_covered(SmMatrix& m, uint64_t* root, i64 col, bool add, double value) {
+  m.spare_node->key = col;
+  m.spare_node->value = value;
+  NonzeroNode* node = m.tree->insert(m.tree, root, m.spare_node);
+  // What is not kept over the call need not be saved for it.
+  if (node == m.spare_node) return advance_spare(m);
+  node->value = add ? node->value + m.spare_node->value : m.spare_node->value;
+  return SM_OK;
+}
+
+// What an open symmetric sparse matrix keeps behind its root words: where the zeros of its diagonal were entered. The
+// node of row i is slab + i for every row below `rows`. It is the first of its row for as long as the matrix is open,
+// because nothing left of the diagonal is taken and nothing is removed but by closing, which spares the diagonal.
+struct SeededDiagonal {
+  NonzeroNode* slab;
+  i64 rows;
+};
+inline SeededDiagonal& seeded_diagonal(const SmMatrix& m) {
+  return *reinterpret_cast<SeededDiagonal*>(m.sym_roots + m.row_capacity);
+}
 
 inline NonzeroNode* first_node(SmMatrix& m, i64 row) {
   uint64_t* roots = roots_of(m);

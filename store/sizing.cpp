@@ -96,8 +96,7 @@ SmStatus size_symmetric_trees(SmMatrix& m, i64 n) {
   m.assembly_pool = create_pool(SM_POOL_MATRIX, nullptr, nullptr);
   if (!m.assembly_pool) return SM_NO_MEMORY;
   SM_TRY(start_trees(m, m.row_capacity >= kManyRows ? kLargeSlab : m.row_capacity * kRowsPerSlabNode));
-  for (i64 i = 0; i < n; ++i) SM_TRY(assign(m, i, i, false, 0.0));
-  return SM_OK;
+  return m.tree ? seed_diagonal(m) : SM_NO_MEMORY;
 }
 
 SmStatus resize_symmetric(SmMatrix& m, i64 rows, i64 cols) {

@@ -44,8 +44,8 @@ QXESM_API SmStatus qxsmnumfact(SmMatrix* matrix);
  * others stay; rank and log-determinant are void, definite unknown.
  *   values  in  nnz values in closing order: the upper triangle row by row, columns ascending, the diagonal first (the
  *               order of nz_values as closing left them, whatever happened to the matrix since)
- * Answers: 0 with nothing done (empty); 1; 112 (not symmetric sparse); 113; 104 (values is null or the matrix's own
- * array); 101 (nothing is changed); 0. Cost: O(nnz). The first call on a reordered matrix finds where the values go,
+ * Answers: 0 with nothing done (empty); 1; 112 (not symmetric sparse); 113; 104 (values is null or overlaps nz_values);
+ * 101 (nothing is changed); 0. Cost: O(nnz). The first call on a reordered matrix finds where the values go,
  * keeps that (nnz words) and needs 2 nnz + n words more while it does; later calls allocate nothing. */
 QXESM_API SmStatus qxsmrefill(SmMatrix* matrix, const double* values);
 
@@ -109,8 +109,8 @@ QXESM_API SmStatus qxsminvdiag(SmMatrix* matrix, double* x);
  *   values  out  nnz doubles in closing order: the upper triangle row by row, columns ascending (as qxsmrefill takes
  *                them); untouched on every answer but 0
  * Rows and columns of dropped pivots give 0.
- * Answers: 0 with nothing done (empty); 1; 113; 111; 124 (not symmetric sparse); 104 (values is null or the matrix's
- * own array); qxsmfact's; 101; 0. Cost and memory: those of qxsminvdiag, and nnz doubles. The first call for a pattern
+ * Answers: 0 with nothing done (empty); 1; 113; 111; 124 (not symmetric sparse); 104 (values is null or overlaps
+ * nz_values); qxsmfact's; 101; 0. Cost and memory: those of qxsminvdiag, and nnz doubles. The first call for a pattern
  * finds the closing order and keeps it, as qxsmrefill does. Uses the record's factor_scratch. */
 QXESM_API SmStatus qxsminvpattern(SmMatrix* matrix, double* values);
 

@@ -19,7 +19,8 @@
  * cleared unless it accumulates: 0 (k < 1); 124 (symmetric in format 22 and not the whole matrix); 118 (symmetric
  * sparse past state 1 and not the whole matrix); 0.
  * Infinities and NaNs in x and in stored entries propagate. Nothing is allocated. The order of a sum is free, but the
- * same on every CPU. Cost: one pass over the block for each vector. */
+ * same on every CPU. Cost: one pass over the block for each vector; of a sparse matrix up to 8 vectors share a pass, but
+ * not through a whole symmetric one whose entries lie far from the diagonal, nor through a sub-block of one. */
 QXESM_API SmStatus qxsmmultv(SmMatrix* a, const double* x, double* y, int64_t r0, int64_t r1, int64_t c0, int64_t c1,
                              int64_t k, int32_t accumulate);
 
@@ -27,7 +28,7 @@ QXESM_API SmStatus qxsmmultv(SmMatrix* a, const double* x, double* y, int64_t r0
  *   x  in   rows x k          y  out  cols x k; never the array x
  * A general sparse matrix leaves out the rows that meet an exact zero of x; elsewhere everything propagates.
  * Answers: 0 with y untouched (empty); 1; 113; 104 (x is y); 0 (k < 1, with y cleared unless it accumulates); 0.
- * Nothing is allocated. Cost: one pass over the matrix for each vector. */
+ * Nothing is allocated. Cost: that of qxsmmultv. */
 QXESM_API SmStatus qxsmvmult(const double* x, SmMatrix* a, double* y, int64_t k, int32_t accumulate);
 
 /* r <- X A[c0..c1, c0..c1] X', packed, for p vectors.

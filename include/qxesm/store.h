@@ -101,7 +101,7 @@ QXESM_API SmStatus qxsmzscp(SmMatrix* matrix, const double* z, const int64_t* in
  * nothing. A symmetric sparse matrix turns into compressed rows of its upper triangle, diagonal first, columns
  * ascending, every diagonal present; its trees go back to the host. Only a matrix in state 0 is touched.
  * Answers: 0 with state 1 (empty); 1; 0 with nothing done (closed already); 105; 101 (the matrix stays open);
- * 124; 0. Cost: one walk over the entries. */
+ * 124; 0. Cost: one walk over the entries that drops, and for a symmetric sparse matrix one that converts. */
 QXESM_API SmStatus qxsmclose(SmMatrix* matrix, double tolerance);
 
 /* out <- row `row` of A from column `start` on (a negative start is 0).

@@ -76,6 +76,47 @@ TEST_F(HintTest, a_key_between_the_last_one_and_its_neighbour_goes_in_without_a_
   }
 }
 
+// The manager tells trees apart by the place of their root node, modulo that of 64 nodes. Here tree t has nodes at places
+// of its own, so that no tree is forgotten for another one.
+TEST_F(HintTest, trees_that_take_ascending_keys_by_turns_need_no_descent_from_the_root) {
+  constexpr std::size_t kTrees = 4;
+  constexpr std::size_t kPlaces = 64;
+  struct alignas(sizeof(NonzeroNode) * kPlaces) Slab {
+    std::array<NonzeroNode, kPlaces * 20> nodes;
+  };
+  const auto slab = std::make_unique<Slab>();
+  std::array<std::uint64_t, kTrees> roots = {};
+  for (std::size_t k = 0; k < 300; ++k) {
+    for (std::size_t t = 0; t < kTrees; ++t) {
+      constexpr std::size_t own = kPlaces / kTrees;
+      NonzeroNode& node = slab->nodes[k / own * kPlaces + t * own + k % own];
+      node.key = static_cast<std::int64_t>(k);
+      auto* top = reinterpret_cast<NonzeroNode*>(roots[t]);
+      const std::int64_t key = k < 3 ? 0 : top->key;
+      if (k >= 3) top->key = kFar;
+      ASSERT_EQ(&node, manager->insert(manager, &roots[t], &node)) << k;
+      if (k >= 3) top->key = key;
+    }
+  }
+  for (std::uint64_t& each : roots) {
+    std::int64_t key = 0;
+    for (NonzeroNode* node = manager->first(manager, &each); node; node = sm_node_next(node)) {
+      ASSERT_EQ(key++, node->key);
+    }
+    EXPECT_EQ(300, key);
+  }
+}
+
+TEST_F(HintTest, a_hint_that_was_no_help_many_times_is_right_again_later) {
+  CheckedTree tree(manager, &root);
+  Dice dice(20);
+  for (int round = 0; round < 20; ++round) {
+    for (const std::int64_t key : dice.permutation(100)) tree.insert(1000 * round + 7 * key);
+    for (std::int64_t key = 0; key < 900; ++key) tree.insert(1000 * round + key);
+    ASSERT_TRUE(tree.check()) << round;
+  }
+}
+
 TEST_F(HintTest, a_node_that_was_removed_is_not_looked_at_again) {
   // The removed node is scribbled over and freed; it was the last one inserted, with keys to follow beside it.
   for (std::int64_t n = 1; n < 40; ++n) {

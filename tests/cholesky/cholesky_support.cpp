@@ -1,5 +1,6 @@
 #include "cholesky/cholesky_support.hpp"
 
+#include <algorithm>
 #include <cmath>
 
 namespace sm::test {
@@ -131,6 +132,17 @@ Dense stored_u(const SmMatrix* matrix) {
 }
 
 std::vector<double> stored_reciprocals(const SmMatrix* matrix) { return doubles(matrix->factor_diag, matrix->rows); }
+
+OwnValuesInRoom::OwnValuesInRoom(SmMatrix* matrix)
+    : matrix_(matrix), block_(matrix->nz_values), room_(3 * sm::test::at(matrix->nnz), 0.5) {
+  std::copy_n(block_, matrix->nnz, room_.begin() + matrix->nnz);
+  matrix->nz_values = room_.data() + matrix->nnz;
+}
+
+OwnValuesInRoom::~OwnValuesInRoom() {
+  std::copy_n(matrix_->nz_values, matrix_->nnz, block_);
+  matrix_->nz_values = block_;
+}
 
 Dense solved_identity(SmMatrix* matrix) {
   const std::int64_t n = matrix->rows;

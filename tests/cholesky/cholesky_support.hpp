@@ -49,6 +49,24 @@ std::int64_t words_needed(const SmMatrix* matrix);
 Dense stored_u(const SmMatrix* matrix);
 std::vector<double> stored_reciprocals(const SmMatrix* matrix);
 
+// Has the values of the compressed rows in the middle of a larger array for as long as it lives, with as many elements
+// before and behind them: what neighbouring blocks of a host look like.
+class OwnValuesInRoom {
+ public:
+  explicit OwnValuesInRoom(SmMatrix* matrix);
+  ~OwnValuesInRoom();
+  OwnValuesInRoom(const OwnValuesInRoom&) = delete;
+  OwnValuesInRoom& operator=(const OwnValuesInRoom&) = delete;
+
+  double* at(std::size_t first) { return room_.data() + first; }  // the own values begin at nnz
+  const std::vector<double>& room() const { return room_; }
+
+ private:
+  SmMatrix* matrix_;
+  double* block_;
+  std::vector<double> room_;
+};
+
 // The columns of A^- from solves with the unit vectors.
 Dense solved_identity(SmMatrix* matrix);
 

@@ -97,6 +97,28 @@ TEST_P(InversePatternTest, its_diagonal_is_that_of_the_inverse) {
   }
 }
 
+TEST_P(InversePatternTest, refuses_any_array_that_overlaps_its_own_values) {
+  Random random(6);
+  const Problem problem = positive_definite(grid(3, 3), random);
+  const std::vector<double> want = at_entries(problem, inverse(problem.dense()));
+  for (const std::int32_t state : kStates) {
+    SmMatrix* m = new_sparse(session(), problem);
+    ASSERT_EQ(bring_to(m, state), SM_OK);
+    const std::size_t nnz = at(m->nnz);
+    OwnValuesInRoom moved(m);
+    const std::vector<double> before = moved.room();
+    for (std::size_t first = 1; first < 2 * nnz; ++first) {
+      EXPECT_EQ(qxsminvpattern(m, moved.at(first)), SM_BAD_ARGUMENT) << "state " << state << " at " << first;
+      EXPECT_EQ(moved.room(), before);
+      EXPECT_EQ(m->state, state) << "refused before it factors";
+    }
+    for (const std::size_t first : {std::size_t{0}, 2 * nnz}) {
+      ASSERT_EQ(qxsminvpattern(m, moved.at(first)), SM_OK) << "a neighbour is no part of it";
+      EXPECT_TRUE(near(std::vector<double>(moved.at(first), moved.at(first) + nnz), want, 1e-12));
+    }
+  }
+}
+
 TEST_P(InversePatternTest, its_checks_come_in_order) {
   EXPECT_EQ(refused(new_untyped(session())), SM_OK);
   EXPECT_EQ(refused(new_sparse(session(), Problem{"empty", 0, {}}, false)), SM_OK);  // empty before open

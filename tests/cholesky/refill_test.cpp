@@ -150,6 +150,28 @@ TEST_P(RefillTest, takes_values_of_any_sort) {
   EXPECT_EQ(m->rank, 1);
 }
 
+// The refused arrays are parts of one in which the matrix's values have room before and behind them, as of a host that
+// hands out neighbouring blocks.
+TEST_P(RefillTest, refuses_any_array_that_overlaps_its_own_values) {
+  Random random(12);
+  const Problem problem = positive_definite(grid(3, 3), random);
+  for (const std::int32_t state : kStates) {
+    SmMatrix* m = new_sparse(session(), problem);
+    ASSERT_EQ(bring_to(m, state), SM_OK);
+    const std::size_t nnz = at(m->nnz);
+    OwnValuesInRoom moved(m);
+    const std::vector<double> before = moved.room();
+    for (std::size_t first = 1; first < 2 * nnz; ++first) {
+      EXPECT_EQ(qxsmrefill(m, moved.at(first)), SM_BAD_ARGUMENT) << "state " << state << " at " << first;
+      EXPECT_EQ(moved.room(), before);
+      EXPECT_EQ(m->state, state);
+    }
+    for (const std::size_t first : {std::size_t{0}, 2 * nnz}) {
+      EXPECT_EQ(qxsmrefill(m, moved.at(first)), SM_OK) << "a neighbour is no part of it";
+    }
+  }
+}
+
 TEST_P(RefillTest, answers_its_refusals_in_order) {
   Random random(11);
   SmMatrix* empty = nullptr;

@@ -4,10 +4,11 @@
 #include <gtest/gtest.h>
 
 #include <functional>
-#include <nlohmann/json.hpp>
 #include <string>
 #include <tuple>
 #include <vector>
+
+#include "cli/printed_json.hpp"
 
 namespace sm::test {
 
@@ -16,7 +17,7 @@ struct Outcome {
   std::string out;
   std::string err;
 
-  nlohmann::json json() const { return nlohmann::json::parse(out); }
+  PrintedJson json() const { return PrintedJson::parse(out); }
   // What stands behind a label in the text; a test failure when there is no such line.
   std::string fact(const std::string& label) const;
 };

@@ -7,7 +7,7 @@ namespace {
 
 class FactorCommand : public CommandTest {
  protected:
-  nlohmann::json factor(const std::string& kind, const std::string& rest, int code = 0) const {
+  PrintedJson factor(const std::string& kind, const std::string& rest, int code = 0) const {
     const Outcome run = qxsm({"factor", matrix("a.mtx", kind, rest), "--json"});
     EXPECT_EQ(run.code, code) << run.err;
     return run.json();
@@ -37,7 +37,7 @@ TEST_F(FactorCommand, drops_the_dependent_row_of_a_singular_matrix) {
   EXPECT_EQ(json.at("log_determinant"), 0.0);
   EXPECT_EQ(json.at("definiteness"), "positive semidefinite, singular");
   ASSERT_EQ(json.at("rows_dropped").size(), 1u);
-  const int dropped = json.at("rows_dropped")[0];
+  const int dropped = json.at("rows_dropped")[0].get<int>();
   EXPECT_TRUE(dropped == 2 || dropped == 4) << dropped;
 }
 
@@ -46,8 +46,8 @@ TEST_F(FactorCommand, counts_rows_from_1_and_shortens_them_in_the_text_only) {
   const Outcome text = qxsm({"factor", a});
   EXPECT_EQ(text.fact("rank"), "2 of 15");
   EXPECT_EQ(text.fact("rows dropped"), "2, 3, 4, 5, 6, 7, 8, 9, 10, 11, ... (3 more)");
-  const nlohmann::json all = {2, 3, 4, 5, 6, 7, 8, 9, 10, 11, 12, 13, 14};
-  EXPECT_EQ(qxsm({"factor", a, "--json"}).json().at("rows_dropped"), all);
+  const std::vector<int> all = {2, 3, 4, 5, 6, 7, 8, 9, 10, 11, 12, 13, 14};
+  EXPECT_EQ(qxsm({"factor", a, "--json"}).json().at("rows_dropped").get<std::vector<int>>(), all);
 }
 
 TEST_F(FactorCommand, answers_no_to_an_indefinite_matrix) {
@@ -120,7 +120,7 @@ TEST_F(FactorCommand, times_its_phases_and_measures_memory) {
   const auto json = run.json();
   std::vector<std::string> names;
   for (const auto& phase : json.at("phases")) {
-    names.push_back(phase.at("name"));
+    names.push_back(phase.at("name").get<std::string>());
     EXPECT_GE(phase.at("seconds").get<double>(), 0.0);
     EXPECT_EQ(phase.contains("gflops"), phase.at("name") == "numeric");
   }
@@ -137,7 +137,7 @@ TEST_F(FactorCommand, times_its_phases_and_measures_memory) {
 TEST_F(FactorCommand, json_and_text_agree) {
   const Outcome text = qxsm({"factor", shipped("gr_30_30.mtx")});
   const auto json = qxsm({"factor", shipped("gr_30_30.mtx"), "--json"}).json();
-  EXPECT_EQ(text.fact("rank"), json.at("rank").dump() + " of 900");
+  EXPECT_EQ(text.fact("rank"), std::to_string(json.at("rank").get<int>()) + " of 900");
   EXPECT_EQ(std::stod(text.fact("log-determinant")), json.at("log_determinant").get<double>());
   EXPECT_EQ(text.fact("definiteness"), json.at("definiteness").get<std::string>());
   EXPECT_EQ(std::stoll(text.fact("nnz(U)")), json.at("nnz_u").get<long long>());

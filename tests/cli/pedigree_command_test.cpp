@@ -135,8 +135,8 @@ TEST_F(PedigreeCommand, reports_each_animal_where_no_file_is_named) {
   const Outcome run = qxsm({line[0], line[1], "--mendelian", "--json"});
   const auto list = run.json().at("per_animal");
   ASSERT_EQ(list.size(), 6u);
-  EXPECT_EQ(list.at(0).at("mendelian_variance"), 0.46875);
-  EXPECT_FALSE(list.at(0).contains("inbreeding"));
+  EXPECT_EQ(list[0].at("mendelian_variance"), 0.46875);
+  EXPECT_FALSE(list[0].contains("inbreeding"));
 }
 
 }  // namespace

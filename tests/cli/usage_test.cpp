@@ -8,8 +8,7 @@ TEST(Usage, wrong_usage_ends_with_2_and_says_where_help_is) {
   expect_message(
       qxsm({"invert", "a.mtx"}), 2,
       {"found the subcommand \"invert\", expected info, factor, solve, invdiag, quad, trace, hermite, estimable, "
-       "convert, pedigree, "
-       "lmm, reml, blup or grid",
+       "convert, pedigree, lmm, reml, blup or grid",
        "; see qxsm --help"});
   expect_message(qxsm({"solve"}), 2, {"A.mtx is required", "; see qxsm solve --help"});
   expect_message(qxsm({"solve", "a.mtx", "--frobnicate"}), 2, {"--frobnicate", "; see qxsm solve --help"});

@@ -25,7 +25,7 @@ struct Called {
 Called daxpy_called;
 Called ddot_called;
 
-// A piece of a dot product that is only counted, because no machine of ours holds vectors of that length.
+// A piece of a call that is only counted, because no machine of ours holds vectors of that length.
 struct Piece {
   const double* x;
   const double* y;
@@ -50,6 +50,10 @@ double ddot_(const int* n, const double* x, const int* incx, const double* y, co
 
 void daxpy_(const int* n, const double* a, const double* x, const int* incx, double* y, const int* incy) {
   daxpy_called = {daxpy_called.times + 1, *n, *incx * 100 + *incy, *a};
+  if (counted_pieces) {
+    counted_pieces->push_back({x, y, *n});
+    return;
+  }
   real<decltype(&daxpy_)>("daxpy_")(n, a, x, incx, y, incy);
 }
 
@@ -225,28 +229,66 @@ TEST(DotProduct, the_blas_takes_vectors_of_500_and_more) {
   }
 }
 
-TEST(DotProduct, a_vector_that_is_longer_than_the_blas_can_count_is_handed_over_in_pieces) {
-  constexpr std::int64_t most = std::numeric_limits<std::int32_t>::max();
-  const double x = 1.0;
-  const double y = 1.0;
+constexpr std::int64_t kMost = std::numeric_limits<std::int32_t>::max();
+constexpr std::int64_t kBeyond[] = {
+    kMost - 1, kMost, kMost + 1, kMost + 500, 2 * kMost, 2 * kMost + 7, std::int64_t{1} << 34};
+
+// Pieces of n elements of two vectors, each as long as the BLAS can count, and what is left over.
+void expect_pieces(const std::vector<Piece>& pieces, const double* x, const double* y, std::int64_t n) {
   const auto address = [](const double* first, std::int64_t i) {
     return reinterpret_cast<std::uintptr_t>(first) + static_cast<std::uintptr_t>(i) * sizeof(double);
   };
-  for (const std::int64_t n : {most - 1, most, most + 1, most + 500, 2 * most, 2 * most + 7, std::int64_t{1} << 34}) {
+  std::int64_t done = 0;
+  for (const Piece& piece : pieces) {
+    EXPECT_EQ(reinterpret_cast<std::uintptr_t>(piece.x), address(x, done)) << n;
+    EXPECT_EQ(reinterpret_cast<std::uintptr_t>(piece.y), address(y, done)) << n;
+    EXPECT_EQ(piece.n, std::min(kMost, n - done)) << n;
+    done += piece.n;
+  }
+  EXPECT_EQ(done, n);
+}
+
+TEST(DotProduct, a_vector_that_is_longer_than_the_blas_can_count_is_handed_over_in_pieces) {
+  const double x = 1.0;
+  const double y = 1.0;
+  for (const std::int64_t n : kBeyond) {
     std::vector<Piece> pieces;
     counted_pieces = &pieces;
     const double sum = hzvdot11(&x, &y, n);
     counted_pieces = nullptr;
     EXPECT_EQ(sum, static_cast<double>(n));
-    std::int64_t done = 0;
-    for (const Piece& piece : pieces) {
-      EXPECT_EQ(reinterpret_cast<std::uintptr_t>(piece.x), address(&x, done)) << n;
-      EXPECT_EQ(reinterpret_cast<std::uintptr_t>(piece.y), address(&y, done)) << n;
-      EXPECT_EQ(piece.n, std::min(most, n - done)) << n;
-      done += piece.n;
-    }
-    EXPECT_EQ(done, n);
+    expect_pieces(pieces, &x, &y, n);
   }
+}
+
+TEST(Multiple, a_vector_that_is_longer_than_the_blas_can_count_is_handed_over_in_pieces) {
+  double z = 1.0;
+  const double y = 1.0;
+  for (const std::int64_t n : kBeyond) {
+    std::vector<Piece> pieces;
+    counted_pieces = &pieces;
+    add_multiple(&z, &y, n, -2.5);
+    counted_pieces = nullptr;
+    EXPECT_EQ(daxpy_called.a, -2.5);
+    EXPECT_EQ(daxpy_called.strides, 101);
+    expect_pieces(pieces, &y, &z, n);
+  }
+}
+
+TEST(Multiple, every_length_is_added_in_place_and_one_below_1_touches_nothing) {
+  Random random(5);
+  for (const std::int32_t n : kLengths) {
+    const std::vector<double> y = random.vector(n);
+    const std::vector<double> before = random.vector(n);
+    std::vector<double> want(before);
+    for (std::size_t i = 0; i < want.size(); ++i) want[i] += -0.75 * y[i];
+    Output z(before);
+    const int called = daxpy_called.times;
+    add_multiple(z.data(), y.data(), n, -0.75);
+    EXPECT_TRUE(same(z.values(), want)) << n;
+    EXPECT_EQ(daxpy_called.times, called + (n >= 250 ? 1 : 0)) << n;
+  }
+  for (const std::int64_t n : {std::int64_t{0}, std::int64_t{-1}, -kHuge - 1}) add_multiple(nullptr, nullptr, n, 2.0);
 }
 
 TEST(LargestMagnitude, it_is_found_at_every_place_of_every_length) {

@@ -51,6 +51,43 @@ TEST_P(ClosingRandom, compressed_rows_hold_what_the_trees_held) {
   }
 }
 
+// Rows long enough for the trees to be walked in parts and for the tree extension to keep one by key.
+TEST_P(ClosingRandom, long_rows_filled_in_random_order_hold_what_a_map_holds) {
+  for (const double tolerance : {0.0, 1.0, kNan}) {
+    SCOPED_TRACE(tolerance);
+    Random random(31);
+    constexpr std::int64_t n = 12'000;
+    SmMatrix* m = square(kSymmetricSparse, n);
+    Nonzeros model;
+    for (std::int64_t step = 0; step < 30'000; ++step) {
+      const std::int64_t r = step % 3 == 0 ? random.below(40) : 5 * random.below(2);
+      const std::int64_t c = r + random.below(n - r);
+      const double value = random.dyadic();
+      ASSERT_EQ(fn().qxsmassign(m, r, c, 1, value), SM_OK);
+      model[{r, c}] += value;
+    }
+    ASSERT_EQ(fn().qxsmclose(m, tolerance), SM_OK);
+    EXPECT_EQ(compressed(m), dropped(model, tolerance, n));
+    EXPECT_EQ(fn().qxsmDestroyMatrix(instance(), &m), SM_OK);
+  }
+}
+
+TEST_P(ClosingRandom, a_diagonal_longer_than_a_slab_is_closed_whole) {
+  constexpr std::int64_t n = 1'000'030;
+  SmMatrix* m = square(kSymmetricSparse, n);
+  ASSERT_LT(m->slab_nodes, n);
+  ASSERT_EQ(set(m, 7, n + 4, 2.0), SM_OK) << "and grows";
+  ASSERT_EQ(add(m, n - 1, n - 1, 3.0), SM_OK);
+  ASSERT_EQ(add(m, n - 40, n - 2, 4.0), SM_OK);
+  ASSERT_EQ(fn().qxsmclose(m, 0.0), SM_OK);
+  ASSERT_EQ(m->nnz, n + 5 + 2);
+  for (std::int64_t i = 0; i < n + 5; ++i) ASSERT_EQ(m->col_index[m->row_start[i]], i);
+  EXPECT_EQ(m->row_start[n + 5], m->nnz);
+  EXPECT_EQ(at(m, 7, n + 4), 2.0);
+  EXPECT_EQ(at(m, n - 1, n - 1), 3.0);
+  EXPECT_EQ(at(m, n - 40, n - 2), 4.0);
+}
+
 TEST_P(ClosingRandom, trees_lose_what_is_small_and_nothing_else) {
   for (std::uint64_t seed = 50; seed < 62; ++seed) {
     SCOPED_TRACE(seed);

@@ -1,0 +1,61 @@
+// Products with the compressed rows of a symmetric matrix, and the sweeps over vectors between them.
+//
+// A row adds to the result at its own place and at those of its columns, so the memory that a product touches is the
+// matrix once and the vectors. Rows reach ahead, never back: what a row needs of the vectors is made ready in pieces
+// just before it (cleared, or computed), while the caches hold it.
+//
+// The passes are compiled for the widest vectors of a few processors. They multiply and add without fusing, in lanes
+// that are ours: the bits are the same on all of them.
+#pragma once
+
+#include "store/views.hpp"
+
+namespace sm {
+
+inline constexpr int kProductLanes = 8;     // vectors that go through the matrix together
+inline constexpr i64 kProductReach = 2048;  // rows ahead of the one at work that they have side by side
+
+inline i64 strip_words(i64 n) { return n / 4 + 2; }  // a strip has 8 rows at least, and others before it
+
+// The diagonal preconditioner, the residual, and what they make the next direction from.
+struct Direction {
+  const double* inverse;
+  const double* r;
+  double beta;
+  double* p;
+  double* q;
+};
+
+// Where a step leads: x and r along p and q.
+struct Step {
+  i64 n;
+  double alpha;
+  const double* p;
+  const double* q;
+  const double* inverse;
+  double* x;
+  double* r;
+};
+
+struct Passes {
+  // y <- A x, or y += A x when it accumulates.
+  void (*multiply)(const UpperRows& a, const double* x, double* y, bool accumulate);
+  // The same for count <= kProductLanes vectors, n elements each; for rows that ascend.
+  void (*multiply_several)(const UpperRows& a, const double* x, double* y, int count, bool accumulate);
+  // Where rows continue each other, for `direct`: strip_words(n) words.
+  void (*list_strips)(const UpperRows& a, i64* strips);
+  // p <- inverse r + beta p, element by element, and q <- A p. Answers p'q.
+  double (*direct)(const UpperRows& a, const i64* strips, const Direction& d);
+  // x += alpha p and r -= alpha q. Answers r' inverse r.
+  double (*advance)(const Step& s);
+  // r <- b - q. Answers r' inverse r.
+  double (*measure)(i64 n, const double* b, const double* q, const double* inverse, double* r);
+};
+
+extern const Passes kPortablePasses;
+extern const Passes kAvx2Passes;
+extern const Passes kAvx512Passes;
+
+const Passes& passes();
+
+}  // namespace sm

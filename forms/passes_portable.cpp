@@ -1,0 +1,31 @@
+// The passes of products with the vectors that every processor of the build has.
+#include <algorithm>
+
+#include "cholesky/tiles.hpp"
+#include "forms/passes.hpp"
+
+#define SM_PASS_TARGET
+
+namespace sm {
+
+namespace {
+
+#include "forms/passes_body.hpp"
+#include "forms/passes_several_body.hpp"
+
+}  // namespace
+
+const Passes kPortablePasses = kPasses;
+
+const Passes& passes() {
+  switch (chosen_tiles()) {
+    case TileSet::avx512:
+      return kAvx512Passes;
+    case TileSet::avx2:
+      return kAvx2Passes;
+    default:
+      return kPortablePasses;
+  }
+}
+
+}  // namespace sm

@@ -1,0 +1,223 @@
+// The passes over compressed rows, with each set of vectors that the CPU has, against one row after the other.
+#include "forms/passes.hpp"
+
+#include <cmath>
+
+#include "cholesky/tiles.hpp"
+#include "forms/compressed.hpp"
+#include "forms/forms_support.hpp"
+
+namespace sm::test {
+namespace {
+
+constexpr TileSet kSets[] = {TileSet::avx512, TileSet::avx2, TileSet::portable};
+
+class PassesTest : public ::testing::Test {
+ protected:
+  void TearDown() override {
+    if (!use_tiles(TileSet::avx512) && !use_tiles(TileSet::avx2)) use_tiles(TileSet::portable);
+  }
+  // Calls f() once for each set.
+  template <class F>
+  static void for_sets(F f) {
+    for (const TileSet set : kSets) {
+      if (!use_tiles(set)) continue;
+      SCOPED_TRACE(tile_kernels().name);
+      f();
+    }
+  }
+  static void expect_products(Compressed& a, Random& random);
+  static void expect_steps(Compressed& a, Random& random);
+  static void expect_all(const Pattern& pattern, Random& random) {
+    Compressed a(random, pattern);
+    expect_products(a, random);
+    expect_steps(a, random);
+    Compressed b(random, reordered(random, pattern), false);
+    expect_products(b, random);
+    expect_steps(b, random);
+  }
+};
+
+// A block that begins at an odd address, with guards on both sides. Everything is a NaN first, so that what is not
+// written, or read before it is written, shows.
+struct Guarded {
+  explicit Guarded(std::int64_t n, double fill = kNan) : v(at(n + 2), fill) { v.front() = v.back() = kUntouched; }
+  explicit Guarded(const std::vector<double>& from) : Guarded(static_cast<std::int64_t>(from.size())) {
+    std::copy(from.begin(), from.end(), v.begin() + 1);
+  }
+  double* data() { return v.data() + 1; }
+  std::vector<double> values() const {
+    EXPECT_EQ(v.front(), kUntouched);
+    EXPECT_EQ(v.back(), kUntouched);
+    return {v.begin() + 1, v.end() - 1};
+  }
+  std::vector<double> v;
+};
+
+void PassesTest::expect_products(Compressed& a, Random& random) {
+  const std::int64_t n = a.n();
+  for (int count = 1; count <= kProductLanes; count += count == 3 ? 2 : 1) {
+    SCOPED_TRACE(std::to_string(count) + " vectors of " + std::to_string(n));
+    Guarded x(random.vector(n * count));
+    const std::vector<double> before = random.vector(n * count);
+    const std::vector<double> sum = a.plain(x.values(), before, count);
+    const std::vector<double> alone = a.plain(x.values(), std::vector<double>(before.size()), count);
+    for_sets([&] {
+      Guarded y(n * count);
+      Guarded z(before);
+      if (count == 1) {
+        passes().multiply(a.rows(), x.data(), y.data(), false);
+        passes().multiply(a.rows(), x.data(), z.data(), true);
+      } else {
+        if (!a.rows().is_ascending) return;
+        passes().multiply_several(a.rows(), x.data(), y.data(), count, false);
+        passes().multiply_several(a.rows(), x.data(), z.data(), count, true);
+      }
+      ASSERT_TRUE(same(y.values(), alone));
+      ASSERT_TRUE(same(z.values(), sum));
+    });
+  }
+}
+
+// The direction that a step takes, where it leads, and the exact residual; sums to rounding, all else to the bit.
+void PassesTest::expect_steps(Compressed& a, Random& random) {
+  const std::int64_t n = a.n();
+  const std::vector<double> inverse = random.vector(n), residual = random.vector(n), first = random.vector(n);
+  const double beta = 0.75, alpha = -1.25;
+  std::vector<double> p(at(n)), x(at(n)), rest(at(n)), exact(at(n));
+  for (std::size_t i = 0; i < p.size(); ++i) p[i] = inverse[i] * residual[i] + beta * first[i];
+  const std::vector<double> q = a.plain(p, std::vector<double>(at(n)));
+  long double curvature = 0.0L, rho = 0.0L, exact_rho = 0.0L, scale = 1.0L;
+  for (std::size_t i = 0; i < p.size(); ++i) {
+    x[i] = first[i] + alpha * p[i];
+    rest[i] = residual[i] - alpha * q[i];
+    exact[i] = first[i] - q[i];
+    curvature += static_cast<long double>(p[i]) * q[i];
+    rho += static_cast<long double>(rest[i]) * inverse[i] * rest[i];
+    exact_rho += static_cast<long double>(exact[i]) * inverse[i] * exact[i];
+    scale += std::fabs(p[i] * q[i]) + std::fabs(rest[i] * inverse[i] * rest[i]);
+    scale += std::fabs(exact[i] * inverse[i] * exact[i]);
+  }
+  const double tolerance = static_cast<double>(scale) * 1e-11;
+  std::vector<double> sums;
+  for_sets([&] {
+    Indices strips(at(strip_words(n)) + 1, -77);
+    passes().list_strips(a.rows(), strips.data());
+    EXPECT_EQ(strips.back(), -77);
+    Guarded gp(first), gq(n), gx(first), gr(residual), ge(n);
+    const double pq = passes().direct(a.rows(), strips.data(), {inverse.data(), gr.data(), beta, gp.data(), gq.data()});
+    const double measured = passes().measure(n, first.data(), gq.data(), inverse.data(), ge.data());
+    const double next = passes().advance({n, alpha, gp.data(), gq.data(), inverse.data(), gx.data(), gr.data()});
+    ASSERT_TRUE(same(gp.values(), p));
+    ASSERT_TRUE(same(gq.values(), q));
+    ASSERT_TRUE(same(gx.values(), x));
+    ASSERT_TRUE(same(gr.values(), rest));
+    ASSERT_TRUE(same(ge.values(), exact));
+    EXPECT_NEAR(pq, static_cast<double>(curvature), tolerance);
+    EXPECT_NEAR(next, static_cast<double>(rho), tolerance);
+    EXPECT_NEAR(measured, static_cast<double>(exact_rho), tolerance);
+    if (sums.empty()) sums = {pq, next, measured};
+    EXPECT_EQ(bits(sums), bits(std::vector<double>{pq, next, measured})) << "the same bits on every CPU";
+  });
+}
+
+TEST_F(PassesTest, any_rows_give_what_one_row_after_the_other_gives) {
+  for (std::uint64_t seed = 0; seed < 60; ++seed) {
+    SCOPED_TRACE(seed);
+    Random random(seed);
+    const std::int64_t n = seed < 12 ? static_cast<std::int64_t>(seed / 3) : 1 + random.below(300);
+    expect_all(scattered(random, n, random.below(12)), random);
+  }
+}
+
+TEST_F(PassesTest, rows_that_continue_each_other_and_rows_between_them) {
+  for (std::uint64_t seed = 0; seed < 60; ++seed) {
+    SCOPED_TRACE(seed);
+    Random random(1000 + seed);
+    expect_all(patched(random, 20 + random.below(500)), random);
+  }
+}
+
+TEST_F(PassesTest, stencils_of_every_size) {
+  Random random(5);
+  for (std::int64_t n = 1; n <= 140; n += n < 40 ? 1 : 7) {
+    expect_all(stencil(n, {}), random);
+    expect_all(stencil(n, {1}), random);
+    expect_all(stencil(n, {1, 2, 30}), random);
+    expect_all(stencil(n, {3, 4, 5, 6, 7, 8, 9, 10, 11, 12, 13, 14, 15, 16, 17, 18, 19, 20, 21, 22, 23}), random);
+  }
+  for (std::int64_t width = 1; width <= 70; width += 3) expect_all(plane(width, 5), random);
+}
+
+TEST_F(PassesTest, columns_that_lie_beyond_the_window) {
+  Random random(6);
+  for (const std::int64_t n : {kProductReach - 1, kProductReach, kProductReach + 1, 2 * kProductReach + 13}) {
+    Compressed grid(random, stencil(n, {1, kProductReach - 9, kProductReach - 1, kProductReach, kProductReach + 1}));
+    expect_products(grid, random);
+    Compressed any(random, scattered(random, n, 3));
+    expect_products(any, random);
+  }
+}
+
+TEST_F(PassesTest, one_full_row_first_or_last) {
+  Random random(7);
+  for (const std::int64_t n : {2, 9, 300, 3000}) {
+    Pattern first = stencil(n, {});
+    for (std::int64_t j = 1; j < n; ++j) first[0].push_back(j);
+    expect_all(first, random);
+    expect_all(stencil(n, {n - 1}), random);
+    Pattern last = stencil(n, {});
+    for (std::int64_t i = 0; i + 1 < n; ++i) last[i].push_back(n - 1);
+    expect_all(last, random);
+  }
+}
+
+TEST_F(PassesTest, a_list_of_strips_covers_the_rows_and_finds_those_of_a_grid) {
+  Random random(8);
+  for (const auto& [pattern, least] : {std::pair(plane(100, 20), 90), std::pair(plane(12, 100), 65),
+                                       std::pair(stencil(1000, {1, 2}), 98), std::pair(scattered(random, 500, 5), 0)}) {
+    Compressed a(random, pattern);
+    for_sets([&] {
+      Indices strips(at(strip_words(a.n())), 0);
+      passes().list_strips(a.rows(), strips.data());
+      std::int64_t covered = 0, in_strips = 0;
+      for (const std::int64_t rows : strips) {
+        covered += std::abs(rows);
+        in_strips += std::max<std::int64_t>(rows, 0);
+      }
+      EXPECT_EQ(covered, a.n());
+      EXPECT_GE(100 * in_strips, least * a.n());
+      EXPECT_LE(in_strips, least > 0 ? a.n() : 0);
+    });
+  }
+}
+
+TEST_F(PassesTest, sums_that_round_have_the_same_bits_on_every_cpu_and_are_near_those_of_single_rows) {
+  Random random(9);
+  for (const Pattern& pattern : {plane(60, 40), scattered(random, 700, 9), patched(random, 900)}) {
+    Compressed a(random, pattern);
+    for (double& v : a.values()) v = 1.0 / v;
+    std::vector<double> x = random.vector(8 * a.n());
+    for (double& v : x) v = 1.0 / (v + 20.0);
+    const std::vector<double> want = a.plain(x, std::vector<double>(x.size()), 8);
+    std::vector<double> one, several;
+    for_sets([&] {
+      std::vector<double> y(at(a.n())), z(x.size());
+      passes().multiply(a.rows(), x.data(), y.data(), false);
+      passes().multiply_several(a.rows(), x.data(), z.data(), 8, false);
+      for (std::size_t i = 0; i < z.size(); ++i) {
+        ASSERT_NEAR(z[i], want[i], 1e-11 * (1.0 + std::fabs(want[i])));
+      }
+      for (std::size_t i = 0; i < y.size(); ++i) ASSERT_NEAR(y[i], want[i], 1e-11 * (1.0 + std::fabs(want[i])));
+      if (one.empty()) {
+        one = y;
+        several = z;
+      }
+      EXPECT_EQ(bits(y), bits(one));
+      EXPECT_EQ(bits(z), bits(several));
+    });
+  }
+}
+
+}  // namespace
+}  // namespace sm::test
