@@ -10,9 +10,9 @@
 namespace sm::mixed {
 namespace {
 
-constexpr double kNear = 0.03;                 // singular values that may be zeros
-constexpr double kOutwards = 0.2;              // how far a search goes back inside from a boundary that is none
-constexpr std::int64_t kCheapUnknowns = 3000;  // equations so small that the search begins several times
+constexpr double kNear = 0.03;     // singular values that may be zeros
+constexpr double kOutwards = 0.2;  // how far a search goes back inside from a boundary that is none
+constexpr double kCheap = 2e7;     // operations of an evaluation so quick that the search begins several times
 
 class Finder {
  public:
@@ -20,10 +20,12 @@ class Finder {
 
   Optimum find(const Factors& start) {
     Optimum best = settle(search(Parameters(start)));
-    if (!options_.several_starts || likelihood_.design().unknowns() > kCheapUnknowns) return best;
-    if (best.convergence == Convergence::stopped) return best;
+    const auto rows = static_cast<double>(likelihood_.design().rows());
+    const double operations = likelihood_.equations().facts().flops + 200.0 * rows;
+    if (!options_.several_starts || operations > kCheap || best.convergence == Convergence::stopped) return best;
     quiet_ = true;
     for (const Factors& other_start : other_starts(start)) {
+      if (!likelihood_.evaluate(other_start, false).defined) continue;
       Optimum other = settle(search(Parameters(other_start)));
       const bool lower = other.criterion < best.criterion - noise(best.criterion);
       const bool sounder = best.convergence != Convergence::converged && other.convergence == Convergence::converged &&
