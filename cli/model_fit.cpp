@@ -1,5 +1,6 @@
 #include <fmt/format.h>
 
+#include <algorithm>
 #include <chrono>
 #include <cmath>
 #include <fstream>
@@ -185,8 +186,12 @@ void ModelFit::write() {
 std::string ModelFit::text() const {
   mixed::SummaryOptions summary;
   summary.data = options_.data == "-" ? "standard input" : options_.data;
+  const std::vector<std::string>& columns = model_.fixed.names;
   for (const mixed::ModelFactor& factor : model_.factors) {
     if (factor.levels.empty()) continue;
+    // Without an intercept the first level has a column like the others.
+    const std::string first = factor.name + factor.levels.front();
+    if (std::find(columns.begin(), columns.end(), first) != columns.end()) continue;
     summary.references.push_back({.factor = factor.name,
                                   .level = model_.sum_contrasts ? factor.levels.back() : factor.levels.front(),
                                   .sum = model_.sum_contrasts});

@@ -37,7 +37,7 @@ Equations::Equations(Module& module, const ScaledDesign& design, const Gram& gra
     order_rows();
     module_.expect_ok(module_.qxsmreorder(matrix_), "ordering the mixed-model equations");
     module_.expect_ok(module_.qxsmsymbfact(matrix_), "finding the structure of the factor");
-    flops_ = facts().flops;
+    if (order_ > 0) flops_ = facts().flops;
   } catch (...) {
     if (matrix_) module_.fn().qxsmDestroyMatrix(module_.instance, &matrix_);
     throw;

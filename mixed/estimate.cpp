@@ -161,6 +161,7 @@ class Fitter {
     fit_.criterion = likelihood_.profiled(parts);
     set_variances(design_, factors, variance, fit_);
     say_boundary(optimum.parameters);
+    say_exact(variance);
     AtOptimum at_optimum{optimum.parameters, factors, variance, {}};
     if (fit_.convergence == Convergence::converged) {
       at_optimum.covariance = observed_covariance(likelihood_, optimum.parameters, optimum.values, variance);
@@ -188,6 +189,20 @@ class Fitter {
                         term.group, term.coefs.size(), parameters.rank(t)));
       }
     }
+  }
+
+  // Where random effects explain every observation the relative factors grow for ever, and the search ends somewhere.
+  void say_exact(double variance) {
+    double total = variance;
+    for (const VarianceComponent& component : fit_.varcomp) {
+      if (component.var2.empty() && !component.var1.empty()) total += component.vcov;
+    }
+    if (variance > 1e-7 * total) return;
+    fit_.singular = true;
+    fit_.messages.emplace_back(
+        "the residual variance is practically zero: the random effects explain every observation, and its value and "
+        "that "
+        "of the others are where the search ended");
   }
 
   void finish(const AtOptimum& optimum, const CriterionParts& parts) {
