@@ -16,7 +16,7 @@ constexpr double kSlack = 1e-11;
 constexpr int kLargestDenominator = 60;
 // Beyond these the columns are not held as a dense array.
 constexpr double kMostNumbers = 2e7;
-constexpr double kMostWork = 4e9;
+constexpr double kMostWork = 3e8;
 
 using Vector = std::vector<double>;
 

@@ -23,7 +23,6 @@ from jobs import HERE as SCRIPTS, JOBS, OURS  # noqa: E402
 from process import measured  # noqa: E402
 
 LONG = 60.0  # seconds of a fit that is not repeated
-ROUNDS = 3
 
 
 class Race:
@@ -57,7 +56,7 @@ class Race:
                 self.answers[name] = answers.theirs(file.read())
 
     def all_rounds(self):
-        for _ in range(1 if self.options.quick else ROUNDS):
+        for _ in range(1 if self.options.quick else self.options.rounds):
             for name, command in self.commands():
                 if name not in self.wrong and not any(r["cpu"] > LONG for r in self.runs.get(name, [])):
                     self.fit(name, command)
@@ -101,6 +100,7 @@ def parsed():
     parser.add_argument("--qxsm", required=True)
     parser.add_argument("--quick", action="store_true", help="small data, one round")
     parser.add_argument("--job", default=",".join(j.name for j in JOBS), help="some of " + ", ".join(j.name for j in JOBS))
+    parser.add_argument("--rounds", type=int, default=3)
     parser.add_argument("--add", action="store_true", help="keep earlier results")
     parser.add_argument("--longest", type=float, default=3600.0, help="seconds after which a fit is stopped")
     parser.add_argument("--work", default=os.path.join("build", "bench", "mixed"))
