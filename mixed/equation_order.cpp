@@ -86,6 +86,7 @@ void Equations::order_and_analyse() {
   }
   order_rows();
   prepare_factor(matrix_);
+  if (order_ == 0) return;
   const EquationFacts facts_now = facts();
   flops_ = facts_now.flops;
   if (!copy || flops_ < kDear * static_cast<double>(values_.size()) ||

@@ -34,10 +34,7 @@ Equations::Equations(Module& module, const ScaledDesign& design, const Gram& gra
     matrix_ = assemble();
     // Finding an order takes some hundred operations for each entry, whatever comes of it.
     module_.tell("ordering the equations", 300.0 * static_cast<double>(values_.size()));
-    order_rows();
-    module_.expect_ok(module_.qxsmreorder(matrix_), "ordering the mixed-model equations");
-    module_.expect_ok(module_.qxsmsymbfact(matrix_), "finding the structure of the factor");
-    if (order_ > 0) flops_ = facts().flops;
+    order_and_analyse();
   } catch (...) {
     if (matrix_) module_.fn().qxsmDestroyMatrix(module_.instance, &matrix_);
     throw;
