@@ -8,7 +8,8 @@ namespace sm::mixed {
 namespace {
 
 // Where one factorization takes fewer operations than this for each entry, there is little to gain.
-constexpr double kDear = 100.0;
+constexpr double kDear = 20.0;
+constexpr double kMostFill = 100.0;  // of a factor that is worth a second look
 
 std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
@@ -81,7 +82,7 @@ void Equations::order_and_analyse() {
   const double others = static_cast<double>(order_ - first);
   const double most_entries = static_cast<double>(values_.size()) + 0.5 * others * (others + 1.0);
   std::unique_ptr<Copy> copy;
-  if (first > 0 && terms.size() > 1 && most_entries < kDear * static_cast<double>(values_.size())) {
+  if (first > 0 && terms.size() > 1 && most_entries < kMostFill * static_cast<double>(values_.size())) {
     copy = std::make_unique<Copy>(module_, matrix_, "ordering the mixed-model equations");
   }
   order_rows();

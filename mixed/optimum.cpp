@@ -22,7 +22,7 @@ class Finder {
   Optimum find(const Factors& start) {
     const bool cheap = likelihood_.design().unknowns() <= kCheapUnknowns;
     const bool again = options_.several_starts && cheap;
-    Optimum best = settle(search(Parameters(cheap ? start : approached(start))));
+    Optimum best = settle(search(Parameters(options_.from_afar && !cheap ? approached(start) : start)));
     for (const double scale : {0.15, 4.0}) {
       if (!again || best.convergence == Convergence::stopped) break;
       Optimum other = settle(search(Parameters(scaled(start, scale))));
