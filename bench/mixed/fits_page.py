@@ -89,9 +89,13 @@ def overview(results):
     return text.table(["fit", "goal", "measured", "outcome"], rows, left=4)
 
 
+def sentence(reason):
+    return f"{reason[0].upper()}{reason[1:]}."
+
+
 def misses(results):
     reasons = explanations()
-    lines = [f"- {job.name}: {goal}: {measured or 'no time'}. {reasons.get(job.name, 'Not explained yet')}."
+    lines = [f"- {job.name}: {goal}: {measured or 'no time'}. {sentence(reasons.get(job.name, 'not explained yet'))}"
              for job in JOBS if results.of(job, OURS)
              for goal, measured, met in goals(results, job) if not met]
     return "\n".join(lines) + "\n" if lines else "None.\n"
@@ -130,6 +134,7 @@ def agreement(results):
         above = "–" if theirs is None else f"{theirs - mine['answer']['criterion']:+.2g}"
         verdict = verdict or ("agree" if other else "converged; nobody to compare with")
         warned = "; ".join(other["answer"]["facts"]["messages"]) if other and other["answer"] else ""
+        warned = warned.replace("|", "\\|")
         rows.append([job.name, verdict, f"{mine['answer']['criterion']:.4f}", above, warned])
     return text.table(["fit", "answers", "our criterion", "the other's, above ours", "its messages"], rows, left=2)
 
