@@ -81,7 +81,7 @@ Derivatives derivatives_at(Likelihood& likelihood, const Parameters& parameters,
 Dense factor_hessian(Likelihood& likelihood, const Parameters& parameters, const std::vector<double>& values,
                      double variance) {
   const std::size_t m = values.size();
-  const bool cheap = likelihood.design().unknowns() <= 50000;
+  const bool cheap = likelihood.design().unknowns() <= 50000 && likelihood.equations().facts().flops <= 1e8;
   double largest = 0.0;
   for (const double value : values) largest = std::max(largest, std::abs(value));
   Dense hessian(m * m, 0.0);
