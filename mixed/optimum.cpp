@@ -10,10 +10,11 @@
 namespace sm::mixed {
 namespace {
 
-constexpr double kNear = 0.03;     // singular values that may be zeros
-constexpr double kOutwards = 0.2;  // how far a search goes back inside from a boundary that is none
-constexpr double kCheap = 2e7;     // operations of an evaluation so quick that the search begins several times
-constexpr int kFirstSteps = 3;     // where it is not that quick, from afar
+constexpr double kNear = 0.03;        // singular values that may be zeros
+constexpr double kOutwards = 0.2;     // how far a search goes back inside from a boundary that is none
+constexpr double kCheap = 2e7;        // operations of an evaluation so quick that the search begins several times
+constexpr std::int64_t kMany = 3000;  // unknowns: from so many on the search is worth a better start
+constexpr int kFirstSteps = 3;        // to that
 
 class Finder {
  public:
@@ -22,7 +23,8 @@ class Finder {
   Optimum find(const Factors& start) {
     const auto rows = static_cast<double>(likelihood_.design().rows());
     const bool cheap = likelihood_.equations().facts().flops + 200.0 * rows <= kCheap;
-    Optimum best = settle(search(Parameters(options_.from_afar && !cheap ? approached(start) : start)));
+    const bool many = likelihood_.design().unknowns() > kMany;
+    Optimum best = settle(search(Parameters(options_.from_afar && many ? approached(start) : start)));
     if (!options_.several_starts || !cheap || best.convergence == Convergence::stopped) return best;
     quiet_ = true;
     for (const Factors& other_start : other_starts(start)) {
