@@ -162,7 +162,7 @@ class Fitter {
     fit_.criterion = likelihood_.profiled(parts);
     set_variances(design_, factors, variance, fit_);
     say_boundary(optimum.parameters);
-    say_exact(variance);
+    say_exact(factors);
     AtOptimum at_optimum{optimum.parameters, factors, variance, {}};
     if (fit_.convergence == Convergence::converged) {
       at_optimum.covariance = observed_covariance(likelihood_, optimum.parameters, optimum.values, variance);
@@ -193,17 +193,19 @@ class Fitter {
   }
 
   // Where random effects explain every observation the relative factors grow for ever, and the search ends somewhere.
-  void say_exact(double variance) {
-    double total = variance;
-    for (const VarianceComponent& component : fit_.varcomp) {
-      if (component.var2.empty() && !component.var1.empty()) total += component.vcov;
+  // In the coordinates of the design the squares of a factor sum to the mean variance that its term gives to a record:
+  // variances of coefficients have the units of their covariates, and would say nothing.
+  void say_exact(const Factors& factors) {
+    constexpr double kPractically = 1e-9;
+    double relative = 1.0;
+    for (const Dense& factor : factors) {
+      for (const double element : factor) relative += element * element;
     }
-    if (variance > 1e-7 * total) return;
+    if (relative * kPractically < 1.0) return;
     fit_.singular = true;
     fit_.messages.emplace_back(
         "the residual variance is practically zero: the random effects explain every observation, and its value and "
-        "that "
-        "of the others are where the search ended");
+        "that of the others are where the search ended");
   }
 
   void finish(const AtOptimum& optimum, const CriterionParts& parts) {

@@ -76,17 +76,38 @@ Derivatives derivatives_at(Likelihood& likelihood, const Parameters& parameters,
   return {parameters.gradient(parts.log_det_gradient), parameters.gradient(parts.s2_gradient)};
 }
 
+// What is a large change of each value: for one in a row of a factor the size of that row, the standard deviation of
+// its coefficient over that of the residual. One size for all would hide small coefficients beside large ones.
+std::vector<double> natural_lengths(const Parameters& parameters, const std::vector<double>& values) {
+  constexpr double kLeast = 0.05;
+  const Factors factors = parameters.factors(values);
+  std::vector<double> lengths;
+  for (std::size_t j = 0; j < values.size(); ++j) {
+    const Parameters::Place& place = parameters.places()[j];
+    const std::size_t k = parameters.order(place.term);
+    double row = 0.0;
+    double largest = 0.0;
+    for (std::size_t i = 0; i < k * k; ++i) {
+      const double element = factors[place.term][i];
+      if (i % k == place.row) row += element * element;
+      largest = std::max(largest, std::abs(element));
+    }
+    if (row == 0.0) row = largest > 0.0 ? largest * largest : 1.0;
+    lengths.push_back(std::max(std::abs(values[j]), kLeast * std::sqrt(row)));
+  }
+  return lengths;
+}
+
 // The Hessian of log_det + s2 / variance from central differences of its gradient; of two steps' differences the
 // leading error is taken out where evaluations are cheap (Richardson).
 Dense factor_hessian(Likelihood& likelihood, const Parameters& parameters, const std::vector<double>& values,
                      double variance) {
   const std::size_t m = values.size();
   const bool cheap = likelihood.design().unknowns() <= 50000 && likelihood.equations().facts().flops <= 1e8;
-  double largest = 0.0;
-  for (const double value : values) largest = std::max(largest, std::abs(value));
+  const std::vector<double> lengths = natural_lengths(parameters, values);
   Dense hessian(m * m, 0.0);
   for (std::size_t j = 0; j < m; ++j) {
-    const double step = (cheap ? 2e-3 : 2e-4) * std::max(std::abs(values[j]), 0.05 * largest);
+    const double step = (cheap ? 2e-3 : 2e-4) * lengths[j];
     const auto difference = [&](double h) {
       std::vector<double> there = values;
       there[j] = values[j] + h;

@@ -42,6 +42,8 @@ std::vector<Case> cases() {
       {"a_distant_response", {.rows = 60, .response_offset = 1e7, .terms = {one}}},
       {"small_variance", {.rows = 150, .terms = {{.levels = 10, .sd = 0.3}}}, 2},
       {"large_variance", {.rows = 60, .noise = 0.01, .terms = {one}}},
+      {"a_small_variance_beside_a_large_one",
+       {.rows = 150, .terms = {{.levels = 8, .sd = 200.0}, {.levels = 14, .sd = 0.4}}}},
       {"a_small_response", {.rows = 60, .noise = 1e-7, .terms = {{.levels = 8, .sd = 2e-7}}}},
       {"two_levels", {.rows = 9, .terms = {{.levels = 2, .sd = 3.0}}}},
   };
@@ -183,6 +185,40 @@ TEST_P(Fitting, ends_at_the_same_place_from_any_start) {
       EXPECT_NEAR(other.varcomp[i].vcov, first.varcomp[i].vcov, 1e-6 * std::abs(first.varcomp[i].vcov)) << size;
     }
   }
+}
+
+TEST(FittingUnits, changes_with_the_units_of_a_slope_only_what_has_them) {
+  LoadedModule loaded;
+  Model model = random_model({.rows = 120, .terms = {{.coefs = 2, .levels = 12, .sd = 1.5}}}, 1);
+  const Fit first = fit(model, loaded.module());
+  for (std::size_t i = 1; i < model.random[0].z.size(); i += 2) model.random[0].z[i] *= 1e-6;
+  const Fit other = fit(model, loaded.module());
+  EXPECT_FALSE(first.singular);
+  EXPECT_FALSE(other.singular);
+  EXPECT_TRUE(other.messages.empty()) << other.messages.front();
+  EXPECT_NEAR(other.criterion, first.criterion, 1e-8);
+  EXPECT_NEAR(other.varcomp[2].vcov, 1e12 * first.varcomp[2].vcov, 1e6 * first.varcomp[2].vcov);
+  EXPECT_NEAR(other.varcomp[3].vcov, first.varcomp[3].vcov, 1e-6 * first.varcomp[3].vcov);
+}
+
+TEST(FittingUnits, takes_precise_observations_for_what_they_are) {
+  LoadedModule loaded;
+  const Fit precise =
+      fit(random_model({.rows = 60, .noise = 4e-4, .terms = {{.levels = 8, .sd = 2.0}}}, 1), loaded.module());
+  EXPECT_EQ(precise.convergence, Convergence::converged);
+  EXPECT_FALSE(precise.singular);
+  EXPECT_TRUE(precise.messages.empty()) << precise.messages.front();
+}
+
+TEST(FittingUnits, says_that_random_effects_explain_every_observation) {
+  LoadedModule loaded;
+  Model model = random_model({.rows = 60, .noise = 0.0, .terms = {{.levels = 8, .sd = 2.0}}}, 1);
+  Random random(3);
+  for (double& y : model.y) y += 1e-12 * random.normal();
+  const Fit exact = fit(model, loaded.module());
+  EXPECT_TRUE(exact.singular);
+  ASSERT_FALSE(exact.messages.empty());
+  EXPECT_NE(exact.messages.back().find("residual variance is practically zero"), std::string::npos);
 }
 
 INSTANTIATE_TEST_SUITE_P(Random, Fitting, testing::ValuesIn(cases()),
