@@ -233,9 +233,11 @@ std::vector<mixed::RatioRequest> ratio_requests(const std::vector<std::string>& 
                                                 bool defaults) {
   const std::vector<mixed::VarianceComponent> components = components_of(model);
   std::vector<mixed::RatioFunction> functions;
+  functions.reserve(texts.size());
   for (const std::string& text : texts) functions.push_back(mixed::parse_ratio(text, components));
   if (texts.empty() && defaults) functions = mixed::default_ratios(components);
   std::vector<mixed::RatioRequest> requests;
+  requests.reserve(functions.size());
   for (mixed::RatioFunction& function : functions) {
     std::string name = function.name();
     requests.push_back(

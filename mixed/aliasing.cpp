@@ -18,7 +18,7 @@ constexpr int kLargestDenominator = 60;
 constexpr double kSmallPart = 1e-8;  // of a null vector: rounding
 // Beyond these the columns are not held as a dense array.
 constexpr double kMostNumbers = 2e7;
-constexpr double kMostWork = 4e9;
+constexpr double kMostWork = 3e8;
 
 using Vector = std::vector<double>;
 

@@ -29,7 +29,7 @@ Eigen::MatrixXd null_vectors(Equations& equations) {
 
 }  // namespace
 
-Constraint::Constraint(const ScaledDesign& design) : design_(design) {
+Constraint::Constraint(const ScaledDesign& design) {
   for (const DesignTerm& term : design.terms()) {
     if (!term.precision || term.precision->nullity == 0) continue;
     const Precision& precision = *term.precision;

@@ -1,7 +1,7 @@
 // Singular precisions. The covariance of such a term is its variance times the Moore-Penrose inverse of the precision:
-// its effects are orthogonal to the null vectors. When these are null vectors of the equations too, as with an intercept
-// beside a Gaussian field, the factor drops rows and its solution is one of many: it is moved to the one wanted.
-// Otherwise conditioning on the orthogonality leads there (Rue and Held 2005, section 2.3.3).
+// its effects are orthogonal to the null vectors. When these are null vectors of the equations too, as with an
+// intercept beside a Gaussian field, the factor drops rows and its solution is one of many: it is moved to the one
+// wanted. Otherwise conditioning on the orthogonality leads there (Rue and Held 2005, section 2.3.3).
 #pragma once
 
 #include "mixed/equations.hpp"
@@ -33,7 +33,6 @@ class Constraint {
   };
   std::vector<double> products(std::span<const double> x) const;  // A' x for one vector
 
-  const ScaledDesign& design_;
   std::vector<NullVector> vectors_;
   double log_det_ = 0.0;
   std::size_t order_ = 0;

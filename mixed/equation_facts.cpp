@@ -34,6 +34,7 @@ class Thinner {
 
 EquationFacts Equations::facts() const {
   EquationFacts facts;
+  if (order_ == 0) return facts;
   facts.order = order_;
   facts.entries = static_cast<std::int64_t>(values_.size());
   facts.factor_entries = matrix_->factor_iu[order_] + order_;
@@ -63,6 +64,7 @@ SpyPattern Equations::spy_equations() const {
 }
 
 SpyPattern Equations::spy_factor() const {
+  if (order_ == 0) return {};
   Thinner thinner(order_, matrix_->factor_iu[order_] + order_);
   for (std::int64_t i = 0; i < order_; ++i) {
     thinner.add(i, i);

@@ -35,10 +35,7 @@ Equations::Equations(Module& module, const ScaledDesign& design, const Gram& gra
     find_places_of_last_rows();
     // Finding an order takes some hundred operations for each entry, whatever comes of it.
     module_.tell("ordering the equations", 300.0 * static_cast<double>(values_.size()));
-    order_rows();
-    module_.expect_ok(module_.qxsmreorder(matrix_), "ordering the mixed-model equations");
-    module_.expect_ok(module_.qxsmsymbfact(matrix_), "finding the structure of the factor");
-    if (order_ > 0) flops_ = facts().flops;
+    order_and_analyse();
   } catch (...) {
     if (matrix_) module_.fn().qxsmDestroyMatrix(module_.instance, &matrix_);
     throw;
@@ -67,39 +64,6 @@ SmMatrix* Equations::assemble() {
   module_.expect_ok(module_.fn().qxsmclose(matrix_, std::numeric_limits<double>::quiet_NaN()), doing);
   values_.resize(entries);
   return matrix_;
-}
-
-std::vector<std::int64_t> Equations::last_rows() const {
-  std::vector<std::int64_t> rows = aliased_unknowns_;
-  rows.insert(rows.end(), null_unknowns_.begin(), null_unknowns_.end());
-  return rows;
-}
-
-// The order of a copy, with the last rows taken out of it, is given to the matrix itself.
-void Equations::order_rows() {
-  const char* const doing = "ordering the mixed-model equations";
-  const std::vector<std::int64_t> last = last_rows();
-  if (last.empty()) {
-    module_.expect_ok(module_.qxsmmd(matrix_), doing);
-    return;
-  }
-  SmMatrix* copy = nullptr;
-  module_.expect_ok(module_.fn().qxsmnew(module_.instance, &copy, SM_KIND_SYMMETRIC, SM_FORMAT_SPARSE), doing);
-  SmStatus status = module_.fn().qxsmclone(matrix_, copy, 0);
-  if (status == SM_OK) status = module_.qxsmmd(copy);
-  std::vector<std::int64_t> perm;
-  if (status == SM_OK) {
-    std::vector<bool> is_last(at(order_), false);
-    for (const std::int64_t row : last) is_last[at(row)] = true;
-    perm.reserve(at(order_));
-    for (std::int64_t i = 0; i < order_; ++i) {
-      if (!is_last[at(copy->perm[i])]) perm.push_back(copy->perm[i]);
-    }
-    perm.insert(perm.end(), last.begin(), last.end());
-  }
-  module_.fn().qxsmDestroyMatrix(module_.instance, &copy);
-  module_.expect_ok(status, doing);
-  module_.expect_ok(module_.qxsmorder(matrix_, perm.data()), doing);
 }
 
 void Equations::fill(const Factors& factors) {
@@ -168,6 +132,7 @@ void Equations::refill(const std::vector<std::int64_t>& cleared) {
 
 bool Equations::factor(const Factors& factors, const std::vector<std::int64_t>& superfluous) {
   inverse_known_ = false;
+  if (order_ == 0) return true;  // the module has no answers about an empty matrix
   for (const std::vector<double>& factor : factors) {
     for (const double element : factor) {
       if (!std::isfinite(element)) return false;
@@ -318,6 +283,7 @@ Factors Equations::log_det_gradient(const Factors& factors, const Constraint& co
 
 void Equations::visit_inverse(const Constraint& constraint,
                               const std::function<void(const Block&, std::span<const double>)>& visit) {
+  if (order_ == 0) return;
   if (!inverse_known_) {
     inverse_.resize(values_.size());
     module_.tell("inverting the equations", 2.0 * flops_);

@@ -65,6 +65,8 @@ class Equations {
  private:
   SmMatrix* assemble();
   void order_rows();
+  void prepare_factor(SmMatrix* matrix);
+  void order_and_analyse();
   std::vector<std::int64_t> last_rows() const;
   void fill(const Factors& factors);
   void refill(const std::vector<std::int64_t>& cleared);

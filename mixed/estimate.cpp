@@ -149,6 +149,7 @@ class Fitter {
   void search() {
     SearchOptions options;
     options.max_iterations = options_.max_iterations;
+    options.from_afar = options_.start.empty();
     options.derivative_free = options_.derivative_free;
     options.progress = options_.progress;
     Optimum optimum = find_optimum(likelihood_, start_factors(design_, options_), options);

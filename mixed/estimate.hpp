@@ -43,8 +43,8 @@ Fit fit(const Model& model, Module& module, const FitOptions& options = {});
 // What fitting would take: nothing is factored.
 EquationFacts plan(const Model& model, Module& module, bool reml = true);
 
-// Rows of other data: their X, and for each random term of the model their level (-1: not among those of the model, with
-// an effect of 0) and covariates.
+// Rows of other data: their X, and for each random term of the model their level (-1: not among those of the model,
+// with an effect of 0) and covariates.
 struct PredictionTerm {
   std::vector<std::int64_t> level;
   std::vector<double> z;  // rows x k by rows

@@ -16,6 +16,7 @@ struct SearchOptions {
   int max_iterations = 200;
   bool derivative_free = false;
   bool several_starts = true;  // where evaluations are cheap
+  bool from_afar = true;       // the start is nobody's guess
   std::function<bool(const Iteration&)> progress;
 };
 

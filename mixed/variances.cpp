@@ -103,7 +103,7 @@ std::vector<double> natural_lengths(const Parameters& parameters, const std::vec
 Dense factor_hessian(Likelihood& likelihood, const Parameters& parameters, const std::vector<double>& values,
                      double variance) {
   const std::size_t m = values.size();
-  const bool cheap = likelihood.design().unknowns() <= 50000;
+  const bool cheap = likelihood.design().unknowns() <= 50000 && likelihood.equations().facts().flops <= 1e8;
   const std::vector<double> lengths = natural_lengths(parameters, values);
   Dense hessian(m * m, 0.0);
   for (std::size_t j = 0; j < m; ++j) {

@@ -14,6 +14,7 @@ packages_tests=(ccache=ccache pkgconf=pkg-config binutils=readelf libgtest-dev m
 packages_clang=(clang=clang++ libclang-rt-dev clang-format=clang-format clang-tidy=run-clang-tidy)
 packages_coverage=(gcovr=gcovr)
 packages_bench=(libsuitesparse-dev libmetis-dev libeigen3-dev libopenblas-dev python3=python3)
+packages_bench_mixed=(python3=python3 r-base-core=Rscript r-cran-lme4)
 
 has_package() {
   case $1 in

@@ -304,6 +304,7 @@ TEST_P(BlockedInverseTest, a_refused_block_answers_101_and_leaves_everything) {
 }
 
 TEST(SinglePivot, is_inverted_and_judged_as_a_matrix_of_order_1) {
+  constexpr double kBefore = -77.0;
   SmInstance instance{};
   Random random(17);
   std::vector<double> elements = {0.0,        -0.0, 1e-300,  -1e-300, 1e300, kInfinity,
@@ -311,14 +312,13 @@ TEST(SinglePivot, is_inverted_and_judged_as_a_matrix_of_order_1) {
   for (int k = 0; k < 100; ++k) elements.push_back(std::fabs(random.dyadic()) / 3.0);
   for (const double tolerance : {1e-12, 0.5, 2.0, 0.0})
     for (const double a : elements) {
-      constexpr double kUntouched = -777.0;
-      double array = a, log_det = 0.0, inverse = kUntouched;
+      double array = a, log_det = 0.0, inverse = kBefore;
       std::int64_t rank = 0;
       std::int16_t definite = 0;
       const SmStatus want =
           ginverse2(&instance, &array, 1, &log_det, &rank, kPackedInverse, tolerance, SM_FORMAT_ROWS, &definite);
       EXPECT_EQ(invert_pivot(a, tolerance, inverse), want) << a;
-      EXPECT_EQ(bits(inverse), bits(want == SM_OK ? array : kUntouched)) << a << " with " << tolerance;
+      EXPECT_EQ(bits(inverse), bits(want == SM_OK ? array : kBefore)) << a << " with " << tolerance;
     }
 }
 

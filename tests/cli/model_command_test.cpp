@@ -114,6 +114,21 @@ TEST_F(ModelCommand, agrees_with_the_analysis_of_variance_of_balanced_data) {
   }
 }
 
+TEST_F(ModelCommand, is_least_squares_without_random_terms) {
+  // Slope 1 and intercept 1.5 by the normal equations; residuals -0.5, 0.5, 0.5, -0.5.
+  const std::string data = file("l.csv", "y,x\n2,1\n4,2\n5,3\n5,4\n");
+  for (const bool ml : {false, true}) {
+    const Outcome run = qxsm(
+        with({"lmm", data, "y ~ x", "--json"}, ml ? std::vector<std::string>{"--ml"} : std::vector<std::string>{}));
+    ASSERT_EQ(run.code, 0) << run.err;
+    const json fit = parsed(run);
+    EXPECT_NEAR(fit.at("fixef").at(0).at("estimate").get<double>(), 1.5, 1e-12);
+    EXPECT_NEAR(fit.at("fixef").at(1).at("estimate").get<double>(), 1.0, 1e-12);
+    EXPECT_NEAR(fit.at("varcomp").at(0).at("vcov").get<double>(), 1.0 / (ml ? 4.0 : 2.0) * 1.0, 1e-12);
+    EXPECT_EQ(fit.at("singular"), false);
+  }
+}
+
 TEST_F(ModelCommand, says_in_words_that_a_variance_is_zero) {
   const std::string data = file("b.csv", "g,y\na,1\na,5\nb,2\nb,4.5\nc,5.2\nc,0.8\n");
   const OneWay anova(read(data));

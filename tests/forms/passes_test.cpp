@@ -122,7 +122,7 @@ void PassesTest::expect_steps(Compressed& a, Random& random) {
 }
 
 TEST_F(PassesTest, any_rows_give_what_one_row_after_the_other_gives) {
-  for (std::uint64_t seed = 0; seed < 150; ++seed) {
+  for (std::uint64_t seed = 0; seed < 60; ++seed) {
     SCOPED_TRACE(seed);
     Random random(seed);
     const std::int64_t n = seed < 12 ? static_cast<std::int64_t>(seed / 3) : 1 + random.below(300);
@@ -131,7 +131,7 @@ TEST_F(PassesTest, any_rows_give_what_one_row_after_the_other_gives) {
 }
 
 TEST_F(PassesTest, rows_that_continue_each_other_and_rows_between_them) {
-  for (std::uint64_t seed = 0; seed < 150; ++seed) {
+  for (std::uint64_t seed = 0; seed < 60; ++seed) {
     SCOPED_TRACE(seed);
     Random random(1000 + seed);
     expect_all(patched(random, 20 + random.below(500)), random);

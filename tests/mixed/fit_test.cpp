@@ -36,6 +36,8 @@ std::vector<Case> cases() {
       {"a_ring", {.rows = 90, .terms = {{.levels = 20, .field = Field::ring, .sd = 2.0}}}},
       {"a_ring_without_intercept",
        {.rows = 90, .intercept = false, .terms = {{.levels = 20, .field = Field::ring, .sd = 2.0}}}},
+      {"two_rings",
+       {.rows = 90, .terms = {{.levels = 9, .field = Field::ring}, {.levels = 20, .field = Field::ring, .sd = 2.0}}}},
       {"years_and_their_squares", {.rows = 80, .offset = 1990.0, .terms = {one}}},
       {"a_distant_response", {.rows = 60, .response_offset = 1e7, .terms = {one}}},
       {"small_variance", {.rows = 150, .terms = {{.levels = 10, .sd = 0.3}}}, 2},

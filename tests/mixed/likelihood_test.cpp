@@ -69,6 +69,11 @@ std::vector<Case> cases() {
       {"a_ring_and_aliased_columns", {.aliased = 1, .factor = 3, .terms = {{.levels = 12, .field = Field::ring}, one}}},
       {"a_ring_without_intercept", {.intercept = false, .terms = {{.levels = 12, .field = Field::ring}}}},
       {"a_ring_of_slopes", {.terms = {{.coefs = 2, .levels = 6, .field = Field::ring}}}},
+      {"two_rings", {.rows = 60, .terms = {{.levels = 9, .field = Field::ring}, {.levels = 12, .field = Field::ring}}}},
+      {"two_rings_without_intercept",
+       {.rows = 60,
+        .intercept = false,
+        .terms = {{.levels = 9, .field = Field::ring}, {.levels = 12, .field = Field::ring}}}},
       {"years_and_their_squares", {.offset = 1990.0, .terms = {one}}},
       {"slopes_on_years", {.terms = {{.coefs = 2, .levels = 5, .centred = false}}}},
       {"a_distant_response", {.response_offset = 1e7, .terms = {slope}}},
@@ -100,6 +105,25 @@ TEST_P(Criterion, equals_that_of_dense_matrices) {
                     1e-9 * std::abs(static_cast<double>(expected)))
             << "seed " << seed << (reml ? " restricted" : "") << " scale " << scale;
       }
+    }
+  }
+}
+
+// Null vectors of two precisions that the data see alike: one row is superfluous, and which one depends on the factors.
+TEST(TwoFields, are_told_apart_down_to_factors_of_zero) {
+  LoadedModule loaded;
+  const Model model = random_model(
+      {.rows = 60, .terms = {{.levels = 9, .field = Field::ring}, {.levels = 12, .field = Field::ring}}}, 1);
+  const ScaledDesign design(model);
+  const DenseOracle oracle(model);
+  Likelihood likelihood(loaded.module(), design, false);
+  for (const double small : {1e-1, 1e-3, 1e-5, 1e-7, 0.0}) {
+    for (const Factors& factors : {Factors{{small}, {1.3}}, Factors{{1.3}, {small}}, Factors{{small}, {small}}}) {
+      const CriterionParts parts = likelihood.evaluate(factors, false);
+      ASSERT_TRUE(parts.defined) << likelihood.doubt();
+      const Real variance = static_cast<Real>(parts.s2) / static_cast<Real>(likelihood.degrees());
+      const auto expected = static_cast<double>(oracle.criterion(covariances(design, factors, variance), false));
+      EXPECT_NEAR(likelihood.profiled(parts), expected, 1e-9 * std::abs(expected)) << small;
     }
   }
 }

@@ -1,0 +1,55 @@
+// What is done for large models only.
+#include <gtest/gtest.h>
+
+#include <cmath>
+
+#include "dense_oracle.hpp"
+#include "loaded_module.hpp"
+#include "mixed/estimate.hpp"
+#include "mixed/likelihood.hpp"
+#include "random_models.hpp"
+
+namespace sm::mixed::test {
+namespace {
+
+TEST(LargeFit, begins_nearer_to_the_optimum_and_ends_where_a_plain_search_ends) {
+  LoadedModule loaded;
+  const ModelShape shape{.rows = 9000, .terms = {{.coefs = 2, .levels = 1600, .sd = 0.3}, {.levels = 40, .sd = 3.0}}};
+  const Model model = random_model(shape, 1);
+  FitOptions plain;
+  plain.start = {1.0, 0.0, 1.0, 1.0};
+  const Fit expected = fit(model, loaded.module(), plain);
+  const Fit fitted = fit(model, loaded.module());
+  ASSERT_EQ(expected.convergence, Convergence::converged);
+  ASSERT_EQ(fitted.convergence, Convergence::converged);
+  EXPECT_LT(fitted.iterations.front().criterion - fitted.criterion,
+            0.1 * (expected.iterations.front().criterion - expected.criterion));
+  EXPECT_NEAR(fitted.criterion, expected.criterion, 1e-9 * std::abs(expected.criterion));
+  for (std::size_t i = 0; i < expected.varcomp.size(); ++i) {
+    EXPECT_NEAR(fitted.varcomp[i].vcov, expected.varcomp[i].vcov, 1e-5 * std::abs(expected.varcomp[i].vcov));
+  }
+}
+
+// With the first factor eliminated the second is full, and nothing else has filled in.
+TEST(LargeFit, of_crossed_factors_has_no_more_fill_than_the_square_of_the_smaller_one) {
+  LoadedModule loaded;
+  const Model model = random_model({.rows = 700, .terms = {{.levels = 90}, {.levels = 70}}}, 2);
+  const ScaledDesign design(model);
+  Likelihood likelihood(loaded.module(), design, true);
+  const EquationFacts facts = likelihood.equations().facts();
+  const std::int64_t others = facts.order - 90;
+  EXPECT_LT(facts.factor_entries, facts.entries + others * (others + 1) / 2);
+  const CriterionParts parts = likelihood.evaluate({{0.8}, {1.3}}, false);
+  ASSERT_TRUE(parts.defined);
+  const double variance = parts.s2 / likelihood.degrees();
+  const auto component = [&](std::size_t t, double factor) {
+    return static_cast<Real>(variance * std::pow(factor * design.terms()[t].basis[0], 2));
+  };
+  VectorL parameters(3);
+  parameters << component(0, 0.8), component(1, 1.3), static_cast<Real>(variance);
+  const auto expected = static_cast<double>(DenseOracle(model).criterion(parameters, true));
+  EXPECT_NEAR(likelihood.profiled(parts), expected, 1e-9 * std::abs(expected));
+}
+
+}  // namespace
+}  // namespace sm::mixed::test
