@@ -6,6 +6,8 @@ namespace sm::mixed {
 namespace {
 
 constexpr double kDependent = 1e-10;  // of squared lengths
+// A pivot of this part of its row's diagonal is as far from zero as from what rounding makes of it.
+constexpr double kNoPivot = 1e-8;
 
 std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
@@ -37,6 +39,16 @@ double dot(const ScaledDesign& design, const std::vector<double>& a, const std::
   double sum = 0.0;
   for (std::size_t i = 0; i < a.size(); ++i) sum += design.weight(i) * a[i] * b[i];
   return sum;
+}
+
+double precision_diagonal(const DesignTerm& term, std::int64_t unknown) {
+  const std::size_t row = at((unknown - term.first) / term.k);
+  const Precision& precision = *term.precision;
+  double diagonal = 0.0;
+  for (auto p = at(precision.row_start[row]); p < at(precision.row_start[row + 1]); ++p) {
+    if (at(precision.col[p]) == row) diagonal = precision.value[p];
+  }
+  return diagonal;
 }
 
 }  // namespace
@@ -78,7 +90,8 @@ NullSpace::NullSpace(const ScaledDesign& design, Equations& equations, Part part
   for (const double value : values) rank_ += value > kDependent ? 1 : 0;
 }
 
-// The largest pivots of T'HT, H the cross products of the data's view, are those that stay.
+// The largest pivots of T'HT, H the cross products of the data's view, are those that stay. Where T is nearly singular
+// the least of them are rounding in the equations, and go.
 std::vector<std::int64_t> NullSpace::superfluous(const Factors& factors) const {
   const auto count = static_cast<Eigen::Index>(unknowns_.size());
   Eigen::MatrixXd factor = Eigen::MatrixXd::Zero(count, count);
@@ -98,6 +111,9 @@ std::vector<std::int64_t> NullSpace::superfluous(const Factors& factors) const {
     for (Eigen::Index i = 0; i < count; ++i) {
       if (!stays[at(i)] && (best < 0 || left(i, i) > left(best, best))) best = i;
     }
+    const Unknown& unknown = unknowns_[at(best)];
+    const double diagonal = precision_diagonal(design_.terms()[unknown.term], unknown.place);
+    if (left(best, best) <= kNoPivot * diagonal) break;
     stays[at(best)] = true;
     if (!(left(best, best) > 0.0)) continue;
     const Eigen::VectorXd column = left.col(best);

@@ -210,6 +210,20 @@ TEST(FittingUnits, takes_precise_observations_for_what_they_are) {
   EXPECT_TRUE(precise.messages.empty()) << precise.messages.front();
 }
 
+TEST(FittingNearSingularity, keeps_the_criterion_of_an_intrinsic_field_exact) {
+  LoadedModule loaded;
+  const Model model = random_model({.rows = 90, .terms = {{.coefs = 2, .levels = 20, .field = Field::ring}}}, 1);
+  const DenseOracle oracle(model);
+  for (const double extra : {1e-2, 1e-6, 1e-8, 1e-10, 1e-12, 1e-13, 1e-14, 0.0}) {
+    FitOptions options;
+    options.variances = {1.0, -0.5, 0.25 + extra, 1.5};
+    VectorL variances(4);
+    for (std::size_t i = 0; i < 4; ++i) variances(static_cast<Eigen::Index>(i)) = options.variances[i];
+    const Fit given = fit(model, loaded.module(), options);
+    EXPECT_NEAR(given.criterion, static_cast<double>(oracle.criterion(variances, true)), 1e-6) << extra;
+  }
+}
+
 TEST(FittingUnits, says_that_random_effects_explain_every_observation) {
   LoadedModule loaded;
   Model model = random_model({.rows = 60, .noise = 0.0, .terms = {{.levels = 8, .sd = 2.0}}}, 1);
