@@ -7,7 +7,7 @@ namespace {
 
 constexpr double kDependent = 1e-10;  // of squared lengths
 // A pivot of this part of its row's diagonal is as far from zero as from what rounding makes of it.
-constexpr double kNoPivot = 1e-8;
+constexpr double kNoPivot = 1e-10;
 
 std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
