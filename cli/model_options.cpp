@@ -3,6 +3,7 @@
 #include <fmt/format.h>
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 
 #include "cli/error.hpp"
 
@@ -148,6 +149,32 @@ void add_model_options(CLI::App& command, ModelOptions& options, ModelCommand wh
   }
   add_question_options(command, options, which != ModelCommand::blup);
   add_result_options(command, options);
+}
+
+void add_pedigree_options(CLI::App& command, PedigreeOptions& pedigree) {
+  const auto add = [&](const char* name, std::string& path, const char* type, const char* text) {
+    return command.add_option(name, path, text)->type_name(type);
+  };
+  add("--ainv", pedigree.ainv, "AINV.mtx", "Write the inverse of A as coordinates, rows in\nthe order of the file");
+  add("--a", pedigree.a, "A.mtx", "Write A itself as a symmetric array; for small\npedigrees");
+  add("--inbreeding", pedigree.inbreeding, "F.csv",
+      "Write the inbreeding coefficient of each animal;\nwithout a file, report it")
+      ->expected(0, 1);
+  add("--mendelian", pedigree.mendelian, "D.csv",
+      "Write the Mendelian sampling variance of each\nanimal, as a part of the additive variance; without\n"
+      "a file, report it")
+      ->expected(0, 1);
+  add("--ids", pedigree.ids, "IDS.txt",
+      "Write the animals in the order of the rows of A,\none a line. Each result is compressed when its\n"
+      "name ends in .gz; - is standard output for one\nof them, and the report then goes to standard\nerror");
+}
+
+bool settle_pedigree(const CLI::App& command, PedigreeOptions& pedigree) {
+  const auto bare = [&](const char* name, const std::string& path) { return command.count(name) > 0 && path.empty(); };
+  pedigree.report_inbreeding = bare("--inbreeding", pedigree.inbreeding);
+  pedigree.report_mendelian = bare("--mendelian", pedigree.mendelian);
+  const auto paths = {&pedigree.a, &pedigree.ainv, &pedigree.inbreeding, &pedigree.mendelian, &pedigree.ids};
+  return std::any_of(paths.begin(), paths.end(), [](const std::string* path) { return *path == "-"; });
 }
 
 }  // namespace sm::cli

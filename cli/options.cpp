@@ -270,23 +270,8 @@ void add_convert(CLI::App& app, Options& options) {
 
 void add_pedigree(CLI::App& app, Options& options) {
   CLI::App* command = add_command<run_pedigree, &Options::pedigree>(app, options, "pedigree", help::kPedigree);
-  PedigreeOptions& pedigree = options.pedigree;
-  add_file(*command, pedigree.pedigree, "PEDIGREE.csv", "CSV or TSV file, plain or gzip;\n- is standard input");
-  const auto add = [&](const char* name, std::string& path, const char* type, const char* text) {
-    return command->add_option(name, path, text)->type_name(type);
-  };
-  add("--ainv", pedigree.ainv, "AINV.mtx", "Write the inverse of A as coordinates, rows in\nthe order of the file");
-  add("--a", pedigree.a, "A.mtx", "Write A itself as a symmetric array; for small\npedigrees");
-  add("--inbreeding", pedigree.inbreeding, "F.csv",
-      "Write the inbreeding coefficient of each animal;\nwithout a file, report it")
-      ->expected(0, 1);
-  add("--mendelian", pedigree.mendelian, "D.csv",
-      "Write the Mendelian sampling variance of each\nanimal, as a part of the additive variance; without\n"
-      "a file, report it")
-      ->expected(0, 1);
-  add("--ids", pedigree.ids, "IDS.txt",
-      "Write the animals in the order of the rows of A,\none a line. Each result is compressed when its\n"
-      "name ends in .gz; - is standard output for one\nof them, and the report then goes to standard\nerror");
+  add_file(*command, options.pedigree.pedigree, "PEDIGREE.csv", "CSV or TSV file, plain or gzip;\n- is standard input");
+  add_pedigree_options(*command, options.pedigree);
   add_common(*command, options);
 }
 
@@ -383,15 +368,8 @@ void settle(const CLI::App& app, Options& options) {
   require_use_of_ordering(app, options);
   options.filter = app.got_subcommand("convert") || app.got_subcommand("grid");
   if (app.got_subcommand("grid") && options.common.output.empty()) options.common.output = "-";
-  PedigreeOptions& pedigree = options.pedigree;
-  const auto bare = [&](const char* name, const std::string& path) {
-    return app.got_subcommand("pedigree") && app.get_subcommand("pedigree")->count(name) > 0 && path.empty();
-  };
-  pedigree.report_inbreeding = bare("--inbreeding", pedigree.inbreeding);
-  pedigree.report_mendelian = bare("--mendelian", pedigree.mendelian);
-  for (const std::string* path :
-       {&pedigree.a, &pedigree.ainv, &pedigree.inbreeding, &pedigree.mendelian, &pedigree.ids}) {
-    if (*path == "-") options.common.output = "-";
+  if (app.got_subcommand("pedigree") && settle_pedigree(*app.get_subcommand("pedigree"), options.pedigree)) {
+    options.common.output = "-";
   }
   options.common.ceiling =
       options.common.memory.empty() ? machine_memory() : parse_memory(options.common.memory).value_or(0);
