@@ -8,31 +8,27 @@ constexpr int kLanes = kProductLanes;
 constexpr i64 kWindow = kProductReach;  // with those of the result 256 kB of stack, which the second cache holds
 
 typedef double Lanes __attribute__((vector_size(kLanes * sizeof(double)), aligned(sizeof(double)), may_alias));
-typedef long long Places __attribute__((vector_size(kLanes * sizeof(double))));
 
 // Rows become columns.
 SM_PASS_INLINE void transpose(Lanes (&r)[kLanes]) {
-  const Places even = {0, 8, 2, 10, 4, 12, 6, 14}, odd = {1, 9, 3, 11, 5, 13, 7, 15};
-  const Places low = {0, 1, 8, 9, 4, 5, 12, 13}, high = {2, 3, 10, 11, 6, 7, 14, 15};
-  const Places front = {0, 1, 2, 3, 8, 9, 10, 11}, back = {4, 5, 6, 7, 12, 13, 14, 15};
   Lanes s[kLanes], t[kLanes];
 #pragma GCC unroll 4
   for (int k = 0; k < kLanes; k += 2) {
-    s[k] = __builtin_shuffle(r[k], r[k + 1], even);
-    s[k + 1] = __builtin_shuffle(r[k], r[k + 1], odd);
+    s[k] = __builtin_shufflevector(r[k], r[k + 1], 0, 8, 2, 10, 4, 12, 6, 14);
+    s[k + 1] = __builtin_shufflevector(r[k], r[k + 1], 1, 9, 3, 11, 5, 13, 7, 15);
   }
 #pragma GCC unroll 4
   for (int k = 0; k < kLanes; k += 4) {
 #pragma GCC unroll 2
     for (int i = 0; i < 2; ++i) {
-      t[k + i] = __builtin_shuffle(s[k + i], s[k + i + 2], low);
-      t[k + i + 2] = __builtin_shuffle(s[k + i], s[k + i + 2], high);
+      t[k + i] = __builtin_shufflevector(s[k + i], s[k + i + 2], 0, 1, 8, 9, 4, 5, 12, 13);
+      t[k + i + 2] = __builtin_shufflevector(s[k + i], s[k + i + 2], 2, 3, 10, 11, 6, 7, 14, 15);
     }
   }
 #pragma GCC unroll 4
   for (int k = 0; k < 4; ++k) {
-    r[k] = __builtin_shuffle(t[k], t[k + 4], front);
-    r[k + 4] = __builtin_shuffle(t[k], t[k + 4], back);
+    r[k] = __builtin_shufflevector(t[k], t[k + 4], 0, 1, 2, 3, 8, 9, 10, 11);
+    r[k + 4] = __builtin_shufflevector(t[k], t[k + 4], 4, 5, 6, 7, 12, 13, 14, 15);
   }
 }
 
