@@ -29,9 +29,9 @@ struct Hub {
   std::uint64_t* keys[kHubLevels];  // level 0: a bit for each slot; level k + 1: a bit for each word of level k
 };
 
-// Enters the tree into `hub` if it is large, its keys are dense enough and there is memory. Answers whether; `visited` is the number
-// of nodes looked at. The table takes 4 bytes for every key between the smallest and the largest one and for some room
-// beyond, kHubSparsest of them for a node at most.
+// Enters the tree into `hub` if it is large, its keys are dense enough and there is memory. Answers whether; `visited`
+// is the number of nodes looked at. The table takes 4 bytes for every key between the smallest and the largest one and
+// for some room beyond, kHubSparsest of them for a node at most.
 constexpr std::uint64_t kHubSparsest = 16;
 constexpr unsigned kHubLeastHeight = 12;
 bool open_hub(Hub& hub, HostServices& services, Word root, std::uint64_t& visited);

@@ -153,8 +153,8 @@ void note(Hints& hints, Word root, const Node* last, Word misses) {
   return &node;
 }
 
-// Links `node` in below `at`, where the descent ended. What can change its balance is the last uneven node on the way, or
-// else the root, to which `critical` leads, and the even ones below it (Knuth's algorithm A).
+// Links `node` in below `at`, where the descent ended. What can change its balance is the last uneven node on the way,
+// or else the root, to which `critical` leads, and the even ones below it (Knuth's algorithm A).
 [[gnu::noinline]] Node* link_below(Word& root, Node& node, Node* at, Word* critical, Hints& hints, Word misses) {
   const std::int64_t key = node.key;
   Side side = towards(key, *at);

@@ -8,9 +8,9 @@
 // zero, and so is its column.
 //
 // As in the factorization the unit is a block of rows with one tail (blocks.hpp): Z on the tail, as a full square,
-// times -U of the block, by the tile kernels. Blocks are walked down their tree. The columns of a block's tail are among
-// the columns of its parent, so that the square is copied from the parent's one, the front, which is kept until the last
-// child has been served; where it was too large to keep, it is collected from the rows.
+// times -U of the block, by the tile kernels. Blocks are walked down their tree. The columns of a block's tail are
+// among the columns of its parent, so that the square is copied from the parent's one, the front, which is kept until
+// the last child has been served; where it was too large to keep, it is collected from the rows.
 //
 //   block_tree.hpp      the tree, and the walk
 //   inverse_gather.cpp  Z on a tail from its rows

@@ -49,8 +49,8 @@ class SparseSolve {
   }
 
  private:
-  // The last lane goes to the scratch, the others move together, and it takes the room that they left, which is its own;
-  // then the next.
+  // The last lane goes to the scratch, the others move together, and it takes the room that they left, which is its
+  // own; then the next.
   void unpack_in_place(double* x) const {
     for (int lane = kLanes - 1; lane > 0; --lane) {
       for (i64 k = 0; k < n_; ++k) {

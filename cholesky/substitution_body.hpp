@@ -1,5 +1,5 @@
-// The passes of substitution.hpp, written once. A file that defines SM_PASS_TARGET, the attribute that lets the compiler
-// use wider vectors, includes this in its own namespace.
+// The passes of substitution.hpp, written once. A file that defines SM_PASS_TARGET, the attribute that lets the
+// compiler use wider vectors, includes this in its own namespace.
 //
 // Deliberately without an include guard.
 

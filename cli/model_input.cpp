@@ -27,21 +27,6 @@ std::string trimmed(std::string_view text) {
 
 }  // namespace
 
-mixed::Module mixed_module(ModuleSession& session) {
-  const ExportedSteps& steps = session.steps();
-  return {.instance = session.instance(),
-          .qxsmmd = steps.qxsmmd,
-          .qxsmorder = steps.qxsmorder,
-          .qxsmreorder = steps.qxsmreorder,
-          .qxsmsymbfact = steps.qxsmsymbfact,
-          .qxsmnumfact = steps.qxsmnumfact,
-          .qxsmrefill = steps.qxsmrefill,
-          .qxsminvpattern = steps.qxsminvpattern,
-          .qxsminvdiag = steps.qxsminvdiag,
-          .qxsmsetprogress = steps.qxsmsetprogress,
-          .expect_ok = [&session](SmStatus status, const std::string& doing) { session.expect_ok(status, doing); }};
-}
-
 std::vector<std::string> split_list(std::string_view text) {
   std::vector<std::string> parts(1);
   bool quoted = false;

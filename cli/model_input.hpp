@@ -19,9 +19,6 @@
 
 namespace sm::cli {
 
-// The instance of a session with the operations that model fits use.
-mixed::Module mixed_module(ModuleSession& session);
-
 // "a,b,c" in its parts; one with a comma in it stands in double quotes.
 std::vector<std::string> split_list(std::string_view text);
 

@@ -1,32 +1,12 @@
 #include "cli/model_options.hpp"
 
-#include <fmt/format.h>
-
 #include <CLI/CLI.hpp>
 #include <algorithm>
 
-#include "cli/error.hpp"
+#include "cli/validators.hpp"
 
 namespace sm::cli {
 namespace {
-
-CLI::Validator either(const char* one, const char* other) {
-  const auto check = [one, other](const std::string& text) -> std::string {
-    if (text == one || text == other) return {};
-    return fmt::format("found {}, expected {} or {}", quote(text), one, other);
-  };
-  return {check, ""};
-}
-
-// "name=value", neither of them empty.
-CLI::Validator assignment(const char* example) {
-  const auto check = [example](const std::string& text) -> std::string {
-    const std::size_t equals = text.find('=');
-    if (equals != std::string::npos && equals > 0 && equals + 1 < text.size()) return {};
-    return fmt::format("found {}, expected a name, = and a value ({})", quote(text), example);
-  };
-  return {check, ""};
-}
 
 // An option that may be given several times, each time with one value.
 CLI::Option* add_repeated(CLI::App& command, const char* name, std::vector<std::string>& values, const char* type,
@@ -64,13 +44,13 @@ void add_data_options(CLI::App& command, ModelOptions& options) {
                   "treatment: each level against the reference (the\n"
                   "default)\n"
                   "sum: the effects of a factor sum to zero")
-      ->check(either("treatment", "sum"))
+      ->check(one_of({"treatment", "sum"}))
       ->type_name("NAME");
   command
       .add_option("--na", options.missing,
                   "Rows with a missing value (NA, . or nothing):\n"
                   "drop (the default) or fail")
-      ->check(either("drop", "fail"))
+      ->check(one_of({"drop", "fail"}))
       ->type_name("WHAT");
 }
 

@@ -67,7 +67,6 @@ void ModuleSession::find_steps() {
   find(steps_.qxsmnumfact, "qxsmnumfact");
   find(steps_.qxsmrefill, "qxsmrefill");
   find(steps_.qxsminvpattern, "qxsminvpattern");
-  find(steps_.qxsminvdiag, "qxsminvdiag");
   find(steps_.qxsminvmultv, "qxsminvmultv");
   find(steps_.qxsmtraceinvAB, "qxsmtraceinvAB");
   find(steps_.qxsmcopyv, "qxsmcopyv");
@@ -87,6 +86,14 @@ void ModuleSession::expect_ok(SmStatus status, const std::string& doing) const {
          "the matrix is too large to be factored");
   }
   fail(fmt::format("{} ended with the unexpected status {}", doing, status), "please report this, with the matrix");
+}
+
+mixed::Module mixed_module(ModuleSession& session) {
+  mixed::Module module;
+  static_cast<mixed::ExportedOperations&>(module) = session.steps();
+  module.instance = session.instance();
+  module.expect_ok = [&session](SmStatus status, const std::string& doing) { session.expect_ok(status, doing); };
+  return module;
 }
 
 }  // namespace sm::cli

@@ -7,18 +7,12 @@
 #include <cstdint>
 #include <string>
 
+#include "mixed/module.hpp"
+
 namespace sm::cli {
 
 // Operations that the module exports beside its table.
-struct ExportedSteps {
-  SmStatus (*qxsmmd)(SmMatrix* matrix) = nullptr;
-  SmStatus (*qxsmorder)(SmMatrix* matrix, const int64_t* perm) = nullptr;
-  SmStatus (*qxsmreorder)(SmMatrix* matrix) = nullptr;
-  SmStatus (*qxsmsymbfact)(SmMatrix* matrix) = nullptr;
-  SmStatus (*qxsmnumfact)(SmMatrix* matrix) = nullptr;
-  SmStatus (*qxsmrefill)(SmMatrix* matrix, const double* values) = nullptr;
-  SmStatus (*qxsminvpattern)(SmMatrix* matrix, double* values) = nullptr;
-  SmStatus (*qxsminvdiag)(SmMatrix* matrix, double* x) = nullptr;
+struct ExportedSteps : mixed::ExportedOperations {
   SmStatus (*qxsminvmultv)(SmMatrix* matrix, const double* b, double* x, int64_t count) = nullptr;
   SmStatus (*qxsmtraceinvAB)(SmMatrix* a, SmMatrix* b, int64_t start, double* result) = nullptr;
   SmStatus (*qxsmcopyv)(const double* values, SmMatrix* matrix, int64_t rows, int64_t cols, int32_t kind,
@@ -54,5 +48,8 @@ class ModuleSession {
   void* library_ = nullptr;
   ExportedSteps steps_;
 };
+
+// The module of a session, which must outlive it, for the library of mixed models.
+mixed::Module mixed_module(ModuleSession& session);
 
 }  // namespace sm::cli

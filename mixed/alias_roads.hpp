@@ -53,12 +53,12 @@ struct Dependences {
 // Gram-Schmidt on the columns themselves: rows x columns numbers of memory, times columns of work.
 Dependences dense_dependences(const WeightedColumns& x);
 
-// By the normal equations of columns that are orthogonal by groups, and the columns themselves where those are in doubt:
-// memory and work that many dummies allow. `term` of each column.
+// By the normal equations of columns that are orthogonal by groups, and the columns themselves where those are in
+// doubt: memory and work that many dummies allow. `term` of each column.
 Dependences sparse_dependences(const WeightedColumns& x, const std::vector<std::int64_t>& term);
 
-// From vectors with X v = 0, one for each dependence: they are reduced until each has a last column of its own, which is
-// aliased. `sizes` of the columns of X, to tell rounding.
+// From vectors with X v = 0, one for each dependence: they are reduced until each has a last column of its own, which
+// is aliased. `sizes` of the columns of X, to tell rounding.
 Dependences last_columns(std::vector<std::vector<double>> null, const std::vector<double>& sizes);
 
 // Exact zeros and small fractions in place of what rounding made of them, where the columns bear that out.

@@ -1,6 +1,6 @@
 // The null vectors of X: from the normal equations of its columns, which are orthogonal by groups; what these leave in
-// doubt is decided on the columns themselves, by iterative refinement of the residual (A. Bjorck, "Numerical Methods for
-// Least Squares Problems", SIAM 1996, section 6.6).
+// doubt is decided on the columns themselves, by iterative refinement of the residual (A. Bjorck, "Numerical Methods
+// for Least Squares Problems", SIAM 1996, section 6.6).
 #include <Eigen/Core>
 #include <algorithm>
 #include <cmath>

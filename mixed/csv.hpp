@@ -27,8 +27,8 @@ struct CsvPlace {
 // Comma, tab or semicolon, whichever the first line has most of outside quotes; comma when it has none.
 char sniff_delimiter(std::string_view text);
 
-// Calls `take` with every row that is not blank until it answers false. `name` is the file's, for messages. A byte order
-// mark before the text is passed over. Throws ModelError for quotes that are not closed or stand inside a field.
+// Calls `take` with every row that is not blank until it answers false. `name` is the file's, for messages. A byte
+// order mark before the text is passed over. Throws ModelError for quotes that are not closed or stand inside a field.
 void scan_csv(std::string_view text, const std::string& name, char delimiter,
               const std::function<bool(const CsvRow& row)>& take);
 

@@ -9,8 +9,8 @@
 
 namespace sm::mixed {
 
-struct Module {
-  SmInstance* instance = nullptr;
+// What the library needs of the operations beside the table.
+struct ExportedOperations {
   SmStatus (*qxsmmd)(SmMatrix* matrix) = nullptr;
   SmStatus (*qxsmorder)(SmMatrix* matrix, const int64_t* perm) = nullptr;
   SmStatus (*qxsmreorder)(SmMatrix* matrix) = nullptr;
@@ -18,8 +18,10 @@ struct Module {
   SmStatus (*qxsmnumfact)(SmMatrix* matrix) = nullptr;
   SmStatus (*qxsmrefill)(SmMatrix* matrix, const double* values) = nullptr;
   SmStatus (*qxsminvpattern)(SmMatrix* matrix, double* values) = nullptr;
-  SmStatus (*qxsminvdiag)(SmMatrix* matrix, double* x) = nullptr;
-  SmStatus (*qxsmsetprogress)(SmInstance* instance, SmProgress callback, void* context) = nullptr;
+};
+
+struct Module : ExportedOperations {
+  SmInstance* instance = nullptr;
 
   // Does not return for any status but 0; `doing` names the phase: "factoring the mixed-model equations".
   std::function<void(SmStatus status, const std::string& doing)> expect_ok;

@@ -35,7 +35,8 @@ std::vector<Point> finite_points(const Fit& fit) {
 }
 
 // Locally weighted straight lines with tricube weights over two thirds of the points, without robustness steps: W. S.
-// Cleveland, "Robust locally weighted regression and smoothing scatterplots", J. Amer. Statist. Assoc. 74 (1979) 829-836.
+// Cleveland, "Robust locally weighted regression and smoothing scatterplots", J. Amer. Statist. Assoc. 74 (1979)
+// 829-836.
 std::vector<Point> smoothed(const std::vector<Point>& points) {
   constexpr std::size_t kFewest = 30;
   constexpr int kPlaces = 60;

@@ -28,8 +28,8 @@ std::string cut(std::string_view text, std::size_t width);        // at most so 
 std::string wrapped(std::string_view text, std::size_t width, std::size_t indent);
 
 // Every number with as many decimals as it takes to show `digits` significant digits of the smallest of them, or of the
-// smallest of their scales, such as standard errors, where those are given. Where that is more than a column bears, each
-// by itself in the shorter of fixed and scientific notation. What is not finite is a dash.
+// smallest of their scales, such as standard errors, where those are given. Where that is more than a column bears,
+// each by itself in the shorter of fixed and scientific notation. What is not finite is a dash.
 std::vector<std::string> number_column(std::span<const double> values, int digits, std::span<const double> scales = {});
 
 // With so many decimals; "0.000" without a sign. Shorter in scientific notation from `largest` on.

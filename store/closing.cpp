@@ -11,9 +11,9 @@ namespace {
 
 NonzeroNode* target(uint64_t link) { return reinterpret_cast<NonzeroNode*>(link & ~SM_LINK_TAGS); }
 
-// The walk of one row, node by node as sm_node_next does it. In random order every node is a miss that waits for the one
-// before it; before a subtree of some height is walked, all of it is therefore asked for level by level, where the nodes
-// of a level do not wait for each other.
+// The walk of one row, node by node as sm_node_next does it. In random order every node is a miss that waits for the
+// one before it; before a subtree of some height is walked, all of it is therefore asked for level by level, where the
+// nodes of a level do not wait for each other.
 class RowWalk {
  public:
   NonzeroNode* next_of(const NonzeroNode* node) {

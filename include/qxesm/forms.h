@@ -19,8 +19,8 @@
  * cleared unless it accumulates: 0 (k < 1); 124 (symmetric in format 22 and not the whole matrix); 118 (symmetric
  * sparse past state 1 and not the whole matrix); 0.
  * Infinities and NaNs in x and in stored entries propagate. Nothing is allocated. The order of a sum is free, but the
- * same on every CPU. Cost: one pass over the block for each vector; of a sparse matrix up to 8 vectors share a pass, but
- * not through a whole symmetric one whose entries lie far from the diagonal, nor through a sub-block of one. */
+ * same on every CPU. Cost: one pass over the block for each vector; of a sparse matrix up to 8 vectors share a pass,
+ * but not through a whole symmetric one whose entries lie far from the diagonal, nor through a sub-block of one. */
 QXESM_API SmStatus qxsmmultv(SmMatrix* a, const double* x, double* y, int64_t r0, int64_t r1, int64_t c0, int64_t c1,
                              int64_t k, int32_t accumulate);
 

@@ -76,8 +76,8 @@ TEST_F(HintTest, a_key_between_the_last_one_and_its_neighbour_goes_in_without_a_
   }
 }
 
-// The manager tells trees apart by the place of their root node, modulo that of 64 nodes. Here tree t has nodes at places
-// of its own, so that no tree is forgotten for another one.
+// The manager tells trees apart by the place of their root node, modulo that of 64 nodes. Here tree t has nodes at
+// places of its own, so that no tree is forgotten for another one.
 TEST_F(HintTest, trees_that_take_ascending_keys_by_turns_need_no_descent_from_the_root) {
   constexpr std::size_t kTrees = 4;
   constexpr std::size_t kPlaces = 64;

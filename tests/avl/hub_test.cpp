@@ -1,5 +1,5 @@
-// Large trees of dense keys: the manager keeps their nodes by key while keys come in, lets their heights go meanwhile, and
-// must never do so for a tree that is another one by now.
+// Large trees of dense keys: the manager keeps their nodes by key while keys come in, lets their heights go meanwhile,
+// and must never do so for a tree that is another one by now.
 #include <algorithm>
 #include <array>
 #include <limits>
@@ -230,7 +230,8 @@ TEST_F(HubTest, hubs_and_small_trees_whose_root_words_move_keep_apart) {
   }
 }
 
-// Trees whose nodes all come from one array, so that the root node of a dropped one serves again, as a root or below one.
+// Trees whose nodes all come from one array, so that the root node of a dropped one serves again, as a root or below
+// one.
 TEST_F(HubTest, a_dropped_tree_is_forgotten_when_its_root_node_serves_again) {
   constexpr std::size_t n = 9000;
   std::vector<NonzeroNode> nodes(n);
