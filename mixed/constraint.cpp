@@ -1,30 +1,27 @@
 #include "mixed/constraint.hpp"
 
-#include <Eigen/Dense>
-#include <cmath>
+#include "mixed/dense.hpp"
 
 namespace sm::mixed {
 namespace {
 
 std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
-double log_abs_det(const Eigen::MatrixXd& matrix) {
-  if (matrix.size() == 0) return 0.0;
-  return matrix.fullPivLu().matrixLU().diagonal().array().abs().log().sum();
-}
-
-Eigen::MatrixXd solved(Equations& equations, const Eigen::MatrixXd& b) {
-  const std::vector<double> x = equations.solve({b.data(), at(b.size())}, b.cols());
-  return Eigen::Map<const Eigen::MatrixXd>(x.data(), b.rows(), b.cols());
-}
-
 // What the unit vector of a dropped row loses on its way through C and C^-.
-Eigen::MatrixXd null_vectors(Equations& equations) {
-  const auto count = static_cast<Eigen::Index>(equations.dropped().size());
-  Eigen::MatrixXd unit = Eigen::MatrixXd::Zero(equations.order(), count);
-  for (Eigen::Index v = 0; v < count; ++v) unit(equations.dropped()[at(v)], v) = 1.0;
-  const std::vector<double> product = equations.product({unit.data(), at(unit.size())}, count);
-  return unit - solved(equations, Eigen::Map<const Eigen::MatrixXd>(product.data(), unit.rows(), count));
+Dense null_vectors(Equations& equations) {
+  const std::vector<std::int64_t>& dropped = equations.dropped();
+  const std::size_t order = at(equations.order());
+  const auto count = static_cast<std::int64_t>(dropped.size());
+  Dense vectors(order * dropped.size(), 0.0);
+  for (std::size_t v = 0; v < dropped.size(); ++v) vectors[v * order + at(dropped[v])] = 1.0;
+  const Dense there_and_back = equations.solve(equations.product(vectors, count), count);
+  for (std::size_t i = 0; i < vectors.size(); ++i) vectors[i] -= there_and_back[i];
+  return vectors;
+}
+
+Dense beside(Dense left, const Dense& right) {
+  left.insert(left.end(), right.begin(), right.end());
+  return left;
 }
 
 }  // namespace
@@ -59,40 +56,35 @@ std::vector<double> Constraint::products(std::span<const double> x) const {
 void Constraint::prepare(Equations& equations) {
   if (empty()) return;
   order_ = at(equations.order());
-  const auto order = static_cast<Eigen::Index>(order_);
-  const auto count = static_cast<Eigen::Index>(vectors_.size());
-  Eigen::MatrixXd a = Eigen::MatrixXd::Zero(order, count);
-  for (Eigen::Index v = 0; v < count; ++v) {
-    const NullVector& vector = vectors_[at(v)];
+  const std::size_t count = vectors_.size();
+  Dense a(order_ * count, 0.0);
+  for (std::size_t v = 0; v < count; ++v) {
+    const NullVector& vector = vectors_[v];
     for (std::size_t l = 0; l < vector.value.size(); ++l) {
-      a(static_cast<Eigen::Index>(vector.first + l * vector.stride), v) = vector.value[l];
+      a[v * order_ + vector.first + l * vector.stride] = vector.value[l];
     }
   }
-  const auto products_with = [&](const Eigen::MatrixXd& x) {
-    Eigen::MatrixXd result(count, x.cols());
-    for (Eigen::Index j = 0; j < x.cols(); ++j) {
-      const std::vector<double> column = products({x.col(j).data(), order_});
-      result.col(j) = Eigen::Map<const Eigen::VectorXd>(column.data(), count);
+  const auto products_with = [&](const Dense& x) {
+    Dense result;
+    for (std::size_t first = 0; first < x.size(); first += order_) {
+      result = beside(std::move(result), products({&x[first], order_}));
     }
     return result;
   };
-  const Eigen::MatrixXd inverse = solved(equations, a);
-  const Eigen::MatrixXd between = products_with(inverse);
-  const Eigen::MatrixXd null = null_vectors(equations);
-  const Eigen::MatrixXd p = products_with(null);
+  inverse_ = equations.solve(a, static_cast<std::int64_t>(count));
+  between_ = products_with(inverse_);
+  const Dense null = null_vectors(equations);
+  const Dense p = products_with(null);
 
-  Eigen::MatrixXd complement = Eigen::MatrixXd::Identity(count, count);
-  if (p.cols() > 0) complement = p.householderQr().householderQ() * complement;
-  const Eigen::MatrixXd q = complement.rightCols(count - p.cols());
-  Eigen::MatrixXd moves(order, count);
-  moves << null, inverse * q;
-  Eigen::MatrixXd across(count, count);
-  across << p, between * q;
-  const Eigen::MatrixXd shift = moves * across.inverse();
-  log_det_ = log_abs_det(p.transpose() * p) + log_abs_det(q.transpose() * between * q);
-  shift_.assign(shift.data(), shift.data() + shift.size());
-  inverse_.assign(inverse.data(), inverse.data() + inverse.size());
-  between_.assign(between.data(), between.data() + between.size());
+  const std::size_t dropped = p.size() / count;
+  const std::size_t left = count - dropped;
+  const Dense q = complement(p, count, dropped);
+  const Dense moves = beside(null, product(inverse_, q, order_, count, left));
+  const Dense between_q = product(between_, q, count, count, left);
+  const Dense across = beside(p, between_q);
+  shift_ = product(moves, inverse_of(across, count), order_, count, count);
+  log_det_ = log_abs_det(product(transposed(p, count, dropped), p, dropped, count, dropped), dropped) +
+             log_abs_det(product(transposed(q, count, left), between_q, left, count, left), left);
 }
 
 void Constraint::apply(std::span<double> solutions) const {

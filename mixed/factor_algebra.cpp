@@ -1,121 +1,134 @@
 #include "mixed/factor_algebra.hpp"
 
-#include <Eigen/Dense>
 #include <algorithm>
 #include <cmath>
 #include <numeric>
+#include <span>
 
 namespace sm::mixed {
 namespace {
 
-using Map = Eigen::Map<const Eigen::MatrixXd>;
-
-Eigen::Index index(std::size_t i) { return static_cast<Eigen::Index>(i); }
-Map map(const Dense& a, std::size_t n) { return {a.data(), index(n), index(n)}; }
-Dense dense(const Eigen::MatrixXd& a) { return {a.data(), a.data() + a.size()}; }
-
 constexpr double kRounding = 1e-13;
+
+double dot(std::span<const double> a, std::span<const double> b) {
+  return std::inner_product(a.begin(), a.end(), b.begin(), 0.0);
+}
+
+double norm(std::span<const double> a) { return std::sqrt(dot(a, a)); }
+
+void subtract(double factor, std::span<const double> a, std::span<double> from) {
+  for (std::size_t i = 0; i < a.size(); ++i) from[i] -= factor * a[i];
+}
+
+void divide(std::span<double> a, double by) {
+  for (double& element : a) element /= by;
+}
+
+std::span<double> column(Dense& a, std::size_t j, std::size_t rows) { return {&a[j * rows], rows}; }
 
 }  // namespace
 
-Dense multiplied(const Dense& a, const Dense& b, std::size_t n) { return dense(map(a, n) * map(b, n)); }
+Dense multiplied(const Dense& a, const Dense& b, std::size_t n) { return product(a, b, n, n, n); }
 
 Dense multiplied_transposed(const Dense& a, const Dense& b, std::size_t n) {
-  return dense(map(a, n) * map(b, n).transpose());
+  return product(a, transposed(b, n, n), n, n, n);
 }
 
 Dense inverse_of_triangle(const Dense& upper, std::size_t n) {
-  const Eigen::MatrixXd identity = Eigen::MatrixXd::Identity(index(n), index(n));
-  return dense(map(upper, n).triangularView<Eigen::Upper>().solve(identity));
+  Dense inverse = identity(n);
+  for (std::size_t j = 0; j < n; ++j) {
+    const std::span<double> x = column(inverse, j, n);
+    for (std::size_t i = j + 1; i-- > 0;) {
+      x[i] /= upper[i * n + i];
+      subtract(x[i], {&upper[i * n], i}, x);
+    }
+  }
+  return inverse;
 }
-
-Dense inverse_of(const Dense& a, std::size_t n) { return dense(map(a, n).fullPivLu().inverse()); }
 
 // Rows are made orthogonal one after the other; a row within the span of those before it gets no column of its own.
 Dense lower_factor(const Dense& factor, std::size_t n) {
-  const Map f = map(factor, n);
-  Eigen::MatrixXd lower = Eigen::MatrixXd::Zero(index(n), index(n));
-  Eigen::MatrixXd directions = Eigen::MatrixXd::Zero(index(n), index(n));
-  for (Eigen::Index i = 0; i < index(n); ++i) {
-    Eigen::VectorXd row = f.row(i).transpose();
-    const double length = row.norm();
+  Dense rows = transposed(factor, n, n);
+  Dense lower(n * n, 0.0);
+  Dense directions(n * n, 0.0);
+  for (std::size_t i = 0; i < n; ++i) {
+    const std::span<double> row = column(rows, i, n);
+    const double length = norm(row);
     for (int pass = 0; pass < 2; ++pass) {
-      const Eigen::VectorXd along = directions.leftCols(i).transpose() * row;
-      row -= directions.leftCols(i) * along;
-      lower.row(i).head(i) += along.transpose();
+      for (std::size_t j = 0; j < i; ++j) {
+        const double along = dot(column(directions, j, n), row);
+        subtract(along, column(directions, j, n), row);
+        lower[j * n + i] += along;
+      }
     }
-    if (row.norm() <= kRounding * length) continue;
-    lower(i, i) = row.norm();
-    directions.col(i) = row / row.norm();
+    const double left = norm(row);
+    if (left <= kRounding * length) continue;
+    lower[i * n + i] = left;
+    divide(row, left);
+    std::copy(row.begin(), row.end(), column(directions, i, n).begin());
   }
-  return dense(lower);
+  return lower;
 }
 
 std::optional<Dense> lower_factor_of_covariance(const Dense& covariance, std::size_t n) {
-  const Eigen::SelfAdjointEigenSolver<Eigen::MatrixXd> eigen(map(covariance, n));
-  const Eigen::VectorXd& values = eigen.eigenvalues();
-  if (values(0) < -1e-12 * std::max(values(index(n) - 1), 0.0) || !values.allFinite()) return std::nullopt;
-  const Eigen::MatrixXd root = eigen.eigenvectors() * values.cwiseMax(0.0).cwiseSqrt().asDiagonal();
-  return lower_factor(dense(root), n);
+  Eigensystem eigen = eigensystem(covariance, n);
+  if (n > 0 && !(eigen.values.front() >= -1e-12 * std::max(eigen.values.back(), 0.0))) return std::nullopt;
+  for (double& value : eigen.values) value = std::sqrt(std::max(value, 0.0));
+  return lower_factor(scaled_columns(std::move(eigen.vectors), eigen.values), n);
 }
 
-std::vector<double> singular_values(const Dense& factor, std::size_t n) {
-  const Eigen::JacobiSVD<Eigen::MatrixXd> svd(map(factor, n));
-  const Eigen::VectorXd& values = svd.singularValues();
-  return {values.data(), values.data() + values.size()};
-}
+std::vector<double> singular_values(const Dense& factor, std::size_t n) { return singular_system(factor, n).values; }
 
 ReducedFactor reduced(const Dense& factor, std::size_t n, double limit) {
-  const Eigen::JacobiSVD<Eigen::MatrixXd> svd(map(factor, n), Eigen::ComputeFullU);
+  SingularSystem svd = singular_system(factor, n);
   ReducedFactor result;
-  while (result.rank < n && svd.singularValues()(index(result.rank)) >= limit) ++result.rank;
-  const Eigen::Index rank = index(result.rank);
-  Eigen::MatrixXd left = svd.matrixU().leftCols(rank) * svd.singularValues().head(rank).asDiagonal();
+  while (result.rank < n && svd.values[result.rank] >= limit) ++result.rank;
+  std::fill(svd.values.begin() + static_cast<std::ptrdiff_t>(result.rank), svd.values.end(), 0.0);
+  Dense rows = transposed(scaled_columns(std::move(svd.left), svd.values), n, n);
   result.rows.resize(n);
   std::iota(result.rows.begin(), result.rows.end(), std::size_t{0});
+  result.factor.assign(n * n, 0.0);
   // Each column of the result belongs to the row that is longest outside the span of the rows before.
-  Eigen::MatrixXd lower = Eigen::MatrixXd::Zero(index(n), index(n));
-  for (Eigen::Index c = 0; c < rank; ++c) {
-    Eigen::Index best = c;
-    for (Eigen::Index i = c; i < index(n); ++i) {
-      if (left.row(index(result.rows[std::size_t(i)])).norm() > left.row(index(result.rows[std::size_t(best)])).norm())
-        best = i;
+  for (std::size_t c = 0; c < result.rank; ++c) {
+    const auto length = [&](std::size_t row) { return norm(column(rows, row, n)); };
+    const auto longest = std::max_element(result.rows.begin() + static_cast<std::ptrdiff_t>(c), result.rows.end(),
+                                          [&](std::size_t a, std::size_t b) { return length(a) < length(b); });
+    std::swap(result.rows[c], *longest);
+    const std::span<double> chosen = column(rows, result.rows[c], n);
+    std::vector<double> direction(chosen.begin(), chosen.end());
+    divide(direction, norm(direction));
+    for (std::size_t row = 0; row < n; ++row) {
+      const double along = dot(direction, column(rows, row, n));
+      const auto place = std::find(result.rows.begin(), result.rows.end(), row) - result.rows.begin();
+      if (static_cast<std::size_t>(place) >= c) result.factor[c * n + row] = along;
+      subtract(along, direction, column(rows, row, n));
     }
-    std::swap(result.rows[std::size_t(c)], result.rows[std::size_t(best)]);
-    const Eigen::RowVectorXd direction = left.row(index(result.rows[std::size_t(c)])).normalized();
-    const Eigen::VectorXd along = left * direction.transpose();
-    for (Eigen::Index i = c; i < index(n); ++i) {
-      const Eigen::Index row = index(result.rows[std::size_t(i)]);
-      lower(row, c) = along(row);
-    }
-    left -= along * direction;
   }
-  result.factor = dense(lower);
   return result;
 }
 
 SmallestEigenvalue smallest_eigenvalue(const Dense& symmetric, std::size_t n) {
-  const Eigen::SelfAdjointEigenSolver<Eigen::MatrixXd> eigen(map(symmetric, n));
-  const Eigen::VectorXd vector = eigen.eigenvectors().col(0);
-  return {eigen.eigenvalues()(0), {vector.data(), vector.data() + vector.size()}};
+  const Eigensystem eigen = eigensystem(symmetric, n);
+  return {eigen.values[0], {eigen.vectors.begin(), eigen.vectors.begin() + static_cast<std::ptrdiff_t>(n)}};
 }
 
 std::optional<Dense> inverse_of_definite(const Dense& symmetric, std::size_t n, double limit) {
-  const Map a = map(symmetric, n);
-  if (n == 0) return Dense{};
-  if (!a.allFinite() || (a.diagonal().array() <= 0.0).any()) return std::nullopt;
-  const Eigen::VectorXd scale = a.diagonal().cwiseSqrt().cwiseInverse();
-  const Eigen::MatrixXd scaled = scale.asDiagonal() * a * scale.asDiagonal();
-  const Eigen::SelfAdjointEigenSolver<Eigen::MatrixXd> eigen(scaled);
-  if (eigen.eigenvalues()(0) <= limit) return std::nullopt;
-  const Eigen::MatrixXd inverse =
-      eigen.eigenvectors() * eigen.eigenvalues().cwiseInverse().asDiagonal() * eigen.eigenvectors().transpose();
-  return dense(scale.asDiagonal() * inverse * scale.asDiagonal());
+  std::vector<double> scale(n);
+  for (std::size_t i = 0; i < n; ++i) {
+    if (!(symmetric[i * n + i] > 0.0)) return std::nullopt;
+    scale[i] = 1.0 / std::sqrt(symmetric[i * n + i]);
+  }
+  const auto scaled = [&](const Dense& a) {
+    return transposed(scaled_columns(transposed(scaled_columns(a, scale), n, n), scale), n, n);
+  };
+  Eigensystem eigen = eigensystem(scaled(symmetric), n);
+  if (n > 0 && !(eigen.values[0] > limit)) return std::nullopt;
+  for (double& value : eigen.values) value = 1.0 / value;
+  return scaled(multiplied_transposed(scaled_columns(eigen.vectors, eigen.values), eigen.vectors, n));
 }
 
 Dense congruence(const Dense& j, const Dense& c, std::size_t rows, std::size_t n) {
-  const Map jacobian(j.data(), index(rows), index(n));
-  return dense(jacobian * map(c, n) * jacobian.transpose());
+  return product(product(j, c, rows, n, n), transposed(j, rows, n), rows, n, rows);
 }
 
 }  // namespace sm::mixed

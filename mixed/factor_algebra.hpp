@@ -1,18 +1,15 @@
-// Small dense matrices by columns: the relative covariance factors of terms, and matrices of information.
+// The relative covariance factors of terms, and matrices of information.
 #pragma once
 
-#include <cstddef>
 #include <optional>
-#include <vector>
+
+#include "mixed/dense.hpp"
 
 namespace sm::mixed {
-
-using Dense = std::vector<double>;
 
 Dense multiplied(const Dense& a, const Dense& b, std::size_t n);             // A B
 Dense multiplied_transposed(const Dense& a, const Dense& b, std::size_t n);  // A B'
 Dense inverse_of_triangle(const Dense& upper, std::size_t n);
-Dense inverse_of(const Dense& a, std::size_t n);
 
 // The lower triangular L with L L' = F F' and a diagonal that is not negative; zeros where F F' is singular.
 Dense lower_factor(const Dense& factor, std::size_t n);

@@ -1,6 +1,6 @@
 #include "mixed/null_space.hpp"
 
-#include <Eigen/Dense>
+#include <cmath>
 
 namespace sm::mixed {
 namespace {
@@ -12,11 +12,16 @@ constexpr double kNoPivot = 1e-10;
 std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
 // Null vectors of a precision that are 1 at one of its null rows and 0 at the others.
-Eigen::MatrixXd unit_null_vectors(const Precision& precision) {
-  const Eigen::Map<const Eigen::MatrixXd> basis(precision.null_basis.data(), precision.order, precision.nullity);
-  Eigen::MatrixXd rows(precision.nullity, precision.nullity);
-  for (Eigen::Index r = 0; r < rows.rows(); ++r) rows.row(r) = basis.row(precision.null_rows[at(r)]);
-  return basis * rows.inverse();
+Dense unit_null_vectors(const Precision& precision) {
+  const std::size_t order = at(precision.order);
+  const std::size_t nullity = at(precision.nullity);
+  Dense rows(nullity * nullity);
+  for (std::size_t j = 0; j < nullity; ++j) {
+    for (std::size_t r = 0; r < nullity; ++r) {
+      rows[j * nullity + r] = precision.null_basis[j * order + at(precision.null_rows[r])];
+    }
+  }
+  return product(precision.null_basis, inverse_of(rows, nullity), order, nullity, nullity);
 }
 
 // What the fixed effects leave of the columns of `view`.
@@ -58,7 +63,7 @@ NullSpace::NullSpace(const ScaledDesign& design, Equations& equations, Part part
   for (std::size_t t = 0; t < design.terms().size(); ++t) {
     const DesignTerm& term = design.terms()[t];
     if (!term.precision || term.precision->nullity == 0) continue;
-    const Eigen::MatrixXd vectors = unit_null_vectors(*term.precision);
+    const Dense vectors = unit_null_vectors(*term.precision);
     for (std::size_t r = 0; r < at(term.precision->nullity); ++r) {
       const std::size_t first = unknowns_.size();
       for (std::size_t c = 0; c < at(term.k); ++c) {
@@ -66,7 +71,7 @@ NullSpace::NullSpace(const ScaledDesign& design, Equations& equations, Part part
             {term.first + term.precision->null_rows[r] * term.k + static_cast<std::int64_t>(c), t, c, first});
         std::vector<double> column(at(design.rows()));
         for (std::size_t i = 0; i < column.size(); ++i) {
-          column[i] = vectors((*term.level)[i], static_cast<Eigen::Index>(r)) * term.z[i * at(term.k) + c];
+          column[i] = vectors[r * at(term.precision->order) + at((*term.level)[i])] * term.z[i * at(term.k) + c];
         }
         view.push_back(std::move(column));
       }
@@ -77,50 +82,47 @@ NullSpace::NullSpace(const ScaledDesign& design, Equations& equations, Part part
   length.reserve(view.size());
   for (const std::vector<double>& column : view) length.push_back(dot(design, column, column));
   if (part == Part::all) take_fixed_effects_out(design, equations, view);
-  const auto count = static_cast<Eigen::Index>(view.size());
-  Eigen::MatrixXd scaled(count, count);
+  Dense scaled;
   for (std::size_t j = 0; j < view.size(); ++j) {
     for (std::size_t i = 0; i < view.size(); ++i) {
       gram_.push_back(dot(design, view[i], view[j]));
       const double size = std::sqrt(length[i] * length[j]);
-      scaled(static_cast<Eigen::Index>(i), static_cast<Eigen::Index>(j)) = size > 0.0 ? gram_.back() / size : 0.0;
+      scaled.push_back(size > 0.0 ? gram_.back() / size : 0.0);
     }
   }
-  const Eigen::VectorXd values = Eigen::SelfAdjointEigenSolver<Eigen::MatrixXd>(scaled).eigenvalues();
-  for (const double value : values) rank_ += value > kDependent ? 1 : 0;
+  for (const double value : eigensystem(scaled, view.size()).values) rank_ += value > kDependent ? 1 : 0;
 }
 
 // The largest pivots of T'HT, H the cross products of the data's view, are those that stay. Where T is nearly singular
 // the least of them are rounding in the equations, and go.
 std::vector<std::int64_t> NullSpace::superfluous(const Factors& factors) const {
-  const auto count = static_cast<Eigen::Index>(unknowns_.size());
-  Eigen::MatrixXd factor = Eigen::MatrixXd::Zero(count, count);
-  for (std::size_t j = 0; j < unknowns_.size(); ++j) {
+  const std::size_t count = unknowns_.size();
+  Dense factor(count * count, 0.0);
+  for (std::size_t j = 0; j < count; ++j) {
     const Unknown& unknown = unknowns_[j];
     const std::size_t k = at(design_.terms()[unknown.term].k);
     for (std::size_t a = 0; a < k; ++a) {
-      factor(static_cast<Eigen::Index>(unknown.first + a), static_cast<Eigen::Index>(j)) =
-          factors[unknown.term][unknown.coef * k + a];
+      factor[j * count + unknown.first + a] = factors[unknown.term][unknown.coef * k + a];
     }
   }
-  const Eigen::Map<const Eigen::MatrixXd> gram(gram_.data(), count, count);
-  Eigen::MatrixXd left = factor.transpose() * gram * factor;
-  std::vector<bool> stays(unknowns_.size(), false);
+  Dense left = multiplied(transposed(factor, count, count), multiplied(gram_, factor, count), count);
+  const auto diagonal = [&](std::size_t i) { return left[i * count + i]; };
+  std::vector<bool> stays(count, false);
   for (std::size_t step = 0; step < rank_; ++step) {
-    Eigen::Index best = -1;
-    for (Eigen::Index i = 0; i < count; ++i) {
-      if (!stays[at(i)] && (best < 0 || left(i, i) > left(best, best))) best = i;
+    std::size_t best = count;
+    for (std::size_t i = 0; i < count; ++i) {
+      if (!stays[i] && (best == count || diagonal(i) > diagonal(best))) best = i;
     }
-    const Unknown& unknown = unknowns_[at(best)];
-    const double diagonal = precision_diagonal(design_.terms()[unknown.term], unknown.place);
-    if (left(best, best) <= kNoPivot * diagonal) break;
-    stays[at(best)] = true;
-    if (!(left(best, best) > 0.0)) continue;
-    const Eigen::VectorXd column = left.col(best);
-    left -= column * column.transpose() / column(best);
+    const Unknown& unknown = unknowns_[best];
+    if (diagonal(best) <= kNoPivot * precision_diagonal(design_.terms()[unknown.term], unknown.place)) break;
+    stays[best] = true;
+    const Dense column(&left[best * count], &left[best * count] + count);
+    for (std::size_t j = 0; j < count; ++j) {
+      for (std::size_t i = 0; i < count; ++i) left[j * count + i] -= column[i] * column[j] / column[best];
+    }
   }
   std::vector<std::int64_t> rows;
-  for (std::size_t i = 0; i < unknowns_.size(); ++i) {
+  for (std::size_t i = 0; i < count; ++i) {
     if (!stays[i]) rows.push_back(unknowns_[i].place);
   }
   return rows;
