@@ -1,6 +1,6 @@
 #include "cli/answers.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <cmath>

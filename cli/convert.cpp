@@ -1,4 +1,4 @@
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include "cli/commands.hpp"
 #include "cli/matrix_output.hpp"

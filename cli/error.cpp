@@ -1,6 +1,6 @@
 #include "cli/error.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <system_error>
 

@@ -1,6 +1,6 @@
 #include "cli/facts.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 

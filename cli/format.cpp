@@ -1,6 +1,6 @@
 #include "cli/format.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 #include <sys/resource.h>
 #include <unistd.h>
 

@@ -1,6 +1,6 @@
 #include "cli/gradients.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <cmath>
 

@@ -1,6 +1,6 @@
 #include "cli/hermite.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <cmath>
 

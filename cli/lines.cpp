@@ -1,6 +1,6 @@
 #include "cli/lines.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <cstring>
 

@@ -1,6 +1,6 @@
 #include "cli/loading.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <chrono>
 

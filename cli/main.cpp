@@ -1,5 +1,5 @@
 // qxsm: the operations of the module on matrices in files.
-#include <fmt/format.h>
+#include <fmt/core.h>
 #include <unistd.h>
 
 #include <csignal>

@@ -1,6 +1,6 @@
 #include "cli/matrix_market.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <array>

@@ -1,6 +1,6 @@
 #include "cli/matrix_market_header.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <cctype>

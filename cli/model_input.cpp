@@ -1,6 +1,6 @@
 #include "cli/model_input.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <memory>

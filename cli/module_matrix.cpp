@@ -1,6 +1,6 @@
 #include "cli/module_matrix.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include "cli/error.hpp"
 

@@ -1,7 +1,7 @@
 #include "cli/module_session.hpp"
 
 #include <dlfcn.h>
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include "cli/error.hpp"
 #include "cli/format.hpp"

@@ -1,6 +1,6 @@
 #include "cli/options.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <CLI/CLI.hpp>
 #include <algorithm>

@@ -5,7 +5,7 @@
 #include "cli/orderings.hpp"
 
 #include <amd.h>
-#include <fmt/format.h>
+#include <fmt/core.h>
 #include <metis.h>
 
 #include <algorithm>

@@ -1,6 +1,6 @@
 #include "cli/structure.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <cmath>

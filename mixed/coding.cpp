@@ -1,7 +1,7 @@
 // Rules: J. M. Chambers and T. J. Hastie, "Statistical Models in S" (1992), section 2.4.1.
 #include "mixed/coding.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 

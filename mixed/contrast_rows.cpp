@@ -1,6 +1,6 @@
 #include "mixed/contrast_rows.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <map>

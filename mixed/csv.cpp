@@ -2,7 +2,7 @@
 
 #include <csv.h>
 #include <fcntl.h>
-#include <fmt/format.h>
+#include <fmt/core.h>
 #include <unistd.h>
 #include <zlib.h>
 

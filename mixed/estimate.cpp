@@ -1,6 +1,6 @@
 #include "mixed/estimate.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <chrono>
 #include <cmath>

@@ -1,6 +1,6 @@
 #include "mixed/expression.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <array>
 #include <cmath>

@@ -1,6 +1,6 @@
 #include "mixed/fit_files.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <cmath>

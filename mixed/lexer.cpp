@@ -1,6 +1,6 @@
 #include "mixed/lexer.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <array>

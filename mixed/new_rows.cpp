@@ -1,5 +1,5 @@
 // Rows of new data, as the model's own rows were made.
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <unordered_map>

@@ -1,6 +1,6 @@
 #include "mixed/pedigree_file.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <array>

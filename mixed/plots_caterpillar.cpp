@@ -1,5 +1,5 @@
 // Random effects in order of their size, a row for each level and a panel for each coefficient of each group.
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <cmath>

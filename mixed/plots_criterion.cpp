@@ -1,5 +1,5 @@
 // The road of an optimizer: how far the criterion was above its end, and the largest scaled score, by iteration.
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <cmath>

@@ -1,5 +1,5 @@
 // Residuals against fitted values: dots where they are few, hexagons shaded by their number where they are many.
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <cmath>

@@ -1,5 +1,5 @@
 // Where the entries of the mixed-model equations and of their factor are, each cell as dark as it is full.
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <cmath>

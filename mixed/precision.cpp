@@ -1,6 +1,6 @@
 #include "mixed/precision.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <cmath>

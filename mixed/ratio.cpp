@@ -1,6 +1,6 @@
 #include "mixed/ratio.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <cctype>
 #include <charconv>

@@ -1,6 +1,6 @@
 #include "mixed/row_ids.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <string_view>
 #include <unordered_map>

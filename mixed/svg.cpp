@@ -1,6 +1,6 @@
 #include "mixed/svg.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <cmath>
 #include <iterator>

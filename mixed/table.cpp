@@ -1,6 +1,6 @@
 #include "mixed/table.hpp"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 #include <sys/stat.h>
 
 #include <algorithm>
