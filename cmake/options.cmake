@@ -27,9 +27,16 @@ if(QXESM_SANITIZE)
     BRIEF_DOCS "Compile without the sanitizers")
   set(instrumented $<NOT:$<BOOL:$<TARGET_PROPERTY:PLAIN_CODE>>>)
   target_compile_options(qxesm_options INTERFACE
-    "$<${instrumented}:-fno-omit-frame-pointer;-g;-fsanitize=address,undefined;-fno-sanitize-recover=undefined>")
+    "$<${instrumented}:-fno-omit-frame-pointer;-g1;-fsanitize=address,undefined;-fno-sanitize-recover=undefined>")
   target_link_options(qxesm_options INTERFACE -fsanitize=address,undefined)
 endif()
+
+# For code that calculates little: the checks of what is inlined into it would be most of its time to compile.
+function(qxesm_few_inlined_checks target)
+  if(QXESM_SANITIZE)
+    target_compile_options(${target} PRIVATE -Og)
+  endif()
+endfunction()
 if(QXESM_COVERAGE)
   target_compile_options(qxesm_options INTERFACE --coverage)
   target_link_options(qxesm_options INTERFACE --coverage)
