@@ -26,6 +26,11 @@ enum class Kind { lmm, reml, blup };
 
 // What can be found wrong before anything is read.
 void check_usage(const ModelOptions& options) {
+  if (options.formula.find('~') == std::string::npos && options.data.find('~') != std::string::npos) {
+    throw CommandError({.what = fmt::format("found the formula {} where the data are to be named", quote(options.data)),
+                        .expected = "the file before the formula",
+                        .advice = "change their places: DATA FORMULA"});
+  }
   int from_input = 0;
   for (const std::string* path : {&options.data, &options.pedigree, &options.predict})
     from_input += *path == "-" ? 1 : 0;

@@ -323,6 +323,13 @@ TEST_F(ModelCommand, mistakes_in_formulas_and_options_are_named) {
                {"--pedigree is given", "(1 | g; pedigree)"});
   expect_fault(qxsm(line("reaction ~ days + (1 | subject)", {"--levels", "days"})), {"--levels", "\"days\""});
   expect_fault(qxsm(line("reaction ~ days + (1 | subject)", {"--test", "1*dais"})), {"dais"});
+  EXPECT_NE(qxsm(line("reaction ~ days + (1 | subject)", {"--test", "-1*days"})).out.find("\n-1*days  -10.467"),
+            std::string::npos);
+  expect_fault(qxsm(line("", {})), {"formula: column 1: the formula is empty", "'y ~ x + (1 | g)'"});
+  expect_fault(qxsm(line("~ days", {})), {"formula: column 1: there is no response before the tilde"});
+  expect_message(qxsm(line("reaction ~ days + (1 | subject; K)", {})), 2, {"\"K\"", "--kinv K=K.mtx"});
+  expect_fault(qxsm(line("log(reaction - 300) ~ days + (1 | subject)", {})),
+               {"sleepstudy.csv:2:", "'log(reaction - 300)'", "the logarithm of a number that is not positive"});
   expect_fault(qxsm(line("reaction ~ days + (1 | subject)", {"--ratio", "x = subjekt / total"})), {"subjekt"});
   expect_fault(qxsm(line("reaction ~ days + (1 | subject)", {"--predict", "new.csv"})), {"--predict", "--out"});
   const std::string other = file("s.json", "{\"schema\": \"other/1\"}");
