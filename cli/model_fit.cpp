@@ -222,6 +222,12 @@ Report ModelFit::report() const {
   report.replace(common_.json ? "" : text(), common_.json ? mixed::fit_json(model_, fit_) : "");
   if (fit_.convergence == mixed::Convergence::converged || fit_.variances_given) return report;
   const bool stopped = fit_.convergence == mixed::Convergence::stopped;
+  if (!stopped && !fit_.obstacle.empty()) {
+    report.fail({.code = ExitCode::no,
+                 .what = "the fit did not converge: " + fit_.obstacle,
+                 .advice = "simplify the model, or look for rounding in the response"});
+    return report;
+  }
   report.fail({.code = ExitCode::no,
                .what = stopped ? "stopped before the fit converged" : "the fit did not converge",
                .advice = options_.folder.empty()

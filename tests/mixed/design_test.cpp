@@ -161,6 +161,22 @@ TEST(Design, orders_random_terms_by_levels_and_those_of_combinations_by_the_firs
   EXPECT_EQ(model.random[2].group, "f");
 }
 
+TEST(Design, keeps_the_order_of_the_formula_among_random_terms_with_as_many_levels) {
+  std::string table = "y,x,a,b,c\n";
+  for (int i = 0; i < 18; ++i) {
+    table += std::to_string(i * i % 7) + "," + std::to_string(i % 5) + "," + std::to_string(i % 3) + "," +
+             std::to_string(i / 6) + "," + std::to_string(i % 6) + "\n";
+  }
+  const auto groups = [&](const std::string& formula) {
+    Strings found;
+    for (const RandomTerm& term : model_of(table, formula).random) found.push_back(term.group + " " + term.coefs[0]);
+    return found;
+  };
+  EXPECT_EQ(groups("y ~ (1 | b) + (x || a) + (1 | c)"),
+            (Strings{"c (Intercept)", "b (Intercept)", "a (Intercept)", "a x"}));
+  EXPECT_EQ(groups("y ~ (0 + x | a) + (1 | a) + (1 | b)"), (Strings{"a x", "a (Intercept)", "b (Intercept)"}));
+}
+
 TEST(Design, gives_a_combination_the_levels_that_occur) {
   const Model model = model_of("y,a,b\n1,u,k\n2,u,m\n3,v,k\n4,u,k\n5,u,m\n", "y ~ (1 | a:b)");
   EXPECT_EQ(model.random[0].levels, (Strings{"u:k", "u:m", "v:k"}));
@@ -210,6 +226,20 @@ TEST(Design, refuses_groups_that_no_variance_can_be_told_from) {
   EXPECT_EQ(each.variable, "each");
   EXPECT_NE(fault_of([&] { model_of(table, "y ~ (1 + each | g)"); }).what.find("random effects"), std::string::npos);
   EXPECT_EQ(model_of(table, "y ~ (1 | each)", {.variances_given = true}).random[0].level_count(), 4);
+}
+
+TEST(Design, refuses_a_group_whose_levels_are_fixed_effects_too) {
+  const Fault fault = fault_of([] { model_of(kCrossed, "y ~ g + x + (1 | g)"); });
+  EXPECT_EQ(fault.variable, "g");
+  EXPECT_EQ(fault.column, 13);
+  EXPECT_NE(fault.what.find("the fixed part holds 'g' as a factor too"), std::string::npos) << fault.what;
+  EXPECT_NE(fault_of([] { model_of(kCrossed, "y ~ f*g + (1 | g:f)"); }).what.find("'f:g'"), std::string::npos);
+  EXPECT_NE(fault_of([] { model_of(kCrossed, "y ~ f + (1 | f/g)"); }).advice.find("(1 | a:b)"), std::string::npos);
+  // A number and a part of an interaction are no such factor, nor is a slope; given variances are as they are.
+  EXPECT_EQ(model_of(kCrossed, "y ~ f + (1 | f:g)").random.size(), 1u);
+  EXPECT_EQ(model_of("y,t\n1,1\n2,2\n4,3\n4,1\n5,2\n7,3\n", "y ~ t + (1 | t)").random.size(), 1u);
+  EXPECT_EQ(model_of(kCrossed, "y ~ f + (0 + x | f)").random.size(), 1u);
+  EXPECT_EQ(model_of(kCrossed, "y ~ g + (1 | g)", {.variances_given = true}).random.size(), 1u);
 }
 
 TEST(Design, refuses_responses_that_are_no_numbers_or_all_the_same) {
