@@ -32,8 +32,8 @@ void check(const mixed::ModelError& error) {
   promise(fault.file.empty() || fault.file == kName || fault.file == "formula");
   promise(!fault.advice.empty() || !fault.expected.empty() || !fault.excerpt.empty());
   promise(fault.line == 0 || fault.file == kName);
-  const std::string_view first = message.substr(0, message.size() - fault.excerpt.size());
-  promise(std::none_of(first.begin(), first.end(), [](char c) { return c >= 0 && c < 0x20 && c != '\n'; }));
+  promise(std::none_of(message.begin(), message.end(), [](char c) { return c >= 0 && c < 0x20 && c != '\n'; }));
+  promise(std::count(message.begin(), message.end(), '\n') == (fault.excerpt.empty() ? 0 : 2));
 }
 
 void check(const mixed::Table& table) {
