@@ -64,6 +64,7 @@ class ModelFit {
  private:
   void read();
   void fit();
+  double bytes_for(const mixed::EquationFacts& facts) const { return static_cast<double>(resident_) + facts.bytes; }
   void refuse_large(const mixed::EquationFacts& facts) const;
   mixed::FitOptions fit_options();
   bool note(const mixed::Iteration& iteration);
@@ -87,6 +88,7 @@ class ModelFit {
   mixed::Model model_;
   mixed::Fit fit_;
   std::vector<std::string> notes_;
+  std::uint64_t resident_ = 0;  // when the model stood
   std::size_t iterations_ = 0;
   double flops_ = 0.0;  // of the step under way
   double rate_ = 2e9;   // operations a second, as met last
@@ -108,6 +110,7 @@ void ModelFit::read() {
   model_ = mixed::build_model(table, formula_, design);
   notes_ = model_.notes;
   notes_.insert(notes_.end(), precisions.notes().begin(), precisions.notes().end());
+  resident_ = resident();
 }
 
 // One line for each iteration; false when Ctrl-C was pressed.
@@ -142,10 +145,11 @@ mixed::FitOptions ModelFit::fit_options() {
 }
 
 void ModelFit::refuse_large(const mixed::EquationFacts& facts) const {
-  if (facts.bytes <= static_cast<double>(common_.ceiling)) return;
+  const double bytes = bytes_for(facts);
+  if (bytes <= static_cast<double>(common_.ceiling)) return;
   throw CommandError({.code = ExitCode::no_memory,
                       .what = fmt::format("the fit would take about {}: more than the {} of --memory",
-                                          bytes_text(facts.bytes), bytes_text(static_cast<double>(common_.ceiling))),
+                                          bytes_text(bytes), bytes_text(static_cast<double>(common_.ceiling))),
                       .advice = "raise --memory, or make the model smaller; --dry-run tells its size"});
 }
 
@@ -211,7 +215,7 @@ std::string ModelFit::text() const {
 Report ModelFit::plan_report(const mixed::EquationFacts& facts) const {
   Report report(command());
   report.add_json("dry_run", true);
-  report_plan(report, model_, facts);
+  report_plan(report, model_, facts, bytes_for(facts));
   for (const std::string& note : notes_) report.add_text("note", note);
   report.add_json("notes", notes_);
   return report;

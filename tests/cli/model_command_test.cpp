@@ -255,6 +255,20 @@ TEST_F(ModelCommand, a_dry_run_tells_the_size_and_stops) {
   EXPECT_FALSE(std::filesystem::exists(path("none")));
 }
 
+TEST_F(ModelCommand, a_dry_run_foretells_the_memory_that_a_fit_takes) {
+  if (sanitized()) GTEST_SKIP() << "a sanitizer's own memory is another matter";
+  const std::vector<std::vector<std::string>> lines{sleep({}),
+                                                    {"lmm", crossed(20000, 1500, 600), "y ~ 1 + (1 | g) + (1 | h)"},
+                                                    {"lmm", crossed(60000, 8000, 12), "y ~ 1 + (1 | g) + (1 | h)"}};
+  for (const std::vector<std::string>& line : lines) {
+    const double bytes = parsed(qxsm(with(line, {"--dry-run", "--json"}))).at("bytes");
+    const Outcome run = qxsm(with(line, {"--json"}));
+    const double peak = parsed(run).at("peak_bytes");
+    EXPECT_GT(peak, 0.5 * bytes) << line[2];
+    EXPECT_LT(peak, 1.5 * bytes) << line[2];
+  }
+}
+
 TEST_F(ModelCommand, a_fit_that_is_too_large_is_not_begun) {
   const std::string data = crossed(20000, 2000, 800);
   const std::vector<std::string> line{"lmm", data, "y ~ 1 + (1 | g) + (1 | h)"};
