@@ -191,7 +191,8 @@ class Scanner {
   bool row_done_ = false;
 };
 
-// The first byte that no text in UTF-8 has: one of value 0, or one that is no part of a character. npos when there is none.
+// The first byte that no text in UTF-8 has: one of value 0, or one that is no part of a character; npos when there is
+// none.
 std::size_t find_no_text(std::string_view text) {
   std::size_t at = std::min(text.find('\0'), text.size());
   std::string_view rest = text.substr(0, at);
