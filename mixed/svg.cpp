@@ -60,10 +60,10 @@ std::string cut_around(std::string_view text, std::size_t place, double size, do
       left -= text_width(head, size);
     }
     left -= text_width(next, size);
-    if (left < 0.0) return "…" + head + tail + "…";
+    if (left < 0.0) return fmt::format("…{}{}…", head, tail);
     tail += next;
   }
-  return "…" + head + tail;
+  return fmt::format("…{}{}", head, tail);
 }
 
 }  // namespace
