@@ -68,4 +68,11 @@ std::uint64_t peak_resident() {
   return static_cast<std::uint64_t>(usage.ru_maxrss) * 1024;
 }
 
+std::uint64_t resident() {
+  std::uint64_t all = 0;
+  std::uint64_t pages = 0;
+  if (!(std::ifstream("/proc/self/statm") >> all >> pages)) return peak_resident();
+  return pages * static_cast<std::uint64_t>(std::max(sysconf(_SC_PAGESIZE), 0L));
+}
+
 }  // namespace sm::cli

@@ -26,4 +26,7 @@ std::uint64_t machine_memory();
 // The largest resident size of this process so far, in bytes.
 std::uint64_t peak_resident();
 
+// What of it is resident now; the largest so far where the system does not tell.
+std::uint64_t resident();
+
 }  // namespace sm::cli

@@ -26,6 +26,11 @@ enum class Kind { lmm, reml, blup };
 
 // What can be found wrong before anything is read.
 void check_usage(const ModelOptions& options) {
+  if (options.formula.find('~') == std::string::npos && options.data.find('~') != std::string::npos) {
+    throw CommandError({.what = fmt::format("found the formula {} where the data are to be named", quote(options.data)),
+                        .expected = "the file before the formula",
+                        .advice = "change their places: DATA FORMULA"});
+  }
   int from_input = 0;
   for (const std::string* path : {&options.data, &options.pedigree, &options.predict})
     from_input += *path == "-" ? 1 : 0;
@@ -59,6 +64,7 @@ class ModelFit {
  private:
   void read();
   void fit();
+  double bytes_for(const mixed::EquationFacts& facts) const { return static_cast<double>(resident_) + facts.bytes; }
   void refuse_large(const mixed::EquationFacts& facts) const;
   mixed::FitOptions fit_options();
   bool note(const mixed::Iteration& iteration);
@@ -82,6 +88,7 @@ class ModelFit {
   mixed::Model model_;
   mixed::Fit fit_;
   std::vector<std::string> notes_;
+  std::uint64_t resident_ = 0;  // when the model stood
   std::size_t iterations_ = 0;
   double flops_ = 0.0;  // of the step under way
   double rate_ = 2e9;   // operations a second, as met last
@@ -103,6 +110,7 @@ void ModelFit::read() {
   model_ = mixed::build_model(table, formula_, design);
   notes_ = model_.notes;
   notes_.insert(notes_.end(), precisions.notes().begin(), precisions.notes().end());
+  resident_ = resident();
 }
 
 // One line for each iteration; false when Ctrl-C was pressed.
@@ -137,10 +145,11 @@ mixed::FitOptions ModelFit::fit_options() {
 }
 
 void ModelFit::refuse_large(const mixed::EquationFacts& facts) const {
-  if (facts.bytes <= static_cast<double>(common_.ceiling)) return;
+  const double bytes = bytes_for(facts);
+  if (bytes <= static_cast<double>(common_.ceiling)) return;
   throw CommandError({.code = ExitCode::no_memory,
                       .what = fmt::format("the fit would take about {}: more than the {} of --memory",
-                                          bytes_text(facts.bytes), bytes_text(static_cast<double>(common_.ceiling))),
+                                          bytes_text(bytes), bytes_text(static_cast<double>(common_.ceiling))),
                       .advice = "raise --memory, or make the model smaller; --dry-run tells its size"});
 }
 
@@ -206,7 +215,7 @@ std::string ModelFit::text() const {
 Report ModelFit::plan_report(const mixed::EquationFacts& facts) const {
   Report report(command());
   report.add_json("dry_run", true);
-  report_plan(report, model_, facts);
+  report_plan(report, model_, facts, bytes_for(facts));
   for (const std::string& note : notes_) report.add_text("note", note);
   report.add_json("notes", notes_);
   return report;
@@ -217,6 +226,12 @@ Report ModelFit::report() const {
   report.replace(common_.json ? "" : text(), common_.json ? mixed::fit_json(model_, fit_) : "");
   if (fit_.convergence == mixed::Convergence::converged || fit_.variances_given) return report;
   const bool stopped = fit_.convergence == mixed::Convergence::stopped;
+  if (!stopped && !fit_.obstacle.empty()) {
+    report.fail({.code = ExitCode::no,
+                 .what = "the fit did not converge: " + fit_.obstacle,
+                 .advice = "simplify the model, or look for rounding in the response"});
+    return report;
+  }
   report.fail({.code = ExitCode::no,
                .what = stopped ? "stopped before the fit converged" : "the fit did not converge",
                .advice = options_.folder.empty()

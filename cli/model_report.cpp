@@ -34,7 +34,7 @@ std::string effects_table(const mixed::RandomEffects& effects, std::size_t shown
 
 }  // namespace
 
-void report_plan(Report& report, const mixed::Model& model, const mixed::EquationFacts& facts) {
+void report_plan(Report& report, const mixed::Model& model, const mixed::EquationFacts& facts, double bytes) {
   report.add("formula", model.formula, "formula", mixed::printable(model.formula));
   report.add("observations", model.rows(), "observations", fmt::format("{}", model.rows()));
   if (model.rows_dropped > 0) {
@@ -57,7 +57,7 @@ void report_plan(Report& report, const mixed::Model& model, const mixed::Equatio
   report.add("factor_entries", facts.factor_entries, "factor",
              fmt::format("{} entries, fill ratio {:.4g}", facts.factor_entries, fill));
   report.add("flops", facts.flops, "flops", fmt::format("{:.4g} for each factorization", facts.flops));
-  report.add("bytes", facts.bytes, "memory needed", bytes_text(facts.bytes) + " (estimated)");
+  report.add("bytes", bytes, "memory needed", bytes_text(bytes) + " (estimated)");
 }
 
 std::string effects_text(const mixed::Fit& fit, std::size_t most) {

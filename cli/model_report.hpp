@@ -10,8 +10,8 @@
 
 namespace sm::cli {
 
-// The size of a fit that is not to be made.
-void report_plan(Report& report, const mixed::Model& model, const mixed::EquationFacts& facts);
+// The size of a fit that is not to be made; `bytes` is what it would take, the program and the model included.
+void report_plan(Report& report, const mixed::Model& model, const mixed::EquationFacts& facts, double bytes);
 
 // The predicted effects of every level, up to so many lines a term.
 std::string effects_text(const mixed::Fit& fit, std::size_t most = 60);

@@ -16,6 +16,7 @@
 #include "cli/model_options.hpp"
 #include "cli/orderings.hpp"
 #include "cli/validators.hpp"
+#include "mixed/words.hpp"
 
 namespace sm::cli {
 namespace {
@@ -281,6 +282,30 @@ std::string help_command(const CLI::App& app) {
   return chosen.empty() ? "qxsm --help" : fmt::format("qxsm {} --help", chosen.front()->get_name());
 }
 
+// What the subcommand has no place for: an option with another name, or words more than it takes.
+void refuse_extra(const CLI::App& app) {
+  if (app.get_subcommands().empty()) return;
+  const CLI::App& command = *app.get_subcommands().front();
+  const std::vector<std::string> extras = command.remaining(true);
+  const auto option =
+      std::find_if(extras.begin(), extras.end(), [](const std::string& word) { return word.starts_with('-'); });
+  if (option == extras.end()) {
+    const std::string words = fmt::format("{}", fmt::join(extras, " "));
+    throw CommandError({.what = fmt::format("found {} behind the last argument that is asked for", quote(words)),
+                        .expected = "a file name or a formula with blanks in it to stand in quotes",
+                        .advice = "see " + help_command(app)});
+  }
+  const std::string name = option->substr(0, option->find('='));
+  std::vector<std::string> known;
+  for (const CLI::Option* each : command.get_options()) {
+    for (const std::string& long_name : each->get_lnames()) known.push_back("--" + long_name);
+  }
+  const std::string near = mixed::nearest_name(name, known);
+  throw CommandError({.what = fmt::format("found {}, which is no option of qxsm {}{}", name, command.get_name(),
+                                          near.empty() ? "" : fmt::format(" (did you mean {}?)", near)),
+                      .advice = "see " + help_command(app)});
+}
+
 // The library only misses a subcommand; more telling is the word that was given in its place.
 [[noreturn]] void refuse(const CLI::App& app, const CLI::ParseError& error, int argc, const char* const* argv) {
   const auto word = std::find_if(argv + 1, argv + argc, [](const char* argument) { return argument[0] != '-'; });
@@ -290,6 +315,7 @@ std::string help_command(const CLI::App& app) {
     throw CommandError(
         {.what = "found the subcommand " + quote(*word), .expected = alternatives(names), .advice = "see qxsm --help"});
   }
+  if (dynamic_cast<const CLI::ExtrasError*>(&error)) refuse_extra(app);
   throw CommandError({.what = error.what(), .advice = "see " + help_command(app)});
 }
 

@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "mixed/error.hpp"
+#include "mixed/text.hpp"
 #include "mixed/words.hpp"
 
 namespace sm::mixed {
@@ -190,8 +191,30 @@ class Scanner {
   bool row_done_ = false;
 };
 
-void refuse_nul(std::string_view text, const std::string& name) {
-  const std::size_t at = text.find('\0');
+// The first byte that no text in UTF-8 has: one of value 0, or one that is no part of a character; npos when there is
+// none.
+std::size_t find_no_text(std::string_view text) {
+  std::size_t at = std::min(text.find('\0'), text.size());
+  std::string_view rest = text.substr(0, at);
+  while (!rest.empty()) {
+    const std::size_t before = rest.size();
+    const bool ascii = (static_cast<unsigned char>(rest.front()) & 0x80u) == 0;
+    next_character(rest);
+    if (!ascii && before - rest.size() == 1) return at - before;
+    if (!ascii) continue;
+    // Most tables are hardly anything else: eight characters at a time.
+    std::uint64_t eight = 0;
+    while (rest.size() >= sizeof eight) {
+      std::memcpy(&eight, rest.data(), sizeof eight);
+      if ((eight & 0x8080808080808080u) != 0) break;
+      rest.remove_prefix(sizeof eight);
+    }
+  }
+  return at < text.size() ? at : std::string_view::npos;
+}
+
+void refuse_no_text(std::string_view text, const std::string& name) {
+  const std::size_t at = find_no_text(text);
   if (at == std::string_view::npos) return;
   std::int64_t line = 1;
   std::size_t begin = 0;
@@ -199,12 +222,17 @@ void refuse_nul(std::string_view text, const std::string& name) {
     begin = end;
     ++line;
   }
+  const auto byte = static_cast<unsigned char>(text[at]);
+  const bool utf16 = byte == 0 || text.starts_with("\xff\xfe") || text.starts_with("\xfe\xff");
   throw ModelError({.file = name,
                     .line = line,
                     .column = 1 + characters(text.substr(begin, at - begin)),
-                    .what = "found a byte of value 0",
+                    .what = byte == 0 ? "found a byte of value 0"
+                                      : fmt::format("found the byte 0x{:02x}, which is no character of UTF-8", byte),
                     .expected = "text in UTF-8",
-                    .advice = "save the table as CSV in UTF-8 (not UTF-16, not a spreadsheet file)"});
+                    .advice = utf16 ? "save the table as CSV in UTF-8 (not UTF-16, not a spreadsheet file)"
+                                    : "save the table as CSV in UTF-8, or convert it: "
+                                      "iconv -f WINDOWS-1252 -t UTF-8 OLD.csv > NEW.csv"});
 }
 
 }  // namespace
@@ -234,7 +262,7 @@ std::string read_text(const std::string& path) {
     text.resize(kept + static_cast<std::size_t>(got));
     if (got == 0) break;
   }
-  refuse_nul(text, path);
+  refuse_no_text(text, path);
   return text;
 }
 

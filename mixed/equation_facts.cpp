@@ -42,8 +42,9 @@ EquationFacts Equations::facts() const {
     const auto length = static_cast<double>(matrix_->factor_iu[i + 1] - matrix_->factor_iu[i]);
     facts.flops += length * (length + 2.0);
   }
-  // What the inverse keeps of the blocks it is working on, at most, or of all of a small matrix.
-  const double fronts = std::min(13.6e6, 8.0 * static_cast<double>(order_) * static_cast<double>(order_));
+  // What the inverse keeps of the blocks it is working on, at most, or of all of a small matrix or factor.
+  const double fronts = std::min({13.6e6, 8.0 * static_cast<double>(order_) * static_cast<double>(order_),
+                                  64.0 * static_cast<double>(facts.factor_entries)});
   // The entries are held as blocks, as rows of the module, as values to fill in and as elements of the inverse; the
   // factor once more while it is inverted.
   const auto entries = static_cast<double>(facts.entries);

@@ -1,6 +1,28 @@
 #include "mixed/error.hpp"
 
+#include <array>
+
 namespace sm::mixed {
+namespace {
+
+// Names come from a user's files, and control characters in them would be obeyed by a terminal.
+std::string without_controls(const std::string& text) {
+  constexpr std::array<char, 17> kDigits{"0123456789abcdef"};
+  std::string out;
+  for (const char c : text) {
+    const auto byte = static_cast<unsigned char>(c);
+    if (byte >= 0x20 && byte != 0x7f) {
+      out += c;
+    } else {
+      out += "\\x";
+      out += kDigits[byte >> 4];
+      out += kDigits[byte & 0xf];
+    }
+  }
+  return out;
+}
+
+}  // namespace
 
 std::string describe(const Fault& fault) {
   std::string text = fault.file;
@@ -14,6 +36,7 @@ std::string describe(const Fault& fault) {
   text += fault.what;
   if (!fault.expected.empty()) text += ", expected " + fault.expected;
   if (!fault.advice.empty()) text += "; " + fault.advice;
+  text = without_controls(text);
   if (!fault.excerpt.empty()) text += "\n" + fault.excerpt;
   return text;
 }

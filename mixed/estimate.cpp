@@ -4,6 +4,7 @@
 
 #include <chrono>
 #include <cmath>
+#include <numeric>
 
 #include "mixed/effects.hpp"
 #include "mixed/error.hpp"
@@ -163,6 +164,7 @@ class Fitter {
     set_variances(design_, factors, variance, fit_);
     say_boundary(optimum.parameters);
     say_exact(factors);
+    refuse_exact(parts);
     AtOptimum at_optimum{optimum.parameters, factors, variance, {}};
     if (fit_.convergence == Convergence::converged) {
       at_optimum.covariance = observed_covariance(likelihood_, optimum.parameters, optimum.values, variance);
@@ -192,20 +194,57 @@ class Fitter {
     }
   }
 
+  // What is left is rounding, and so is every number that would be made of it.
+  void refuse_exact(const CriterionParts& parts) const {
+    constexpr double kRounding = 1e-13;
+    long double size = 0.0L;
+    for (std::size_t i = 0; i < model_.y.size(); ++i) size += design_.weight(i) * model_.y[i] * model_.y[i];
+    if (static_cast<long double>(parts.s2) > kRounding * kRounding * size) return;
+    throw ModelError({.variable = model_.response,
+                      .what = "the fixed effects explain the response exactly: nothing is left for a variance",
+                      .expected = "observations that vary about what the fixed effects say",
+                      .advice = "look for a term that the response was computed from"});
+  }
+
   // Where random effects explain every observation the relative factors grow for ever, and the search ends somewhere.
   // In the coordinates of the design the squares of a factor sum to the mean variance that its term gives to a record:
   // variances of coefficients have the units of their covariates, and would say nothing.
   void say_exact(const Factors& factors) {
     constexpr double kPractically = 1e-9;
+    constexpr double kSmall = 1e-6;
     double relative = 1.0;
-    for (const Dense& factor : factors) {
-      for (const double element : factor) relative += element * element;
+    double largest = 0.0;
+    std::size_t term = 0;
+    for (std::size_t t = 0; t < factors.size(); ++t) {
+      double squares = 0.0;
+      for (const double element : factors[t]) squares += element * element;
+      relative += squares;
+      if (squares > largest) term = t;
+      largest = std::max(largest, squares);
     }
     if (relative * kPractically < 1.0) return;
     fit_.singular = true;
-    fit_.messages.emplace_back(
-        "the residual variance is practically zero: the random effects explain every observation, and its value and "
-        "that of the others are where the search ended");
+    fit_.messages.push_back(
+        spread_of_residuals() < kSmall
+            ? "the residual variance is practically zero: the random effects explain every observation, and its value "
+              "and that of the others are where the search ended"
+            : fmt::format("the data do not determine the variance of '{}': the fixed effects explain the differences "
+                          "between its levels, and its value is where the search ended; leave the term out",
+                          model_.random[term].group));
+    fit_.obstacle = fit_.messages.back();
+  }
+
+  // The sum of squares of the residuals as a part of that of the response about its mean.
+  double spread_of_residuals() const {
+    const auto rows = static_cast<double>(model_.y.size());
+    const double mean = std::accumulate(model_.y.begin(), model_.y.end(), 0.0) / rows;
+    double left = 0.0;
+    double all = 0.0;
+    for (std::size_t i = 0; i < model_.y.size(); ++i) {
+      left += likelihood_.residual()[i] * likelihood_.residual()[i];
+      all += (model_.y[i] - mean) * (model_.y[i] - mean);
+    }
+    return left / all;
   }
 
   void finish(const AtOptimum& optimum, const CriterionParts& parts) {

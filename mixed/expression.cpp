@@ -54,7 +54,7 @@ const Function* find_function(std::string_view name) {
 
 void check_call(std::string_view formula, const Node& node) {
   if (!find_function(node.text)) {
-    std::string advice = "make the column in the data";
+    std::string advice = "make the column in the data; the name of one with parentheses stands in backquotes";
     for (const Elsewhere& other : kElsewhere) {
       if (other.name == node.text) advice = other.advice;
     }
@@ -80,6 +80,23 @@ void check_name(std::string_view formula, const Node& node) {
                            .what = "found a point for all other columns",
                            .expected = "names of columns",
                            .advice = "write them out"});
+}
+
+std::string why_not(const Node& node, double left, double right) {
+  if (node.kind == NodeKind::call) {
+    const std::string call = fmt::format("{}({:.6g})", node.text, left);
+    const bool negative = node.text == "log1p" ? left <= -1.0 : left <= 0.0;
+    if (node.text.starts_with("log") && negative) {
+      return fmt::format("{} is the logarithm of a number that is not {}", call,
+                         node.text == "log1p" ? "above -1" : "positive");
+    }
+    return fmt::format("{} is {}", call, node.text == "sqrt" ? "the square root of a negative number" : "too large");
+  }
+  std::string text = fmt::format("{:.6g}{}{:.6g}", left, node.kind == NodeKind::power ? "^" : " / ", right);
+  if (node.kind == NodeKind::divide && right == 0.0) return text + " is a division by zero";
+  if (node.kind == NodeKind::power && left == 0.0) return text + " is a division by zero";
+  if (node.kind == NodeKind::power && left < 0.0) return text + " is a negative number to a power that is not whole";
+  return "the value is too large";
 }
 
 template <class Combine>
@@ -144,6 +161,19 @@ std::vector<double> evaluate(const Node& node, std::size_t rows,
     default:
       return combined(std::move(left), right, [](double a, double b) { return b == 2.0 ? a * a : std::pow(a, b); });
   }
+}
+
+NoValue find_no_value(const Node& node, const std::function<double(const Node& name)>& cell) {
+  for (const Node& operand : node.args) {
+    NoValue inner = find_no_value(operand, cell);
+    if (inner.part) return inner;
+  }
+  const auto value_of = [&](const Node& part) {
+    return evaluate(part, 1, [&](const Node& name) { return std::vector<double>{cell(name)}; }).front();
+  };
+  if (std::isfinite(value_of(node))) return {};
+  const double left = node.args.empty() ? 0.0 : value_of(node.args[0]);
+  return {.part = &node, .why = why_not(node, left, node.args.size() < 2 ? 0.0 : value_of(node.args[1]))};
 }
 
 }  // namespace sm::mixed

@@ -21,4 +21,11 @@ void check_arithmetic(std::string_view formula, const Node& node);
 std::vector<double> evaluate(const Node& node, std::size_t rows,
                              const std::function<std::vector<double>(const Node& name)>& column);
 
+// Where an expression without a finite value in one row goes wrong.
+struct NoValue {
+  const Node* part = nullptr;  // the smallest part that has none
+  std::string why;             // "log(-5.7) is the logarithm of a number that is not positive"
+};
+NoValue find_no_value(const Node& node, const std::function<double(const Node& name)>& cell);
+
 }  // namespace sm::mixed

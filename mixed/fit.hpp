@@ -26,7 +26,7 @@ struct FixedEffect {
   std::string dependence;  // of an aliased one: "agefa14 = -8*(Intercept) + age"
   double estimate = 0.0;   // of a kept one, as the rest
   double se = 0.0;
-  std::optional<double> df;  // Satterthwaite; none where the information is singular
+  std::optional<double> df;  // Satterthwaite; none where the information is singular or nearly so
   double t = 0.0;
 };
 
@@ -87,6 +87,7 @@ struct Fit {
   bool variances_given = false;       // a prediction with known variances: nothing was iterated
   std::string optimizer;              // "trust-region Newton", or what had to step in: "NLopt BOBYQA"
   std::vector<std::string> messages;  // in words: boundary terms, doubts
+  std::string obstacle;               // that of the messages which says why there is no optimum; may be empty
   std::vector<Iteration> iterations;
 
   double criterion = 0.0;  // -2 log (restricted) likelihood, constants included

@@ -11,6 +11,8 @@ namespace {
 
 std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
+constexpr double kLeastDf = 0.005;  // what would be printed as 0.00 is none
+
 struct Estimate {
   double value = 0.0;
   double se = 0.0;
@@ -63,9 +65,12 @@ class LinearFunctions {
     return estimates;
   }
 
+  // Whether degrees of freedom were left out because the data hardly determine a variance.
+  bool undetermined() const { return undetermined_; }
+
  private:
   // Satterthwaite (1946): 2 v^2 / Var(v), v and the parameters relative to the residual variance.
-  std::optional<double> degrees_of_freedom(std::span<const double> q, double variance) const {
+  std::optional<double> degrees_of_freedom(std::span<const double> q, double variance) {
     if (!optimum_.covariance.known() || !(variance > 0.0)) return std::nullopt;
     std::vector<double> effects(q.begin(), q.end());
     multiply_factors(design_, optimum_.factors, effects);
@@ -87,13 +92,33 @@ class LinearFunctions {
     gradient.push_back(variance);  // by the logarithm of the residual variance
     // A variance smaller by orders of magnitude than its derivatives would overflow on the way.
     for (double& element : gradient) element /= variance;
-    return 2.0 / congruence(gradient, optimum_.covariance.covariance, 1, gradient.size())[0];
+    const double df = 2.0 / congruence(gradient, optimum_.covariance.covariance, 1, gradient.size())[0];
+    if (df >= kLeastDf) return df;
+    undetermined_ = true;
+    return std::nullopt;
   }
 
   Likelihood& likelihood_;
   const ScaledDesign& design_;
   const AtOptimum& optimum_;
+  bool undetermined_ = false;
 };
+
+// Where the criterion hardly changes with a variance, standard errors that depend on it are hardly known either.
+void say_undetermined(const LinearFunctions& functions, Fit& fit) {
+  if (!functions.undetermined()) return;
+  const auto doubt = [](const VarianceComponent& c) {
+    return c.se_observed && c.vcov != 0.0 && c.var2.empty() ? *c.se_observed / std::abs(c.vcov) : 0.0;
+  };
+  const auto worst = std::max_element(fit.varcomp.begin(), fit.varcomp.end(),
+                                      [&](const auto& a, const auto& b) { return doubt(a) < doubt(b); });
+  std::string text = "degrees of freedom are not available (—) where the data hardly determine a standard error";
+  if (worst != fit.varcomp.end() && doubt(*worst) > 1.0) {
+    text += fmt::format(": it depends on the variance of '{}'{}, whose own standard error is {:.2g} times as large",
+                        worst->group, worst->var1.empty() ? "" : fmt::format(" ({})", worst->var1), doubt(*worst));
+  }
+  if (std::find(fit.messages.begin(), fit.messages.end(), text) == fit.messages.end()) fit.messages.push_back(text);
+}
 
 constexpr std::size_t kTogether = 8;
 
@@ -187,6 +212,7 @@ void set_fixed_effects(Likelihood& likelihood, const AtOptimum& optimum, std::in
       for (const std::int64_t j : fixed.kept) fit.vcov_fixef.push_back(estimates[f].covariance[at(j)]);
     }
   }
+  say_undetermined(functions, fit);
 }
 
 namespace {
@@ -232,6 +258,7 @@ void set_contrasts(Likelihood& likelihood, const AtOptimum& optimum, const std::
     }
     fit.contrasts.push_back(std::move(contrast));
   }
+  say_undetermined(functions, fit);
 }
 
 }  // namespace sm::mixed

@@ -35,8 +35,38 @@ std::string advice_for(const std::string& cell) {
   double value = 0.0;
   std::string decimal = cell;
   std::replace(decimal.begin(), decimal.end(), ',', '.');
-  if (parse_number(decimal, value)) return "write a decimal point";
+  if (cell != decimal && parse_number(decimal, value)) return "write a decimal point here, and in other cells like it";
   return "correct it, or write NA if the value is missing";
+}
+
+// The column that begins with the name, "height (cm)" for height; empty unless there is one such.
+std::string longer_name(const std::string& name, const std::vector<std::string>& names) {
+  std::string longer;
+  for (const std::string& candidate : names) {
+    if (!candidate.starts_with(name)) continue;
+    if (!longer.empty()) return "";
+    longer = candidate;
+  }
+  return longer;
+}
+
+// What to do about a name that no column has.
+std::string advice_for_name(const std::string& name, const std::vector<std::string>& names) {
+  std::string meant = nearest_name(name, names);
+  double value = 0.0;
+  const auto is_number = [&](const std::string& each) { return parse_number(each, value); };
+  if (meant.empty() && std::any_of(names.begin(), names.end(), is_number)) {
+    return fmt::format("its first line, {}, seems to be data: put a line with the names of the columns above it",
+                       listed(names, 12));
+  }
+  if (meant.empty() && names.size() == 1) {
+    return fmt::format("its only column is {}: separate columns with commas, tabs or semicolons", quote(names[0]));
+  }
+  if (meant.empty()) meant = longer_name(name, names);
+  if (meant.empty()) return fmt::format("its columns are {}", listed(names, 12));
+  const std::string written = print_name(meant);
+  return written == meant ? fmt::format("did you mean '{}'?", meant)
+                          : fmt::format("did you mean '{}'? In a formula it stands in backquotes: {}", meant, written);
 }
 
 Factor distinct_numbers(const std::vector<double>& values, std::vector<std::size_t>& first) {
@@ -74,11 +104,8 @@ void sort_levels(std::vector<std::string>& levels) {
 const Column& Frame::column(const Node& name) const {
   const Column* const found = table_.find(name.text);
   if (found) return *found;
-  const std::vector<std::string> names = table_.column_names();
-  const std::string nearest = nearest_name(name.text, names);
   const std::string what = fmt::format("{} has no column of this name", table_.name());
-  const std::string advice = nearest.empty() ? fmt::format("its columns are {}", listed(names, 12))
-                                             : fmt::format("did you mean '{}'?", nearest);
+  const std::string advice = advice_for_name(name.text, table_.column_names());
   if (name.column == 0) throw ModelError({.variable = name.text, .what = what, .advice = advice});
   refuse_formula(formula_, {.column = name.column, .variable = name.text, .what = what, .advice = advice});
 }
@@ -170,15 +197,21 @@ std::vector<double> Frame::numbers(const Node& expression, const std::string& la
       evaluate(expression, rows_.size(), [this](const Node& name) { return column_numbers(name); });
   const auto bad = std::find_if(values.begin(), values.end(), [](double value) { return !std::isfinite(value); });
   if (bad == values.end()) return values;
-  const std::vector<const Node*> names = names_in(expression);
-  const Cell cell =
-      names.empty() ? Cell{} : this->cell(column(*names.front()), static_cast<std::size_t>(bad - values.begin()));
+  const auto place = static_cast<std::size_t>(bad - values.begin());
+  const auto number = [&](const Node& name) { return column(name).number[static_cast<std::size_t>(rows_[place])]; };
+  const NoValue none = find_no_value(expression, number);
+  Cell first;
+  std::string cells;
+  for (const Node* const name : names_in(*none.part)) {
+    const Cell cell = this->cell(column(*name), place);
+    cells += fmt::format("{} '{}' is {}", cells.empty() ? ", where" : " and", name->text, quote(cell.text));
+    if (first.line == 0) first = cell;
+  }
   throw ModelError({.file = table_.name(),
-                    .line = cell.line,
-                    .column = cell.column,
+                    .line = first.line,
+                    .column = first.column,
                     .variable = label,
-                    .what = fmt::format("the value is {} where {} is {}", *bad,
-                                        names.empty() ? "it" : "'" + names.front()->text + "'", quote(cell.text)),
+                    .what = none.why + cells,
                     .expected = "a finite number",
                     .advice = "write NA for the cell, or use another expression"});
 }
@@ -223,6 +256,11 @@ void Frame::refuse_slip(const Column& column) const {
   if (column.numeric) return;
   const auto numbers =
       static_cast<std::size_t>(std::count_if(column.labels.begin(), column.labels.end(), looks_like_number));
+  // With decimal commas throughout, however few of them are different.
+  const bool commas = numbers == column.labels.size() &&
+                      std::any_of(column.labels.begin(), column.labels.end(),
+                                  [](const std::string& label) { return label.find(',') != std::string::npos; });
+  if (commas) not_a_number(column, fmt::format("; if the column is a factor, name it: --factor {}", column.name));
   if (numbers < kSlipNumbers || static_cast<double>(numbers) < kSlipShare * static_cast<double>(column.labels.size())) {
     return;
   }

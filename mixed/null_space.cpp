@@ -6,8 +6,8 @@ namespace sm::mixed {
 namespace {
 
 constexpr double kDependent = 1e-10;  // of squared lengths
-// A pivot of this part of its row's diagonal is as far from zero as from what rounding makes of it.
-constexpr double kNoPivot = 1e-10;
+// Pivots below this part of their row's diagonal are hardly more than rounding. Larger ones are real, however small.
+constexpr double kNoPivot = 1e-13;
 
 std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 

@@ -128,8 +128,15 @@ class Finder {
         Optimum boundary = search(std::move(reduced));
         if (boundary.convergence == Convergence::stopped) return inside;
         Factors better = boundary.factors();
-        const std::vector<std::size_t> open = open_terms(boundary, better);
+        bool doubtful = false;
+        const std::vector<std::size_t> open = open_terms(boundary, better, doubtful);
         if (open.empty()) {
+          if (doubtful && leads_inside(boundary, better)) {
+            append(boundary, inside);
+            inside = std::move(boundary);
+            moved = true;
+            break;
+          }
           if (boundary.criterion > inside.criterion + noise(inside.criterion)) return inside;
           append(boundary, inside);
           return boundary;
@@ -151,6 +158,15 @@ class Finder {
     return inside;
   }
 
+  // Where rounding may hide that a boundary is none a search from beside it tells. `boundary` is then where it ended.
+  bool leads_inside(Optimum& boundary, const Factors& beside) {
+    Optimum restarted = search(Parameters(beside));
+    if (restarted.criterion >= boundary.criterion - noise(boundary.criterion)) return false;
+    append(restarted, boundary);
+    boundary = std::move(restarted);
+    return true;
+  }
+
   static void append(Optimum& later, const Optimum& earlier) {
     std::vector<Iteration> all = earlier.iterations;
     all.insert(all.end(), later.iterations.begin(), later.iterations.end());
@@ -159,8 +175,11 @@ class Finder {
 
   // Terms whose variance wants to grow in a direction in which it is zero, and factors that have let it. The
   // criterion is even in a new column of a factor: its second derivative, from one difference of the gradient, tells.
-  std::vector<std::size_t> open_terms(const Optimum& boundary, Factors& better) {
+  // Where it is within what the largest of them may leave in rounding a term is `doubtful`, and not among them.
+  std::vector<std::size_t> open_terms(const Optimum& boundary, Factors& better, bool& doubtful) {
     constexpr double kStep = 1e-3;
+    constexpr double kSurely = 1e-6;
+    constexpr double kPerhaps = 1e-10;
     std::vector<std::size_t> open;
     const Factors factors = boundary.factors();
     for (std::size_t t = 0; t < factors.size(); ++t) {
@@ -183,8 +202,12 @@ class Finder {
         }
       }
       const SmallestEigenvalue lowest = smallest_eigenvalue(curvature, n);
-      if (lowest.value >= -1e-6 * largest) continue;
-      open.push_back(t);
+      if (lowest.value >= -kPerhaps * largest) continue;
+      if (lowest.value >= -kSurely * largest) {
+        doubtful = true;
+      } else {
+        open.push_back(t);
+      }
       for (std::size_t a = 0; a < n; ++a) better[t][column * n + a] = kOutwards * lowest.vector[a];
     }
     return open;

@@ -100,10 +100,13 @@ void draw(svg::Canvas& canvas, const Placed& placed) {
   canvas.line(panel.x(0.0), panel.top(), panel.x(0.0), panel.bottom(), svg::kRule);
   std::string bars;
   const double size = label_size(rows);
+  std::vector<std::string> names;
+  for (const std::size_t level : placed.levels) names.push_back(effects.levels[level]);
+  names = svg::told_apart(names, size, placed.label_width - 6.0);
   for (std::size_t row = 0; row < rows; ++row) {
     const std::size_t level = placed.levels[row];
     const double y = panel.y(static_cast<double>(row));
-    canvas.text(panel.left() - 6.0, y + 0.35 * size, svg::fitted(effects.levels[level], size, placed.label_width - 6.0),
+    canvas.text(panel.left() - 6.0, y + 0.35 * size, names[row],
                 {.size = size, .anchor = svg::Anchor::end, .fill = svg::kMuted});
     if (!has_intervals(effects) || !std::isfinite(effects.pev_sd[level])) continue;
     const double half = kNormal95 * effects.pev_sd[level];

@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <numeric>
+#include <set>
 #include <unordered_map>
 
 #include "mixed/error.hpp"
@@ -67,6 +68,7 @@ class RandomMaker {
     Variables::Made made = variables_.make(part.terms);
     Coding coding = make_coding(part.terms, std::move(made.coded), options_.contrasts, kMostCoefficients);
     term.coefs = coding.names;
+    check_fixed_twin(part, coding);
     if (part.known.empty()) {
       check_sizes(part, coding, static_cast<std::int64_t>(levels.names.size()));
       term.levels = std::move(levels.names);
@@ -97,6 +99,28 @@ class RandomMaker {
                              count_of(coding.cols(), "coefficient"), levels, count_of(observations, "observation")),
            "fewer, or the variances cannot be told from the residual's",
            coding.cols() == 1 ? "leave the term out, or give variances" : "write (x || g), or leave a slope out");
+  }
+
+  // Nothing is left for the variance of a group whose levels are fixed effects already: the likelihood does not depend
+  // on it.
+  void check_fixed_twin(const RandomPart& part, const Coding& coding) const {
+    if (options_.variances_given || coding.cols() != 1 || !part.terms.intercept) return;
+    std::set<std::string> group;
+    for (const Node& name : part.group) group.insert(name.text);
+    for (std::size_t t = 0; t < formula_.fixed.terms.size(); ++t) {
+      std::set<std::string> factors;
+      bool all_factors = true;
+      for (const int v : formula_.fixed.terms[t]) {
+        const Variable& variable = formula_.fixed.variables[static_cast<std::size_t>(v)];
+        all_factors = all_factors && variable.bare() && variables_.is_factor(frame_.column(variable.expression));
+        factors.insert(variable.label);
+      }
+      if (!all_factors || factors != group) continue;
+      refuse(part, fmt::format("the fixed part holds '{}' as a factor too", formula_.fixed.label(t)),
+             "a group whose levels are no fixed effects, or there is no variance between them to be told",
+             part.group.size() > 1 ? "leave it out of one of the two"
+                                   : "leave it out of one of the two; a group within it is (1 | a:b), not (1 | a/b)");
+    }
   }
 
   // Levels are the rows of the precision, whether they have records or not.

@@ -19,6 +19,8 @@ std::string_view trimmed(std::string_view text) {
 
 std::vector<std::string> lines_of(std::string_view text) {
   std::vector<std::string> lines;
+  constexpr std::string_view kByteOrderMark = "\xef\xbb\xbf";
+  if (text.starts_with(kByteOrderMark)) text.remove_prefix(kByteOrderMark.size());
   while (!text.empty()) {
     const std::size_t end = text.find('\n');
     lines.emplace_back(text.substr(0, end));

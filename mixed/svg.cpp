@@ -2,8 +2,10 @@
 
 #include <fmt/core.h>
 
+#include <algorithm>
 #include <cmath>
 #include <iterator>
+#include <map>
 #include <vector>
 
 #include "mixed/text.hpp"
@@ -25,6 +27,43 @@ double advance(char32_t character) {
 
 const char* anchor_name(Anchor anchor) {
   return anchor == Anchor::start ? "start" : anchor == Anchor::middle ? "middle" : "end";
+}
+
+std::vector<std::string_view> characters_of(std::string_view text) {
+  std::vector<std::string_view> characters;
+  while (!text.empty()) {
+    const std::string_view before = text;
+    next_character(text);
+    characters.push_back(before.substr(0, before.size() - text.size()));
+  }
+  return characters;
+}
+
+// A third of the width for what stands before a place, and the rest from there on.
+std::string cut_around(std::string_view text, std::size_t place, double size, double width) {
+  std::size_t bytes = 0;
+  std::string head;
+  std::string tail;
+  double left = width - 2.0 * text_width("…", size);
+  for (const std::string_view next : characters_of(text)) {
+    bytes += next.size();
+    if (bytes <= place) {
+      head += next;
+      continue;
+    }
+    if (tail.empty()) {
+      std::vector<std::string_view> before = characters_of(head);
+      while (!before.empty() && text_width(head, size) > width / 3.0) {
+        head.erase(0, before.front().size());
+        before.erase(before.begin());
+      }
+      left -= text_width(head, size);
+    }
+    left -= text_width(next, size);
+    if (left < 0.0) return fmt::format("…{}{}…", head, tail);
+    tail += next;
+  }
+  return fmt::format("…{}{}", head, tail);
 }
 
 }  // namespace
@@ -61,12 +100,7 @@ double text_width(std::string_view text, double size) {
 std::string fitted(std::string_view text, double size, double width) {
   std::string shown = printable(text);
   if (text_width(shown, size) <= width) return shown;
-  std::vector<std::string_view> characters;
-  for (std::string_view rest = shown; !rest.empty();) {
-    const std::string_view before = rest;
-    next_character(rest);
-    characters.push_back(before.substr(0, before.size() - rest.size()));
-  }
+  const std::vector<std::string_view> characters = characters_of(shown);
   std::string head;
   std::string tail;
   double left = width - text_width("…", size);
@@ -82,6 +116,28 @@ std::string fitted(std::string_view text, double size, double width) {
     }
   }
   return head + "…" + tail;
+}
+
+std::vector<std::string> told_apart(const std::vector<std::string>& names, double size, double width) {
+  std::vector<std::string> shown;
+  std::map<std::string, std::vector<std::size_t>> alike;
+  for (const std::string& name : names) {
+    shown.push_back(fitted(name, size, width));
+    alike[shown.back()].push_back(shown.size() - 1);
+  }
+  for (const auto& [text, places] : alike) {
+    const std::string first = printable(names[places.front()]);
+    std::size_t same = first.size();
+    for (const std::size_t place : places) {
+      const std::string other = printable(names[place]);
+      const auto ends =
+          std::mismatch(first.begin(), first.begin() + static_cast<std::ptrdiff_t>(same), other.begin(), other.end());
+      same = static_cast<std::size_t>(ends.first - first.begin());
+    }
+    if (same == first.size()) continue;  // it is the only one, or begins as all of them
+    for (const std::size_t place : places) shown[place] = cut_around(printable(names[place]), same, size, width);
+  }
+  return shown;
 }
 
 std::string coordinate(double value) {

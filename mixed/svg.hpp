@@ -3,6 +3,7 @@
 
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace sm::mixed::svg {
 
@@ -31,6 +32,9 @@ double text_width(std::string_view text, double size);
 
 // The text no wider than that, with an ellipsis for its middle: names often differ at their ends.
 std::string fitted(std::string_view text, double size, double width);
+
+// Names that fitted() would make look alike are cut around the place where they begin to differ instead.
+std::vector<std::string> told_apart(const std::vector<std::string>& names, double size, double width);
 
 // Coordinates in pixels, the origin at the upper left; written to a hundredth.
 std::string coordinate(double value);

@@ -236,9 +236,10 @@ void refuse_formula(std::string_view formula, const FormulaFault& fault) {
              .what = fault.what,
              .expected = fault.expected,
              .advice = fault.advice};
+  told.file = "formula";
   if (!formula.empty()) {
-    told.file = "formula";
-    const bool one_line = formula.find_first_of("\n\r\t") == std::string_view::npos;
+    const bool one_line =
+        std::none_of(formula.begin(), formula.end(), [](char c) { return (c >= 0 && c < 0x20) || c == 0x7f; });
     if (one_line && formula.size() <= kMostShown) {
       const auto before = static_cast<std::size_t>(std::max<std::int64_t>(0, fault.column - 1));
       told.excerpt = fmt::format("  {}\n  {}^", formula, std::string(before, ' '));

@@ -77,6 +77,11 @@ class ColumnBuilder {
   std::unordered_map<std::string, std::int32_t, TextHash, std::equal_to<>> codes_;
 };
 
+std::string advice_for_unnamed(bool last) {
+  return last ? "name it, or take away the delimiter at the end of the lines"
+              : "name it (or write the table without row names)";
+}
+
 class TableLoader {
  public:
   TableLoader(const std::string& name, char delimiter) : name_(name), delimiter_(delimiter) {}
@@ -116,6 +121,7 @@ class TableLoader {
   }
 
   void take_header(const CsvRow& row) {
+    refuse_numbers(row);
     for (std::size_t c = 0; c < row.fields.size(); ++c) {
       const std::string_view name = row.fields[c];
       const auto same = std::find(names_.begin(), names_.end(), name);
@@ -129,18 +135,9 @@ class TableLoader {
                                                : fmt::format("columns {} and {} have the same name",
                                                              same - names_.begin() + 1, c + 1),
                           .expected = "a header line with a name of its own for each column",
-                          .advice = name.empty() ? "name it (or write the table without row names)" : "rename one"});
+                          .advice = name.empty() ? advice_for_unnamed(c + 1 == row.fields.size()) : "rename one"});
       }
       names_.emplace_back(name);
-    }
-    double value = 0.0;
-    if (std::all_of(names_.begin(), names_.end(), [&](const std::string& name) { return parse_number(name, value); })) {
-      throw ModelError({.file = name_,
-                        .line = row.line,
-                        .column = 1,
-                        .what = "found nothing but numbers in the first line",
-                        .expected = "the names of the columns",
-                        .advice = "put a header line above the data"});
     }
     text_.resize(names_.size(), 0);
     builders_.clear();
@@ -150,18 +147,49 @@ class TableLoader {
     }
   }
 
+  // Data without names, before two equal numbers are taken for two columns of the same name.
+  void refuse_numbers(const CsvRow& row) const {
+    double value = 0.0;
+    std::size_t numbers = 0;
+    for (const std::string_view field : row.fields) {
+      if (parse_number(field, value)) ++numbers;
+      if (!parse_number(field, value) && !is_missing(field)) return;
+    }
+    if (numbers == 0) return;
+    throw ModelError({.file = name_,
+                      .line = row.line,
+                      .column = 1,
+                      .what = "found nothing but numbers in the first line",
+                      .expected = "the names of the columns",
+                      .advice = "put a header line above the data"});
+  }
+
+  // What a row with more fields than the header may mean.
+  std::string advice_for_more(const CsvRow& row) const {
+    if (names_.size() == 1) return "if the first line is a title, take it away";
+    const auto digits = [](std::string_view text) {
+      return !text.empty() && text.find_first_not_of("0123456789") == std::string_view::npos;
+    };
+    for (std::size_t i = 0; delimiter_ == ',' && i + 1 < row.fields.size(); ++i) {
+      const std::string_view whole = row.fields[i];
+      if (!digits(whole.starts_with('-') ? whole.substr(1) : whole) || !digits(row.fields[i + 1])) continue;
+      return fmt::format("if {},{} is one number, write it with a decimal point: {}.{}", whole, row.fields[i + 1],
+                         whole, row.fields[i + 1]);
+    }
+    return "put a field that holds the delimiter in quotes";
+  }
+
   [[noreturn]] void ragged(const CsvRow& row) const {
     const std::size_t wanted = builders_.size();
     const CsvPlace place = place_of_field(row, delimiter_, std::min(row.fields.size(), wanted));
     const bool few = row.fields.size() < wanted;
-    throw ModelError(
-        {.file = name_,
-         .line = place.line,
-         .column = place.column,
-         .variable = few ? names_[row.fields.size()] : "",
-         .what = fmt::format("found {}", count_of(static_cast<std::int64_t>(row.fields.size()), "field")),
-         .expected = fmt::format("{} as in the header", wanted),
-         .advice = few ? "write NA for a value that is missing" : "put a field that holds the delimiter in quotes"});
+    throw ModelError({.file = name_,
+                      .line = place.line,
+                      .column = place.column,
+                      .variable = few ? names_[row.fields.size()] : "",
+                      .what = fmt::format("found {}", count_of(static_cast<std::int64_t>(row.fields.size()), "field")),
+                      .expected = fmt::format("{} as in the header", wanted),
+                      .advice = few ? "write NA for a value that is missing" : advice_for_more(row)});
   }
 
   [[noreturn]] void no_rows() const {

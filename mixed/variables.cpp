@@ -3,6 +3,7 @@
 #include <fmt/core.h>
 
 #include <algorithm>
+#include <cctype>
 #include <numeric>
 #include <unordered_map>
 
@@ -95,7 +96,24 @@ const Factor& Variables::factor(const Node& name) {
   if (known != factors_.end()) return known->second;
   Factor factor = frame_.distinct(column);
   order_levels(column, factor);
+  note_twins(column, factor.levels);
   return factors_.emplace(column.name, std::move(factor)).first->second;
+}
+
+// Levels that differ in capital letters only are mostly one level, and silently make another model.
+void Variables::note_twins(const Column& column, const std::vector<std::string>& levels) {
+  constexpr std::size_t kMost = 10'000;  // more than anybody types
+  if (column.numeric || levels.size() > kMost) return;
+  std::unordered_map<std::string, std::string> seen;
+  for (const std::string& level : levels) {
+    std::string small = level;
+    for (char& c : small) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
+    const auto [other, is_new] = seen.emplace(small, level);
+    if (is_new) continue;
+    notes_.push_back(fmt::format("'{}': the levels {} and {} differ in capital letters only, and are taken for two",
+                                 column.name, quote(other->second), quote(level)));
+    return;
+  }
 }
 
 void Variables::order_levels(const Column& column, Factor& factor) {

@@ -34,6 +34,7 @@ class Variables {
   std::vector<std::string>& notes() { return notes_; }
 
  private:
+  void note_twins(const Column& column, const std::vector<std::string>& levels);
   void order_levels(const Column& column, Factor& factor);
   std::vector<std::string> given_levels(const Column& column, const Factor& factor);
 

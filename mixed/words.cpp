@@ -101,7 +101,10 @@ std::string nearest_name(std::string_view name, const std::vector<std::string>& 
   for (const std::string& candidate : names) {
     if (candidate.size() > 2 * name.size() + 4) continue;
     const double d = distance(name, candidate);
-    if (d < best) {
+    if (d >= static_cast<double>(std::max(name.size(), candidate.size()))) continue;  // not a letter in common
+    // Of two that are as near, the one that begins alike: slips at the first letter are rare.
+    const bool alike = !candidate.empty() && !name.empty() && candidate[0] == name[0];
+    if (d < best || (d == best && alike && !nearest.empty() && nearest[0] != name[0])) {
       best = d;
       nearest = candidate;
     }

@@ -144,6 +144,14 @@ std::vector<std::tuple<int, int, double>> coordinate_entries(const std::string& 
   return entries;
 }
 
+bool sanitized() {
+#ifdef QXSM_SANITIZED
+  return true;
+#else
+  return false;
+#endif
+}
+
 void expect_message(const Outcome& run, int code, const std::vector<std::string>& parts) {
   EXPECT_EQ(run.code, code) << run.err;
   EXPECT_EQ(run.err.rfind("qxsm: ", 0), 0u) << run.err;

@@ -37,6 +37,9 @@ struct Streams {
 
 Outcome qxsm(const std::vector<std::string>& arguments, const Streams& streams = {});
 
+// Whether the program is built with sanitizers, which take memory and time of their own.
+bool sanitized();
+
 // A folder of its own for each test.
 class CommandTest : public ::testing::Test {
  protected:

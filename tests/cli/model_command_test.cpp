@@ -255,6 +255,20 @@ TEST_F(ModelCommand, a_dry_run_tells_the_size_and_stops) {
   EXPECT_FALSE(std::filesystem::exists(path("none")));
 }
 
+TEST_F(ModelCommand, a_dry_run_foretells_the_memory_that_a_fit_takes) {
+  if (sanitized()) GTEST_SKIP() << "a sanitizer's own memory is another matter";
+  const std::vector<std::vector<std::string>> lines{sleep({}),
+                                                    {"lmm", crossed(20000, 1500, 600), "y ~ 1 + (1 | g) + (1 | h)"},
+                                                    {"lmm", crossed(60000, 8000, 12), "y ~ 1 + (1 | g) + (1 | h)"}};
+  for (const std::vector<std::string>& line : lines) {
+    const double bytes = parsed(qxsm(with(line, {"--dry-run", "--json"}))).at("bytes");
+    const Outcome run = qxsm(with(line, {"--json"}));
+    const double peak = parsed(run).at("peak_bytes");
+    EXPECT_GT(peak, 0.5 * bytes) << line[2];
+    EXPECT_LT(peak, 1.5 * bytes) << line[2];
+  }
+}
+
 TEST_F(ModelCommand, a_fit_that_is_too_large_is_not_begun) {
   const std::string data = crossed(20000, 2000, 800);
   const std::vector<std::string> line{"lmm", data, "y ~ 1 + (1 | g) + (1 | h)"};
@@ -323,6 +337,13 @@ TEST_F(ModelCommand, mistakes_in_formulas_and_options_are_named) {
                {"--pedigree is given", "(1 | g; pedigree)"});
   expect_fault(qxsm(line("reaction ~ days + (1 | subject)", {"--levels", "days"})), {"--levels", "\"days\""});
   expect_fault(qxsm(line("reaction ~ days + (1 | subject)", {"--test", "1*dais"})), {"dais"});
+  EXPECT_NE(qxsm(line("reaction ~ days + (1 | subject)", {"--test", "-1*days"})).out.find("\n-1*days  -10.467"),
+            std::string::npos);
+  expect_fault(qxsm(line("", {})), {"formula: column 1: the formula is empty", "'y ~ x + (1 | g)'"});
+  expect_fault(qxsm(line("~ days", {})), {"formula: column 1: there is no response before the tilde"});
+  expect_message(qxsm(line("reaction ~ days + (1 | subject; K)", {})), 2, {"\"K\"", "--kinv K=K.mtx"});
+  expect_fault(qxsm(line("log(reaction - 300) ~ days + (1 | subject)", {})),
+               {"sleepstudy.csv:2:", "'log(reaction - 300)'", "the logarithm of a number that is not positive"});
   expect_fault(qxsm(line("reaction ~ days + (1 | subject)", {"--ratio", "x = subjekt / total"})), {"subjekt"});
   expect_fault(qxsm(line("reaction ~ days + (1 | subject)", {"--predict", "new.csv"})), {"--predict", "--out"});
   const std::string other = file("s.json", "{\"schema\": \"other/1\"}");

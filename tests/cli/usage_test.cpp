@@ -13,6 +13,13 @@ TEST(Usage, wrong_usage_ends_with_2_and_says_where_help_is) {
   expect_message(qxsm({"solve"}), 2, {"A.mtx is required", "; see qxsm solve --help"});
   expect_message(qxsm({"solve", "a.mtx", "--frobnicate"}), 2, {"--frobnicate", "; see qxsm solve --help"});
   expect_message(qxsm({"factor", "a.mtx", "b.mtx"}), 2, {"b.mtx", "; see qxsm factor --help"});
+  expect_message(qxsm({"lmm", "d.csv", "y ~ x", "--outt", "x"}), 2,
+                 {"found --outt, which is no option of qxsm lmm (did you mean --out?)", "; see qxsm lmm --help"});
+  expect_message(qxsm({"lmm", "d.csv", "y ~ x", "--zzzzzz=3"}), 2,
+                 {"found --zzzzzz, which is no option of qxsm lmm; see qxsm lmm --help"});
+  expect_message(qxsm({"lmm", "d.csv", "y", "x", "g"}), 2, {"found \"x g\" behind the last argument", "in quotes"});
+  expect_message(qxsm({"lmm", "y ~ x", "d.csv"}), 2,
+                 {"found the formula \"y ~ x\" where the data are to be named", "DATA FORMULA"});
   expect_message(qxsm({"solve", "a.mtx", "-b"}), 2, {"--rhs", "; see qxsm solve --help"});
 }
 

@@ -161,6 +161,22 @@ TEST(Design, orders_random_terms_by_levels_and_those_of_combinations_by_the_firs
   EXPECT_EQ(model.random[2].group, "f");
 }
 
+TEST(Design, keeps_the_order_of_the_formula_among_random_terms_with_as_many_levels) {
+  std::string table = "y,x,a,b,c\n";
+  for (int i = 0; i < 18; ++i) {
+    table += std::to_string(i * i % 7) + "," + std::to_string(i % 5) + "," + std::to_string(i % 3) + "," +
+             std::to_string(i / 6) + "," + std::to_string(i % 6) + "\n";
+  }
+  const auto groups = [&](const std::string& formula) {
+    Strings found;
+    for (const RandomTerm& term : model_of(table, formula).random) found.push_back(term.group + " " + term.coefs[0]);
+    return found;
+  };
+  EXPECT_EQ(groups("y ~ (1 | b) + (x || a) + (1 | c)"),
+            (Strings{"c (Intercept)", "b (Intercept)", "a (Intercept)", "a x"}));
+  EXPECT_EQ(groups("y ~ (0 + x | a) + (1 | a) + (1 | b)"), (Strings{"a x", "a (Intercept)", "b (Intercept)"}));
+}
+
 TEST(Design, gives_a_combination_the_levels_that_occur) {
   const Model model = model_of("y,a,b\n1,u,k\n2,u,m\n3,v,k\n4,u,k\n5,u,m\n", "y ~ (1 | a:b)");
   EXPECT_EQ(model.random[0].levels, (Strings{"u:k", "u:m", "v:k"}));
@@ -212,13 +228,27 @@ TEST(Design, refuses_groups_that_no_variance_can_be_told_from) {
   EXPECT_EQ(model_of(table, "y ~ (1 | each)", {.variances_given = true}).random[0].level_count(), 4);
 }
 
+TEST(Design, refuses_a_group_whose_levels_are_fixed_effects_too) {
+  const Fault fault = fault_of([] { model_of(kCrossed, "y ~ g + x + (1 | g)"); });
+  EXPECT_EQ(fault.variable, "g");
+  EXPECT_EQ(fault.column, 13);
+  EXPECT_NE(fault.what.find("the fixed part holds 'g' as a factor too"), std::string::npos) << fault.what;
+  EXPECT_NE(fault_of([] { model_of(kCrossed, "y ~ f*g + (1 | g:f)"); }).what.find("'f:g'"), std::string::npos);
+  EXPECT_NE(fault_of([] { model_of(kCrossed, "y ~ f + (1 | f/g)"); }).advice.find("(1 | a:b)"), std::string::npos);
+  // A number and a part of an interaction are no such factor, nor is a slope; given variances are as they are.
+  EXPECT_EQ(model_of(kCrossed, "y ~ f + (1 | f:g)").random.size(), 1u);
+  EXPECT_EQ(model_of("y,t\n1,1\n2,2\n4,3\n4,1\n5,2\n7,3\n", "y ~ t + (1 | t)").random.size(), 1u);
+  EXPECT_EQ(model_of(kCrossed, "y ~ f + (0 + x | f)").random.size(), 1u);
+  EXPECT_EQ(model_of(kCrossed, "y ~ g + (1 | g)", {.variances_given = true}).random.size(), 1u);
+}
+
 TEST(Design, refuses_responses_that_are_no_numbers_or_all_the_same) {
   const Fault text = fault_of([] { model_of("y,x\n1,2\n\"12,5\",3\n", "y ~ x"); });
   EXPECT_EQ(text.line, 3);
   EXPECT_EQ(text.column, 1);
   EXPECT_EQ(text.variable, "y");
   EXPECT_EQ(text.what, "found \"12,5\"");
-  EXPECT_EQ(text.advice, "write a decimal point");
+  EXPECT_EQ(text.advice, "write a decimal point here, and in other cells like it");
   EXPECT_NE(fault_of([] { model_of("y,x\n1,2\n1,3\n", "y ~ x"); }).what.find("is 1 in all rows"), std::string::npos);
   EXPECT_NE(fault_of([] { model_of("y,x\n1,2\n2,3\n", "y ~ x", {.factors = {"y"}}); }).what.find("by option"),
             std::string::npos);
@@ -231,7 +261,48 @@ TEST(Design, refuses_infinite_words_and_values_at_their_cell) {
   const Fault value = fault_of([] { model_of("y,x\n1,2\n2,0\n3,4\n", "y ~ log(x)"); });
   EXPECT_EQ(value.line, 3);
   EXPECT_EQ(value.variable, "log(x)");
-  EXPECT_NE(value.what.find("-inf"), std::string::npos);
+  EXPECT_EQ(value.what, "log(0) is the logarithm of a number that is not positive, where 'x' is \"0\"");
+}
+
+TEST(Design, says_which_part_of_an_expression_has_no_value_and_for_which_cells) {
+  const std::vector<std::array<std::string, 2>> cases{
+      {"log(x - 3)", "log(-2.5) is the logarithm of a number that is not positive, where 'x' is \"0.50\""},
+      {"log2(z) + log10(x - z)",
+       "log10(-3.5) is the logarithm of a number that is not positive, where 'x' is "
+       "\"0.50\" and 'z' is \"4\""},
+      {"log1p(-z)", "log1p(-4) is the logarithm of a number that is not above -1, where 'z' is \"4\""},
+      {"sqrt(x - 1)", "sqrt(-0.5) is the square root of a negative number, where 'x' is \"0.50\""},
+      {"I(1 / (z - 4))", "1 / 0 is a division by zero, where 'z' is \"4\""},
+      {"I((z - 4)^-1)", "0^-1 is a division by zero, where 'z' is \"4\""},
+      {"I((-z)^x)", "-4^0.5 is a negative number to a power that is not whole, where 'z' is \"4\" and 'x' is \"0.50\""},
+      {"exp(1000 * z)", "exp(4000) is too large, where 'z' is \"4\""}};
+  for (const auto& [expression, what] : cases) {
+    const Fault fault = fault_of([&] { model_of("y,x,z\n1,5,0.25\n2,0.50,4\n3,7,0.5\n", "y ~ " + expression); });
+    EXPECT_EQ(fault.what, what);
+    EXPECT_EQ(fault.line, 3) << expression;
+    EXPECT_EQ(fault.column, what.find("'x' is") < what.find("'z' is") ? 3 : 8) << expression;
+  }
+}
+
+TEST(Design, takes_no_numbers_with_decimal_commas_for_levels_however_few_they_are) {
+  const std::string table = "y;dose\n1;0,5\n2;1\n3;0,5\n4;2,5\n5;1\n6;2,5\n";
+  const Fault fault = fault_of([&] { model_of(table, "y ~ dose"); });
+  EXPECT_EQ(fault.line, 2);
+  EXPECT_EQ(fault.column, 3);
+  EXPECT_EQ(fault.what, "found \"0,5\"");
+  EXPECT_NE(fault.advice.find("write a decimal point"), std::string::npos);
+  EXPECT_NE(fault.advice.find("--factor dose"), std::string::npos);
+  EXPECT_EQ(model_of(table, "y ~ dose", {.factors = {"dose"}}).fixed.names,
+            (Strings{"(Intercept)", "dose1", "dose2,5"}));
+  EXPECT_EQ(model_of("y,f\n1,\"a,b\"\n2,3\n3,\"a,b\"\n4,3\n", "y ~ f").fixed.names, (Strings{"(Intercept)", "fa,b"}));
+}
+
+TEST(Design, notes_levels_that_differ_in_capital_letters_only) {
+  const std::string table = "y,f,g\n1,Wheat,p\n2,rye,q\n4,wheat,p\n3,rye,q\n3,wheat,q\n2,rye,p\n1,Wheat,p\n";
+  const Model model = model_of(table, "y ~ f + g");
+  ASSERT_EQ(model.notes.size(), 1u);
+  EXPECT_EQ(model.notes[0],
+            "'f': the levels \"Wheat\" and \"wheat\" differ in capital letters only, and are taken for two");
 }
 
 TEST(Design, refuses_a_slip_in_a_column_of_numbers_unless_it_is_called_a_factor) {
@@ -249,6 +320,16 @@ TEST(Design, refuses_unknown_columns_and_names_the_nearest) {
   EXPECT_EQ(fault.column, 5);
   EXPECT_NE(fault.advice.find("'f'"), std::string::npos);
   EXPECT_EQ(fault_of([] { model_of(kCrossed, "y ~ x", {.weights = "ww"}); }).variable, "ww");
+  const auto advice = [](const std::string& table, const std::string& formula) {
+    return fault_of([&] { model_of(table, formula); }).advice;
+  };
+  EXPECT_EQ(advice("a,b,c\n1,2,3\n", "y ~ x"), "its columns are a, b, c");
+  EXPECT_EQ(advice("p,1.5,7\nq,2.5,8\n", "yield ~ x"),
+            "its first line, p, 1.5, 7, seems to be data: put a line with the names of the columns above it");
+  EXPECT_EQ(advice("block yield\n1 2\n", "yield ~ x"),
+            "its only column is \"block yield\": separate columns with commas, tabs or semicolons");
+  EXPECT_EQ(advice("yield (t/ha),x\n1,2\n", "yield ~ x"),
+            "did you mean 'yield (t/ha)'? In a formula it stands in backquotes: `yield (t/ha)`");
   EXPECT_EQ(fault_of([] { model_of(kCrossed, "y ~ x", {.factors = {"q"}}); }).variable, "q");
 }
 

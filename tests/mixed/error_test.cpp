@@ -22,5 +22,11 @@ TEST(Fault, leaves_out_what_it_does_not_know) {
   EXPECT_EQ(describe({.file = "a.csv", .variable = "g", .what = "has one level"}), "a.csv: 'g': has one level");
 }
 
+TEST(Fault, shows_control_characters_instead_of_sending_them) {
+  EXPECT_EQ(describe({.file = "a\x1b[2Jb.csv", .variable = "x\ny", .what = "w\t", .advice = "\x7f"}),
+            "a\\x1b[2Jb.csv: 'x\\x0ay': w\\x09; \\x7f");
+  EXPECT_EQ(describe({.what = "naïve", .excerpt = "  y ~\n   ^"}), "naïve\n  y ~\n   ^");
+}
+
 }  // namespace
 }  // namespace sm::mixed::test

@@ -226,6 +226,22 @@ TEST(FittingNearSingularity, keeps_the_criterion_of_an_intrinsic_field_exact) {
   }
 }
 
+// Pivots that are small but real, of effects so large that the criterion feels them.
+TEST(FittingNearSingularity, takes_no_small_pivot_of_large_effects_for_none) {
+  LoadedModule loaded;
+  const Model model = random_model(
+      {.rows = 90, .intercept = false, .terms = {{.coefs = 2, .levels = 60, .field = Field::ring, .sd = 100.0}}}, 3);
+  const DenseOracle oracle(model);
+  for (double size = 1e-3; size > 1e-8; size /= 2.1) {
+    FitOptions options;
+    options.variances = {1.0, -0.5, 0.25 + size * size, 1.5};
+    VectorL variances(4);
+    for (std::size_t i = 0; i < 4; ++i) variances(static_cast<Eigen::Index>(i)) = options.variances[i];
+    const Fit given = fit(model, loaded.module(), options);
+    EXPECT_NEAR(given.criterion, static_cast<double>(oracle.criterion(variances, true)), 1e-5) << size;
+  }
+}
+
 TEST(FittingUnits, says_that_random_effects_explain_every_observation) {
   LoadedModule loaded;
   Model model = random_model({.rows = 60, .noise = 0.0, .terms = {{.levels = 8, .sd = 2.0}}}, 1);

@@ -93,6 +93,8 @@ TEST(Formula, refuses_what_is_no_formula_at_its_place) {
   expect_refused("~ x", 1, "no response");
   expect_refused("y", 2, "no tilde");
   expect_refused("y x ~ z", 3, "\"x\"");
+  expect_refused("", 1, "the formula is empty");
+  EXPECT_EQ(fault_of([] { parse_formula(""); }).file, "formula");
   expect_refused("y ~", 4, "no term");
   expect_refused("y ~ x ~ z", 7, "second tilde");
   expect_refused("y ~ x +", 8, "the end");

@@ -19,7 +19,8 @@ Numbers row_of(const std::string& contrast, const std::string& formula, const De
 
 TEST(NewRows, of_the_models_own_data_are_its_rows) {
   for (const Contrasts contrasts : {Contrasts::treatment, Contrasts::sum}) {
-    const Model model = model_of(kTable, "y ~ f*g + I(x^2) + (x | g) + (1 | f:g)", {.contrasts = contrasts});
+    const Model model =
+        model_of(kTable, "y ~ f*g + I(x^2) + (x | g) + (1 | f:g)", {.contrasts = contrasts, .variances_given = true});
     const NewRows rows = new_rows(*model.recipe, table_of(kTable));
     EXPECT_EQ(dense(rows.x), dense(model.fixed.x));
     ASSERT_EQ(rows.random.size(), model.random.size());
@@ -42,7 +43,8 @@ TEST(NewRows, need_no_response_no_order_of_columns_and_not_all_levels) {
 }
 
 TEST(NewRows, match_levels_of_numbers_by_value) {
-  const Model model = model_of("y,k\n1,1\n2,2\n3,1\n5,2\n", "y ~ k + (1 | k)", {.factors = {"k"}});
+  const Model model =
+      model_of("y,k\n1,1\n2,2\n3,1\n5,2\n", "y ~ k + (1 | k)", {.factors = {"k"}, .variances_given = true});
   const NewRows rows = new_rows(*model.recipe, table_of("k\n2.0\n01\n"));
   EXPECT_EQ(dense(rows.x), (std::vector<Numbers>{{1, 1}, {1, 0}}));
   EXPECT_EQ(rows.random[0].level, (Indices{1, 0}));

@@ -106,6 +106,22 @@ TEST_F(MatrixPrecision, that_is_regular_has_no_null_space) {
   }
 }
 
+// The least eigenvalue is that of the mean, and far above what rounding makes of a null one.
+TEST_F(MatrixPrecision, with_a_tiny_eigenvalue_is_not_taken_for_singular) {
+  for (const double tiny : {1e-2, 1e-4, 1e-6, 1e-7}) {
+    for (std::uint64_t seed = 1; seed <= 3; ++seed) {
+      MatrixXd m = graph_laplacian(30, 1, seed);
+      m.diagonal().array() += tiny;
+      const Precision k = precision(m);
+      EXPECT_EQ(k.nullity, 0) << tiny;
+      EXPECT_TRUE(k.null_rows.empty()) << tiny;
+      const Eigen::VectorXd values = m.selfadjointView<Eigen::Lower>().eigenvalues();
+      ASSERT_NEAR(values.minCoeff() / tiny, 1.0, 1e-6);
+      EXPECT_NEAR(k.log_det, values.array().log().sum(), 1e-6) << tiny;
+    }
+  }
+}
+
 TEST_F(MatrixPrecision, of_a_connected_graph_leaves_the_mean_open) {
   for (std::uint64_t seed = 1; seed <= 5; ++seed) {
     expect_as_eigenvalues_say(graph_laplacian(30 + static_cast<int>(seed), 1, seed), 1);

@@ -40,6 +40,8 @@ TEST(RowIds, are_read_from_a_file_or_counted) {
   const std::string path = ::testing::TempDir() + "qxsm_ids.txt";
   std::ofstream(path) << "x\r\ny z\r\n7";
   EXPECT_EQ(read_row_ids(path, 3), (std::vector<std::string>{"x", "y z", "7"}));
+  std::ofstream(path) << "\xef\xbb\xbfx\ny\n";
+  EXPECT_EQ(read_row_ids(path, 2), (std::vector<std::string>{"x", "y"}));
   std::ofstream(path).close();
   EXPECT_THROW(read_row_ids(path, 3), ModelError);
   std::filesystem::remove(path);

@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include <map>
+
 #include "mixed/example_fit.hpp"
 #include "mixed/text.hpp"
 #include "mixed/xml.hpp"
@@ -60,6 +62,30 @@ TEST(SvgText, is_cut_in_the_middle_to_the_width_there_is) {
   EXPECT_NE(cut.find("…"), std::string::npos);
   EXPECT_EQ(svg::fitted("two\nlines", 10.0, 500.0), "two\\nlines");
   for (const std::string& name : hostile_names()) EXPECT_LE(svg::text_width(svg::fitted(name, 9.0, 80.0), 9.0), 80.0);
+}
+
+TEST(SvgText, is_cut_around_what_tells_names_apart_that_would_look_alike) {
+  const std::vector<std::string> names{"Experimental station Höhe, upper terrace, bed 01 of the long-term trial",
+                                       "Experimental station Höhe, upper terrace, bed 02 of the long-term trial",
+                                       "Experimental station Höhe, upper terrace, bed 13 of the long-term trial",
+                                       "short", "Another station of the same length, or nearly, in another country"};
+  const std::vector<std::string> shown = svg::told_apart(names, 10.0, 120.0);
+  ASSERT_EQ(shown.size(), names.size());
+  for (const auto& [place, number] : std::map<std::size_t, std::string>{{0, "bed 01"}, {1, "bed 02"}, {2, "bed 13"}}) {
+    EXPECT_NE(shown[place].find(number), std::string::npos) << shown[place];
+    EXPECT_TRUE(shown[place].starts_with("…") && shown[place].ends_with("…")) << shown[place];
+  }
+  for (const std::string& text : shown) EXPECT_LE(svg::text_width(text, 10.0), 120.0) << text;
+  EXPECT_EQ(shown[3], "short");
+  EXPECT_EQ(shown[4], svg::fitted(names[4], 10.0, 120.0));
+  const std::vector<std::string> twice{names[0], names[0]};  // the same name twice stays the same
+  EXPECT_EQ(svg::told_apart(twice, 10.0, 120.0)[1], svg::fitted(names[0], 10.0, 120.0));
+  for (const std::string& name : hostile_names()) {
+    for (const std::string& text : svg::told_apart({name + "a", name + "b"}, 9.0, 80.0)) {
+      EXPECT_LE(svg::text_width(text, 9.0), 80.0) << text;
+      EXPECT_EQ(parsed_xml("<a>" + svg::escaped(text) + "</a>").fault, "");
+    }
+  }
 }
 
 TEST(SvgText, has_coordinates_to_a_hundredth) {

@@ -117,12 +117,21 @@ TEST(Table, refuses_ragged_rows_with_their_place) {
   expect_fault("a,b,c\n1,2,3\n4,5\n", 3, 4, "found 2 fields");
   expect_fault("a,b\n1,2\n\n4,5,6\n", 4, 5, "found 3 fields");
   EXPECT_EQ(fault_of([] { table_of("a,b,c\n4,5\n"); }).variable, "c");
+  const auto advice = [](const std::string& text) { return fault_of([&] { table_of(text); }).advice; };
+  EXPECT_EQ(advice("g,x,y\na,12,5,3\n"), "if 12,5 is one number, write it with a decimal point: 12.5");
+  EXPECT_EQ(advice("g,x,y\na,1.5,-12,5\n"), "if -12,5 is one number, write it with a decimal point: -12.5");
+  EXPECT_EQ(advice("g,x\na,b,2\n"), "put a field that holds the delimiter in quotes");
+  EXPECT_EQ(advice("g;x\na;1;2\n"), "put a field that holds the delimiter in quotes");
+  EXPECT_EQ(advice("Trial of 2024\ng,x\na,1\n"), "if the first line is a title, take it away");
 }
 
 TEST(Table, refuses_headers_without_a_name_of_its_own_for_each_column) {
   expect_fault("a,,c\n1,2,3\n", 1, 3, "column 2 has no name");
   expect_fault("a,b,a\n1,2,3\n", 1, 5, "columns 1 and 3 have the same name");
   expect_fault("\n1,2.5,-3\n4,5,6\n", 2, 1, "nothing but numbers");
+  expect_fault("1,NA,1\n4,5,6\n", 1, 1, "nothing but numbers");  // before it is one name twice, or none
+  EXPECT_NE(fault_of([] { table_of("a,b,\n1,2,\n"); }).advice.find("end of the lines"), std::string::npos);
+  EXPECT_NE(fault_of([] { table_of(",a,b\n1,2,3\n"); }).advice.find("without row names"), std::string::npos);
 }
 
 TEST(Table, refuses_quotes_that_are_open_or_misplaced) {
@@ -170,10 +179,43 @@ TEST(Table, refuses_files_that_are_not_there_cut_off_or_not_text) {
   EXPECT_EQ(fault.column, 3);
 }
 
+TEST(Table, refuses_bytes_that_are_not_utf8_at_their_place) {
+  const auto refused = [](const std::string& bytes) {
+    const TemporaryFile file("bytes.csv");
+    std::ofstream(file.path(), std::ios::binary) << bytes;
+    return fault_of([&] { Table::read(file.path()); });
+  };
+  const Fault latin = refused(
+      "n\xc3\xa4me,b\r\n1234567890,2\r\nMei\xdf"
+      "en,3\r\n");
+  EXPECT_EQ(latin.line, 3);
+  EXPECT_EQ(latin.column, 4);
+  EXPECT_EQ(latin.what, "found the byte 0xdf, which is no character of UTF-8");
+  EXPECT_NE(latin.advice.find("iconv"), std::string::npos);
+  const Fault utf16 =
+      refused(std::string("\xff\xfe"
+                          "a\0,\0b\0\n\0",
+                          10));
+  EXPECT_EQ(utf16.line, 1);
+  EXPECT_EQ(utf16.column, 1);
+  EXPECT_NE(utf16.advice.find("UTF-16"), std::string::npos);
+  // A character cut short by the end, by a byte of value 0, and the long way to write a slash.
+  EXPECT_EQ(refused("a,b\n1,2\n3,\xe2\x82").column, 3);
+  EXPECT_EQ(refused(std::string("a,b\n1,\xe2\x82\0\n", 10)).what,
+            "found the byte 0xe2, which is no character of UTF-8");
+  EXPECT_EQ(refused("a,b\n1,\xc0\xaf\n").line, 2);
+  const TemporaryFile good("good.csv");
+  std::ofstream(good.path(), std::ios::binary)
+      << "\xef\xbb\xbfg,x\n\xe2\x82\xac,1\n\xf0\x9f\x8c\xbe,2\nabcdefghijk\xc3\xbc,3\n";
+  EXPECT_EQ(Table::read(good.path()).find("g")->labels,
+            (Strings{"\xe2\x82\xac", "\xf0\x9f\x8c\xbe", "abcdefghijk\xc3\xbc"}));
+}
+
 TEST(Words, finds_the_name_that_was_meant_and_no_other) {
   EXPECT_EQ(nearest_name("subject", {"Days", "Subject", "Reaction"}), "Subject");
   EXPECT_EQ(nearest_name("nitr", {"yield", "nitro"}), "nitro");
   EXPECT_EQ(nearest_name("zzzz", {"yield", "nitro"}), "");
+  EXPECT_EQ(nearest_name("hight", {"light", "height"}), "height");  // one letter from both
 }
 
 TEST(Words, prints_numbers_in_full_and_cuts_long_text) {
