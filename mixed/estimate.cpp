@@ -149,7 +149,6 @@ class Fitter {
   void search() {
     SearchOptions options;
     options.max_iterations = options_.max_iterations;
-    options.from_afar = options_.start.empty();
     options.derivative_free = options_.derivative_free;
     options.progress = options_.progress;
     Optimum optimum = find_optimum(likelihood_, start_factors(design_, options_), options);
@@ -165,7 +164,7 @@ class Fitter {
     say_exact(factors);
     AtOptimum at_optimum{optimum.parameters, factors, variance, {}};
     if (fit_.convergence == Convergence::converged) {
-      at_optimum.covariance = observed_covariance(likelihood_, optimum.parameters, optimum.values, variance);
+      at_optimum.covariance = observed_covariance(likelihood_, optimum, variance);
       set_observed_information(design_, optimum.parameters, optimum.values, variance, at_optimum.covariance, fit_);
       parts = evaluate(factors);
       set_average_information(likelihood_, optimum.parameters, optimum.values, variance, fit_);

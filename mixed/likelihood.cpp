@@ -43,6 +43,19 @@ bool Likelihood::factor_random(const Factors& factors) {
 }
 
 CriterionParts Likelihood::evaluate(const Factors& factors, bool with_gradient) {
+  if (!last_.defined || factors != last_factors_) {
+    last_ = {};
+    last_factors_ = factors;
+    last_ = value(factors);
+  }
+  if (!last_.defined || !with_gradient || last_.s2_gradient.size() == factors.size()) return last_;
+  last_.s2_gradient = gradient_of_squares(factors);
+  last_.log_det_gradient =
+      reml_ ? all_.log_det_gradient(factors, constraint_) : random_->log_det_gradient(factors, random_constraint_);
+  return last_;
+}
+
+CriterionParts Likelihood::value(const Factors& factors) {
   ++evaluations_;
   CriterionParts parts;
   if (!all_.factor(factors, null_space_.superfluous(factors))) {
@@ -52,13 +65,9 @@ CriterionParts Likelihood::evaluate(const Factors& factors, bool with_gradient) 
   constraint_.prepare(all_);
   solved_ = solve_response(design_.y(), factors);
   parts.s2 = sum_of_squares();
-  if (with_gradient) parts.s2_gradient = gradient_of_squares(factors);
-
   if (!reml_ && !factor_random(factors)) return parts;
-  Equations& determinant = reml_ ? all_ : *random_;
-  const Constraint& constraint = reml_ ? constraint_ : random_constraint_;
-  parts.log_det = constants_ + determinant.log_det() + constraint.log_det();
-  if (with_gradient) parts.log_det_gradient = determinant.log_det_gradient(factors, constraint);
+  parts.log_det =
+      constants_ + (reml_ ? all_.log_det() + constraint_.log_det() : random_->log_det() + random_constraint_.log_det());
   parts.defined = std::isfinite(parts.log_det) && parts.s2 > 0.0;
   return parts;
 }

@@ -27,7 +27,7 @@ class Likelihood {
  public:
   Likelihood(Module& module, const ScaledDesign& design, bool reml);
 
-  // The last evaluation leaves its factor and its solution.
+  // The last evaluation leaves its factor and its solution; once more at the same factors costs nothing.
   CriterionParts evaluate(const Factors& factors, bool with_gradient);
   double degrees() const { return degrees_; }
   double profiled(const CriterionParts& parts) const;
@@ -57,6 +57,7 @@ class Likelihood {
   std::int64_t evaluations() const { return evaluations_; }
 
  private:
+  CriterionParts value(const Factors& factors);
   double sum_of_squares() const;
   Factors gradient_of_squares(const Factors& factors);
 
@@ -73,6 +74,8 @@ class Likelihood {
   Constraint constraint_;
   Constraint random_constraint_;
   Solution solved_;
+  Factors last_factors_;
+  CriterionParts last_;  // not defined before the first evaluation, and after one without a result
   std::string doubt_;
   std::int64_t evaluations_ = 0;
 };
