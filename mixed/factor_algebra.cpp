@@ -31,6 +31,12 @@ Dense inverse_of_triangle(const Dense& upper, std::size_t n) {
 
 Dense inverse_of(const Dense& a, std::size_t n) { return dense(map(a, n).fullPivLu().inverse()); }
 
+std::optional<Dense> cholesky_factor(const Dense& symmetric, std::size_t n) {
+  const Eigen::LLT<Eigen::MatrixXd> llt(map(symmetric, n));
+  if (llt.info() != Eigen::Success) return std::nullopt;
+  return dense(Eigen::MatrixXd(llt.matrixL()));
+}
+
 // Rows are made orthogonal one after the other; a row within the span of those before it gets no column of its own.
 Dense lower_factor(const Dense& factor, std::size_t n) {
   const Map f = map(factor, n);

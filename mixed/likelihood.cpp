@@ -33,7 +33,7 @@ Likelihood::Likelihood(Module& module, const ScaledDesign& design, bool reml)
 }
 
 bool Likelihood::factor_random(const Factors& factors) {
-  if (!random_) random_ = std::make_unique<Equations>(module_, design_, gram_, Part::random);
+  if (!random_) random_ = std::make_unique<Equations>(all_, Part::random);
   if (!random_->factor(factors, random_null_space_.superfluous(factors))) {
     doubt_ = random_->doubt();
     return false;
@@ -63,7 +63,7 @@ CriterionParts Likelihood::value(const Factors& factors) {
     return parts;
   }
   constraint_.prepare(all_);
-  solved_ = solve_response(design_.y(), factors);
+  solved_ = solve_response(design_.y(), factors, 1);
   parts.s2 = sum_of_squares();
   if (!reml_ && !factor_random(factors)) return parts;
   parts.log_det =
@@ -88,12 +88,13 @@ double Likelihood::at_variance(const CriterionParts& parts, double variance) con
   return degrees_ * std::log(2.0 * std::numbers::pi * variance) + parts.log_det + parts.s2 / variance;
 }
 
-// One step of iterative refinement, with the residual of the equations taken from the observations.
-Likelihood::Solution Likelihood::solve_response(std::span<const double> response, const Factors& factors) {
+// The residual of the equations is taken from the observations.
+Likelihood::Solution Likelihood::solve_response(std::span<const double> response, const Factors& factors,
+                                                int refinements) {
   Solution solution;
   solution.unknowns.assign(at(design_.unknowns()), 0.0);
   solution.residual.assign(response.begin(), response.end());
-  for (int step = 0; step < 2; ++step) {
+  for (int step = 0; step <= refinements; ++step) {
     std::vector<double> weighted = solution.residual;
     design_.weigh(weighted);
     std::vector<double> right = design_.transposed_product(weighted);

@@ -34,12 +34,13 @@ class Likelihood {
   Factors profiled_gradient(const CriterionParts& parts) const;
   double at_variance(const CriterionParts& parts, double variance) const;
 
-  // For another response in place of y, at the last factors: unknowns and residuals.
+  // For another response in place of y, at the last factors: unknowns and residuals. Sums of squares of a solution err
+  // by the square of its error, without refinement too.
   struct Solution {
     std::vector<double> unknowns;
     std::vector<double> residual;
   };
-  Solution solve_response(std::span<const double> response, const Factors& factors);
+  Solution solve_response(std::span<const double> response, const Factors& factors, int refinements);
 
   const ScaledDesign& design() const { return design_; }
   const Gram& gram() const { return gram_; }

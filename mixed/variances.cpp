@@ -286,7 +286,7 @@ class AverageInformation {
 
  private:
   void add(std::vector<double> working) {
-    Likelihood::Solution solved = likelihood_.solve_response(working, factors_);
+    Likelihood::Solution solved = likelihood_.solve_response(working, factors_, 0);
     residuals_.push_back(std::move(solved.residual));
     solutions_.push_back(std::move(solved.unknowns));
   }
