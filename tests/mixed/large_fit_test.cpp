@@ -32,6 +32,22 @@ TEST(LargeFit, ends_at_one_place_wherever_it_begins) {
   }
 }
 
+// Of crossed factors sums of squares between levels tell the variances well.
+TEST(LargeFit, begins_near_the_optimum) {
+  LoadedModule loaded;
+  const ModelShape shape{.rows = 4000, .terms = {{.levels = 300, .sd = 0.3}, {.levels = 40, .sd = 3.0}}};
+  const Model model = random_model(shape, 1);
+  const Fit fitted = fit(model, loaded.module());
+  FitOptions plain;
+  plain.start = {1.0, 1.0};
+  const Fit from_one = fit(model, loaded.module(), plain);
+  ASSERT_EQ(fitted.convergence, Convergence::converged);
+  ASSERT_EQ(from_one.convergence, Convergence::converged);
+  EXPECT_NEAR(fitted.criterion, from_one.criterion, 1e-9 * std::abs(from_one.criterion));
+  EXPECT_LT(fitted.iterations.front().criterion - fitted.criterion,
+            0.1 * (from_one.iterations.front().criterion - fitted.criterion));
+}
+
 // With the first factor eliminated the second is full, and nothing else has filled in.
 TEST(LargeFit, of_crossed_factors_has_no_more_fill_than_the_square_of_the_smaller_one) {
   LoadedModule loaded;
