@@ -16,7 +16,7 @@ std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
 TEST(LargeFit, ends_at_one_place_wherever_it_begins) {
   LoadedModule loaded;
-  const ModelShape shape{.rows = 9000, .terms = {{.coefs = 2, .levels = 1600, .sd = 0.3}, {.levels = 40, .sd = 3.0}}};
+  const ModelShape shape{.rows = 3000, .terms = {{.coefs = 2, .levels = 500, .sd = 0.3}, {.levels = 40, .sd = 3.0}}};
   const Model model = random_model(shape, 1);
   const Fit expected = fit(model, loaded.module());
   ASSERT_EQ(expected.convergence, Convergence::converged);
