@@ -11,8 +11,7 @@ std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 }  // namespace
 
 Likelihood::Likelihood(Module& module, const ScaledDesign& design, bool reml)
-    : module_(module),
-      design_(design),
+    : design_(design),
       gram_(design),
       reml_(reml),
       degrees_(static_cast<double>(design.rows() - (reml ? design.model().fixed.rank() : 0))),

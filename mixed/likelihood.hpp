@@ -62,7 +62,6 @@ class Likelihood {
   double sum_of_squares() const;
   Factors gradient_of_squares(const Factors& factors);
 
-  Module& module_;
   const ScaledDesign& design_;
   Gram gram_;
   bool reml_;
