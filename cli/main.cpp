@@ -1,5 +1,6 @@
 // qxsm: the operations of the module on matrices in files.
 #include <fmt/core.h>
+#include <malloc.h>
 #include <unistd.h>
 
 #include <csignal>
@@ -83,4 +84,11 @@ int run_guarded(int argc, const char* const* argv) {
 
 }  // namespace sm::cli
 
-int main(int argc, char** argv) { return sm::cli::run_guarded(argc, argv); }
+int main(int argc, char** argv) {
+#ifdef __GLIBC__
+  // Vectors of a fit come and go with each evaluation: given back to the system, their pages would be cleared each time.
+  mallopt(M_MMAP_THRESHOLD, 32 << 20);
+  mallopt(M_TRIM_THRESHOLD, 256 << 20);
+#endif
+  return sm::cli::run_guarded(argc, argv);
+}

@@ -1,5 +1,6 @@
 // The order in which the unknowns are eliminated: that of minimum degree, or the term with most levels first.
 #include <algorithm>
+#include <iterator>
 #include <memory>
 
 #include "mixed/equations.hpp"
@@ -71,6 +72,18 @@ void Equations::order_rows() {
 void Equations::prepare_factor(SmMatrix* matrix) {
   module_.expect_ok(module_.qxsmreorder(matrix), "ordering the mixed-model equations");
   module_.expect_ok(module_.qxsmsymbfact(matrix), "finding the structure of the factor");
+}
+
+void Equations::order_like(const Equations& all) {
+  if (order_ > 0) {
+    std::vector<std::int64_t> perm;
+    perm.reserve(at(order_));
+    std::copy_if(all.matrix_->perm, all.matrix_->perm + all.order_, std::back_inserter(perm),
+                 [&](std::int64_t unknown) { return unknown < order_; });
+    module_.expect_ok(module_.qxsmorder(matrix_, perm.data()), "ordering the mixed-model equations");
+  }
+  prepare_factor(matrix_);
+  if (order_ > 0) flops_ = facts().flops;
 }
 
 // Levels of one term without a precision do not meet in the equations: eliminated first, they fill in nothing but the

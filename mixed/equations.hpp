@@ -25,6 +25,8 @@ class Equations {
  public:
   // Throws through Module::expect_ok. Keeps references to all three.
   Equations(Module& module, const ScaledDesign& design, const Gram& gram, Part part);
+  // Of the random effects alone, in the order that `all` has them in: that fills in no more than there.
+  Equations(const Equations& all, Part part);
   ~Equations();
   Equations(const Equations&) = delete;
   Equations& operator=(const Equations&) = delete;
@@ -63,7 +65,9 @@ class Equations {
   void forget_inverse();
 
  private:
+  Equations(Module& module, const ScaledDesign& design, const Gram& gram, Part part, const Equations* all);
   SmMatrix* assemble();
+  void order_like(const Equations& all);
   void order_rows();
   void prepare_factor(SmMatrix* matrix);
   void order_and_analyse();

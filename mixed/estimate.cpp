@@ -65,6 +65,59 @@ Factors to_scaled(const ScaledDesign& design, Factors factors) {
   return factors;
 }
 
+// The variance between the levels of a term, for each of its coefficients alone, everything else taken for noise: the
+// sums of squares of a one-way layout (Henderson 1953). Negative where the data have next to no second record of a level.
+std::vector<double> variances_between(const ScaledDesign& design, const DesignTerm& term, double total) {
+  const auto k = at(term.k);
+  std::vector<double> square(at(term.levels) * k, 0.0);
+  std::vector<double> product(square.size(), 0.0);
+  for (std::size_t i = 0; i < at(design.rows()); ++i) {
+    for (std::size_t c = 0; c < k; ++c) {
+      const double z = term.z[i * k + c];
+      square[at((*term.level)[i]) * k + c] += design.weight(i) * z * z;
+      product[at((*term.level)[i]) * k + c] += design.weight(i) * z * design.y()[i];
+    }
+  }
+  std::vector<double> variances;
+  for (std::size_t c = 0; c < k; ++c) {
+    double between = 0.0;
+    double levels = 0.0;
+    for (std::size_t l = c; l < square.size(); l += k) {
+      if (square[l] <= 0.0) continue;
+      between += product[l] * product[l] / square[l];
+      levels += 1.0;
+    }
+    const double beyond = static_cast<double>(design.rows()) - levels;
+    variances.push_back(beyond > 0.1 * levels ? (between - levels * total) / beyond : -1.0);
+  }
+  return variances;
+}
+
+// Where nothing better is known the search begins with variances like that of the residuals.
+Factors moment_factors(const ScaledDesign& design) {
+  double total = 0.0;
+  for (std::size_t i = 0; i < at(design.rows()); ++i) total += design.weight(i) * design.y()[i] * design.y()[i];
+  total /= static_cast<double>(design.rows());
+  std::vector<std::vector<double>> variances;
+  double residual = total;
+  for (const DesignTerm& term : design.terms()) {
+    variances.push_back(variances_between(design, term, total));
+    for (const double variance : variances.back()) residual -= std::max(0.0, variance);
+  }
+  residual = std::max(residual, 0.1 * total);
+  Factors factors;
+  for (const std::vector<double>& of_term : variances) {
+    const std::size_t k = of_term.size();
+    Dense factor(k * k, 0.0);
+    for (std::size_t c = 0; c < k; ++c) {
+      const bool known = of_term[c] > 0.0 && residual > 0.0;
+      factor[c * k + c] = known ? std::clamp(std::sqrt(of_term[c] / residual), 0.1, 10.0) : 1.0;
+    }
+    factors.push_back(std::move(factor));
+  }
+  return factors;
+}
+
 Factors start_factors(const ScaledDesign& design, const FitOptions& options) {
   if (!options.start.empty()) {
     Factors factors = to_scaled(design, unpacked(design.model(), options.start, false));
@@ -75,14 +128,7 @@ Factors start_factors(const ScaledDesign& design, const FitOptions& options) {
     }
     return factors;
   }
-  Factors factors;
-  for (const DesignTerm& term : design.terms()) {
-    const auto k = at(term.k);
-    Dense factor(k * k, 0.0);
-    for (std::size_t c = 0; c < k; ++c) factor[c * k + c] = 1.0;
-    factors.push_back(std::move(factor));
-  }
-  return factors;
+  return moment_factors(design);
 }
 
 Factors given_factors(const ScaledDesign& design, const FitOptions& options) {
@@ -150,7 +196,6 @@ class Fitter {
   void search() {
     SearchOptions options;
     options.max_iterations = options_.max_iterations;
-    options.from_afar = options_.start.empty();
     options.derivative_free = options_.derivative_free;
     options.progress = options_.progress;
     Optimum optimum = find_optimum(likelihood_, start_factors(design_, options_), options);
@@ -167,7 +212,7 @@ class Fitter {
     refuse_exact(parts);
     AtOptimum at_optimum{optimum.parameters, factors, variance, {}};
     if (fit_.convergence == Convergence::converged) {
-      at_optimum.covariance = observed_covariance(likelihood_, optimum.parameters, optimum.values, variance);
+      at_optimum.covariance = observed_covariance(likelihood_, optimum, variance);
       set_observed_information(design_, optimum.parameters, optimum.values, variance, at_optimum.covariance, fit_);
       parts = evaluate(factors);
       set_average_information(likelihood_, optimum.parameters, optimum.values, variance, fit_);

@@ -46,6 +46,19 @@ Dense inverse_of_triangle(const Dense& upper, std::size_t n) {
   return inverse;
 }
 
+// By columns, each less what those before it have for it.
+std::optional<Dense> cholesky_factor(const Dense& symmetric, std::size_t n) {
+  Dense lower(n * n, 0.0);
+  for (std::size_t j = 0; j < n; ++j) {
+    std::copy(&symmetric[j * n] + j, &symmetric[j * n] + n, &lower[j * n] + j);
+    const std::span<double> left = column(lower, j, n).subspan(j);
+    for (std::size_t l = 0; l < j; ++l) subtract(lower[l * n + j], column(lower, l, n).subspan(j), left);
+    if (!(left[0] > 0.0)) return std::nullopt;
+    divide(left, std::sqrt(left[0]));
+  }
+  return lower;
+}
+
 // Rows are made orthogonal one after the other; a row within the span of those before it gets no column of its own.
 Dense lower_factor(const Dense& factor, std::size_t n) {
   Dense rows = transposed(factor, n, n);

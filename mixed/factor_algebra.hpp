@@ -10,6 +10,8 @@ namespace sm::mixed {
 Dense multiplied(const Dense& a, const Dense& b, std::size_t n);             // A B
 Dense multiplied_transposed(const Dense& a, const Dense& b, std::size_t n);  // A B'
 Dense inverse_of_triangle(const Dense& upper, std::size_t n);
+// L with L L' = the matrix; none where it is not positive definite.
+std::optional<Dense> cholesky_factor(const Dense& symmetric, std::size_t n);
 
 // The lower triangular L with L L' = F F' and a diagonal that is not negative; zeros where F F' is singular.
 Dense lower_factor(const Dense& factor, std::size_t n);

@@ -11,8 +11,7 @@ std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 }  // namespace
 
 Likelihood::Likelihood(Module& module, const ScaledDesign& design, bool reml)
-    : module_(module),
-      design_(design),
+    : design_(design),
       gram_(design),
       reml_(reml),
       degrees_(static_cast<double>(design.rows() - (reml ? design.model().fixed.rank() : 0))),
@@ -33,7 +32,7 @@ Likelihood::Likelihood(Module& module, const ScaledDesign& design, bool reml)
 }
 
 bool Likelihood::factor_random(const Factors& factors) {
-  if (!random_) random_ = std::make_unique<Equations>(module_, design_, gram_, Part::random);
+  if (!random_) random_ = std::make_unique<Equations>(all_, Part::random);
   if (!random_->factor(factors, random_null_space_.superfluous(factors))) {
     doubt_ = random_->doubt();
     return false;
@@ -43,6 +42,19 @@ bool Likelihood::factor_random(const Factors& factors) {
 }
 
 CriterionParts Likelihood::evaluate(const Factors& factors, bool with_gradient) {
+  if (!last_.defined || factors != last_factors_) {
+    last_ = {};
+    last_factors_ = factors;
+    last_ = value(factors);
+  }
+  if (!last_.defined || !with_gradient || last_.s2_gradient.size() == factors.size()) return last_;
+  last_.s2_gradient = gradient_of_squares(factors);
+  last_.log_det_gradient =
+      reml_ ? all_.log_det_gradient(factors, constraint_) : random_->log_det_gradient(factors, random_constraint_);
+  return last_;
+}
+
+CriterionParts Likelihood::value(const Factors& factors) {
   ++evaluations_;
   CriterionParts parts;
   if (!all_.factor(factors, null_space_.superfluous(factors))) {
@@ -50,15 +62,11 @@ CriterionParts Likelihood::evaluate(const Factors& factors, bool with_gradient) 
     return parts;
   }
   constraint_.prepare(all_);
-  solved_ = solve_response(design_.y(), factors);
+  solved_ = solve_response(design_.y(), factors, 1);
   parts.s2 = sum_of_squares();
-  if (with_gradient) parts.s2_gradient = gradient_of_squares(factors);
-
   if (!reml_ && !factor_random(factors)) return parts;
-  Equations& determinant = reml_ ? all_ : *random_;
-  const Constraint& constraint = reml_ ? constraint_ : random_constraint_;
-  parts.log_det = constants_ + determinant.log_det() + constraint.log_det();
-  if (with_gradient) parts.log_det_gradient = determinant.log_det_gradient(factors, constraint);
+  parts.log_det =
+      constants_ + (reml_ ? all_.log_det() + constraint_.log_det() : random_->log_det() + random_constraint_.log_det());
   parts.defined = std::isfinite(parts.log_det) && parts.s2 > 0.0;
   return parts;
 }
@@ -79,12 +87,13 @@ double Likelihood::at_variance(const CriterionParts& parts, double variance) con
   return degrees_ * std::log(2.0 * std::numbers::pi * variance) + parts.log_det + parts.s2 / variance;
 }
 
-// One step of iterative refinement, with the residual of the equations taken from the observations.
-Likelihood::Solution Likelihood::solve_response(std::span<const double> response, const Factors& factors) {
+// The residual of the equations is taken from the observations.
+Likelihood::Solution Likelihood::solve_response(std::span<const double> response, const Factors& factors,
+                                                int refinements) {
   Solution solution;
   solution.unknowns.assign(at(design_.unknowns()), 0.0);
   solution.residual.assign(response.begin(), response.end());
-  for (int step = 0; step < 2; ++step) {
+  for (int step = 0; step <= refinements; ++step) {
     std::vector<double> weighted = solution.residual;
     design_.weigh(weighted);
     std::vector<double> right = design_.transposed_product(weighted);
@@ -102,13 +111,15 @@ Likelihood::Solution Likelihood::solve_response(std::span<const double> response
 }
 
 double Likelihood::sum_of_squares() const {
-  long double sum = 0.0L;
+  // In sums that do not wait for each other.
+  constexpr std::size_t kSums = 4;
+  long double sums[kSums] = {};
   for (std::size_t i = 0; i < solved_.residual.size(); ++i)
-    sum += design_.weight(i) * solved_.residual[i] * solved_.residual[i];
+    sums[i % kSums] += design_.weight(i) * solved_.residual[i] * solved_.residual[i];
   std::vector<double> product(solved_.unknowns.size(), 0.0);
   add_precision_product(design_, solved_.unknowns, 1.0, product);
-  for (std::size_t i = 0; i < at(design_.random_count()); ++i) sum += product[i] * solved_.unknowns[i];
-  return static_cast<double>(sum);
+  for (std::size_t i = 0; i < at(design_.random_count()); ++i) sums[i % kSums] += product[i] * solved_.unknowns[i];
+  return static_cast<double>(sums[0] + sums[1] + (sums[2] + sums[3]));
 }
 
 // The solution minimizes r'Wr + b'Kb, so that only the factors' own part of the derivative is left.

@@ -27,19 +27,20 @@ class Likelihood {
  public:
   Likelihood(Module& module, const ScaledDesign& design, bool reml);
 
-  // The last evaluation leaves its factor and its solution.
+  // The last evaluation leaves its factor and its solution; once more at the same factors costs nothing.
   CriterionParts evaluate(const Factors& factors, bool with_gradient);
   double degrees() const { return degrees_; }
   double profiled(const CriterionParts& parts) const;
   Factors profiled_gradient(const CriterionParts& parts) const;
   double at_variance(const CriterionParts& parts, double variance) const;
 
-  // For another response in place of y, at the last factors: unknowns and residuals.
+  // For another response in place of y, at the last factors: unknowns and residuals. Sums of squares of a solution err
+  // by the square of its error, without refinement too.
   struct Solution {
     std::vector<double> unknowns;
     std::vector<double> residual;
   };
-  Solution solve_response(std::span<const double> response, const Factors& factors);
+  Solution solve_response(std::span<const double> response, const Factors& factors, int refinements);
 
   const ScaledDesign& design() const { return design_; }
   const Gram& gram() const { return gram_; }
@@ -57,10 +58,10 @@ class Likelihood {
   std::int64_t evaluations() const { return evaluations_; }
 
  private:
+  CriterionParts value(const Factors& factors);
   double sum_of_squares() const;
   Factors gradient_of_squares(const Factors& factors);
 
-  Module& module_;
   const ScaledDesign& design_;
   Gram gram_;
   bool reml_;
@@ -73,6 +74,8 @@ class Likelihood {
   Constraint constraint_;
   Constraint random_constraint_;
   Solution solved_;
+  Factors last_factors_;
+  CriterionParts last_;  // not defined before the first evaluation, and after one without a result
   std::string doubt_;
   std::int64_t evaluations_ = 0;
 };

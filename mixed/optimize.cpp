@@ -6,8 +6,7 @@
 #include <utility>
 
 #include "mixed/error.hpp"
-#include "mixed/trust_region.hpp"
-#include "mixed/value_search.hpp"
+#include "mixed/search.hpp"
 
 namespace sm::mixed {
 namespace {
@@ -18,70 +17,15 @@ constexpr double kValueNoise = 1e-8;
 constexpr double kDoubtful = 1e-3;
 // What the gradient alone can be trusted with, in units of the function.
 constexpr double kGradientNoise = 1e-9;
+// Newton decrements below these promise that a step with the true Hessian ends at the minimum: it errs by the square.
+// Of the Hessian from differences where it began not much is lost on the way: nothing that counts where the way is
+// short, and where the Hessian can be approximated, most of the change is seen in the approximation.
+constexpr double kVeryNear = 1e-8;
+constexpr double kNear = 1e-5;
+// Of the tolerance: what one more step is not worth an evaluation for.
+constexpr double kPolished = 1e-3;
 
-double dot(std::span<const double> a, std::span<const double> b) {
-  double sum = 0.0;
-  for (std::size_t i = 0; i < a.size(); ++i) sum += a[i] * b[i];
-  return sum;
-}
-
-double scaled_norm(std::span<const double> p, std::span<const double> scale) {
-  double sum = 0.0;
-  for (std::size_t i = 0; i < p.size(); ++i) sum += p[i] * scale[i] * p[i] * scale[i];
-  return std::sqrt(sum);
-}
-
-std::vector<double> shifted(std::span<const double> x, std::span<const double> p) {
-  std::vector<double> y(x.begin(), x.end());
-  for (std::size_t i = 0; i < y.size(); ++i) y[i] += p[i];
-  return y;
-}
-
-class Search {
- public:
-  Search(const Objective& objective, std::vector<double> start, const MinimiseOptions& options);
-  Minimum run();
-
- private:
-  enum class Ending { converged, stopped, stuck };
-
-  Evaluation evaluate(std::span<const double> x);
-  double natural(std::size_t i) const { return std::max(std::abs(x_[i]), 0.01 * size_); }
-  std::vector<double> naturals() const;
-  double difference_step(std::size_t i) const;
-  void refresh();
-  void keep_radius_in_new_scale(const std::vector<double>& old);
-  std::vector<double> hessian_times(std::span<const double> p) const;
-  void update(std::span<const double> p, std::span<const double> gradient);
-  double shorten(TrialStep& step) const;
-  double decrease(const TrialStep& step, const Evaluation& trial) const;
-  bool mispredicted(const TrialStep& step, std::span<const double> gradient) const;
-  void move(std::span<const double> p, Evaluation&& there);
-  bool report(double step);
-  bool is_minimum(const Spectrum& spectrum);
-  bool leads_down(std::span<const double> direction);
-  bool settled(double tolerance);
-  void polish();
-  bool try_step();
-  Ending newton(int iterations);
-  Ending by_values(ValueMethod method);
-  void search_without_derivatives(Ending& ending);
-
-  const Objective& objective_;
-  const MinimiseOptions& options_;
-  double size_ = 1.0;  // of the largest parameter at the start
-  std::vector<double> x_;
-  Evaluation at_;
-  std::vector<double> hessian_;  // by columns
-  std::vector<double> scale_;
-  double radius_ = 0.0;
-  bool fresh_ = false;  // whether the Hessian is from differences at x_
-  int rejected_ = 0;    // trial steps in a row
-  bool stopped_ = false;
-  std::string name_ = "trust-region Newton";
-  std::vector<Iteration> iterations_;
-  std::int64_t evaluations_ = 0;
-};
+}  // namespace
 
 Search::Search(const Objective& objective, std::vector<double> start, const MinimiseOptions& options)
     : objective_(objective), options_(options), x_(std::move(start)) {
@@ -89,6 +33,7 @@ Search::Search(const Objective& objective, std::vector<double> start, const Mini
   for (const double v : x_) largest = std::max(largest, std::abs(v));
   if (largest > 0.0) size_ = largest;
   at_ = evaluate(x_);
+  here_ = true;
   if (!std::isfinite(at_.value)) {
     throw ModelError({.what = "the criterion has no finite value at the starting values",
                       .advice = "start from other ones (--start), nearer to 1"});
@@ -98,6 +43,7 @@ Search::Search(const Objective& objective, std::vector<double> start, const Mini
 // A value without a gradient is of no use here: such a point counts as outside.
 Evaluation Search::evaluate(std::span<const double> x) {
   ++evaluations_;
+  here_ = false;
   Evaluation e = objective_(x);
   const bool finite = std::isfinite(e.value) &&
                       std::all_of(e.gradient.begin(), e.gradient.end(), [](double g) { return std::isfinite(g); });
@@ -109,68 +55,6 @@ std::vector<double> Search::naturals() const {
   std::vector<double> lengths(x_.size());
   for (std::size_t i = 0; i < lengths.size(); ++i) lengths[i] = natural(i);
   return lengths;
-}
-
-// Where the curvature is known, a small part of the distance over which the function changes by one.
-double Search::difference_step(std::size_t i) const {
-  if (scale_.empty()) return 1e-5 * natural(i);
-  return std::clamp(1e-4 / scale_[i], 1e-7 * natural(i), 1e-3 * natural(i));
-}
-
-// The Hessian from forward differences of the gradient.
-void Search::refresh() {
-  const std::size_t m = x_.size();
-  std::vector<double> h(m * m, 0.0);
-  for (std::size_t j = 0; j < m; ++j) {
-    Evaluation there;
-    std::vector<double> y = x_;
-    y[j] += difference_step(j);
-    there = evaluate(y);
-    if (!std::isfinite(there.value)) {
-      y[j] = x_[j] - difference_step(j);
-      there = evaluate(y);
-    }
-    const double step = y[j] - x_[j];
-    for (std::size_t i = 0; i < m && std::isfinite(there.value); ++i) {
-      const double slope = (there.gradient[i] - at_.gradient[i]) / step;
-      h[j * m + i] += 0.5 * slope;
-      h[i * m + j] += 0.5 * slope;
-    }
-  }
-  hessian_ = std::move(h);
-  fresh_ = true;
-  keep_radius_in_new_scale(std::exchange(scale_, curvature_scale(hessian_, naturals())));
-}
-
-// The radius stands for the same part of the parameters, whatever they are scaled with. At first, for all of them.
-void Search::keep_radius_in_new_scale(const std::vector<double>& old) {
-  const std::vector<double> lengths = naturals();
-  const double now = scaled_norm(lengths, scale_);
-  radius_ = old.empty() ? now : radius_ * now / scaled_norm(lengths, old);
-}
-
-std::vector<double> Search::hessian_times(std::span<const double> p) const {
-  std::vector<double> product(p.size(), 0.0);
-  for (std::size_t j = 0; j < p.size(); ++j) {
-    for (std::size_t i = 0; i < p.size(); ++i) product[i] += hessian_[j * p.size() + i] * p[j];
-  }
-  return product;
-}
-
-// The symmetric update of rank one, which learns negative curvature too.
-void Search::update(std::span<const double> p, std::span<const double> gradient) {
-  std::vector<double> rest = hessian_times(p);
-  double size = 0.0;
-  for (std::size_t i = 0; i < p.size(); ++i) {
-    rest[i] = gradient[i] - at_.gradient[i] - rest[i];
-    size += rest[i] * rest[i] / (scale_[i] * scale_[i]);
-  }
-  const double along = dot(rest, p);
-  if (std::abs(along) <= 1e-8 * std::sqrt(size) * scaled_norm(p, scale_)) return;
-  for (std::size_t j = 0; j < p.size(); ++j) {
-    for (std::size_t i = 0; i < p.size(); ++i) hessian_[j * p.size() + i] += rest[i] * rest[j] / along;
-  }
-  fresh_ = false;
 }
 
 // No parameter goes beyond three times the largest of its past: far out a likelihood is flat, and says nothing.
@@ -210,8 +94,10 @@ bool Search::mispredicted(const TrialStep& step, std::span<const double> gradien
 
 void Search::move(std::span<const double> p, Evaluation&& there) {
   x_ = shifted(x_, p);
-  at_ = std::move(there);
-  fresh_ = false;
+  const Evaluation before = std::exchange(at_, std::move(there));
+  here_ = true;
+  const double length = scaled_norm(p, scale_);
+  fresh_ = fresh_ && length * length <= 4.0 * nearly() && follow_hessian(p, before.gradient);
   rejected_ = 0;
   if (!report(std::sqrt(dot(p, p)))) stopped_ = true;
 }
@@ -254,8 +140,12 @@ bool Search::is_minimum(const Spectrum& spectrum) {
   return true;
 }
 
+// How small a decrement makes the next step with the true Hessian the last one.
+double Search::nearly() const { return approximation_.empty() ? kVeryNear : kNear; }
+
 bool Search::settled(double tolerance) {
-  if (!(newton_decrement(decompose(hessian_, scale_), at_.gradient) <= tolerance)) return false;
+  const double enough = fresh_ ? tolerance : std::max(tolerance, nearly());
+  if (!(newton_decrement(decompose(hessian_, scale_), at_.gradient) <= enough)) return false;
   if (!fresh_) refresh();
   const Spectrum spectrum = decompose(hessian_, scale_);
   return newton_decrement(spectrum, at_.gradient) <= tolerance && is_minimum(spectrum);
@@ -264,6 +154,7 @@ bool Search::settled(double tolerance) {
 // The Hessian at hand makes one more step cheap, and it leaves next to nothing of the gradient.
 void Search::polish() {
   const Spectrum spectrum = decompose(hessian_, scale_);
+  if (here_ && newton_decrement(spectrum, at_.gradient) <= kPolished * options_.tolerance) return;
   const TrialStep step = trust_region_step(spectrum, at_.gradient, radius_);
   Evaluation there = evaluate(shifted(x_, step.p));
   const double noise = kValueNoise * std::max(1.0, std::abs(at_.value));
@@ -271,6 +162,7 @@ void Search::polish() {
   if (!(newton_decrement(spectrum, there.gradient) < 0.25 * newton_decrement(spectrum, at_.gradient))) return;
   x_ = shifted(x_, step.p);
   at_ = std::move(there);
+  here_ = true;
 }
 
 // One trial step; false when there is no way on.
@@ -281,8 +173,12 @@ bool Search::try_step() {
   Evaluation there = evaluate(shifted(x_, step.p));
   const bool finite = std::isfinite(there.value);
   const double ratio = finite && step.predicted > 0.0 ? decrease(step, there) / step.predicted : -1.0;
-  const bool wrong = finite && mispredicted(step, there.gradient);
-  if (finite) update(step.p, there.gradient);
+  // Of a step as short as this only rounding is to be learnt.
+  const bool same = fresh_ && step.length * step.length <= 4.0 * nearly();
+  const bool wrong = finite && !same && mispredicted(step, there.gradient);
+  misjudged_ += wrong ? 1 : 0;
+  const std::vector<double> before = at_.gradient;
+  if (finite && !same) update(step.p, there.gradient, before);
   if (ratio < 0.1) {
     radius_ = 0.25 * step.length;
   } else if (ratio > 0.75 && step.bounded && factor == 1.0) {
@@ -294,15 +190,18 @@ bool Search::try_step() {
   } else {
     ++rejected_;
   }
+  if (stopped_) return true;
+  const bool renewed = accepted && renew_model(step, before);
   // A model that misjudges is made anew, but not twice at one place.
-  if (!stopped_ && wrong && (accepted || rejected_ == 1)) refresh();
+  if (wrong && !renewed && (accepted || rejected_ == (options_.curvature ? 3 : 1))) refresh();
   return true;
 }
 
 Search::Ending Search::newton(int iterations) {
   scale_.clear();
+  correction_.clear();
   rejected_ = 0;
-  refresh();
+  if (!approximate()) refresh();
   if (iterations_.empty() && !report(0.0)) return Ending::stopped;
   for (int k = 0; k < iterations; ++k) {
     if (settled(options_.tolerance)) {
@@ -371,8 +270,6 @@ Minimum Search::run() {
           .iterations = iterations_,
           .evaluations = evaluations_};
 }
-
-}  // namespace
 
 Minimum minimise(const Objective& objective, std::vector<double> start, const MinimiseOptions& options) {
   return Search(objective, std::move(start), options).run();

@@ -23,6 +23,9 @@ struct MinimiseOptions {
   double tolerance = 1e-12;                          // of the Newton decrement g' H^-1 g
   std::function<bool(const Iteration&)> progress{};  // false: stop
   bool derivative_free = false;                      // search by values alone
+  // An approximation of the Hessian, by columns, at the point that was evaluated last, cheaper than an evaluation;
+  // empty where there is none. Steps are taken with it; that a minimum is one is seen from differences all the same.
+  std::function<std::vector<double>()> curvature{};
 };
 
 struct Minimum {

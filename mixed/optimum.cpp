@@ -4,17 +4,16 @@
 #include <cmath>
 #include <limits>
 
+#include "mixed/curvature.hpp"
 #include "mixed/factor_algebra.hpp"
 #include "mixed/optimize.hpp"
 
 namespace sm::mixed {
 namespace {
 
-constexpr double kNear = 0.03;        // singular values that may be zeros
-constexpr double kOutwards = 0.2;     // how far a search goes back inside from a boundary that is none
-constexpr double kCheap = 2e7;        // operations of an evaluation so quick that the search begins several times
-constexpr std::int64_t kMany = 3000;  // unknowns: from so many on the search is worth a better start
-constexpr int kFirstSteps = 3;        // to that
+constexpr double kNear = 0.03;     // singular values that may be zeros
+constexpr double kOutwards = 0.2;  // how far a search goes back inside from a boundary that is none
+constexpr double kCheap = 2e7;     // operations of an evaluation so quick that the search begins several times
 
 class Finder {
  public:
@@ -23,8 +22,7 @@ class Finder {
   Optimum find(const Factors& start) {
     const auto rows = static_cast<double>(likelihood_.design().rows());
     const bool cheap = likelihood_.equations().facts().flops + 200.0 * rows <= kCheap;
-    const bool many = likelihood_.design().unknowns() > kMany;
-    Optimum best = settle(search(Parameters(options_.from_afar && many ? approached(start) : start)));
+    Optimum best = settle(search(Parameters(start)));
     if (!options_.several_starts || !cheap || best.convergence == Convergence::stopped) return best;
     quiet_ = true;
     for (const Factors& other_start : other_starts(start)) {
@@ -63,39 +61,12 @@ class Finder {
     return starts;
   }
 
-  // From afar the criterion is not convex, and Newton's model of it costs an evaluation for each parameter: a few steps
-  // of EM first (Laird and Ware, Biometrics 38 (1982) 963-974). For u = T b with L levels, the mean square of b given y
-  // is M = 1 - T'D / 2L, where D is the gradient by T, and the step that leads to T M M T' is twice as long as EM's.
-  Factors approached(Factors factors) {
-    for (int step = 0; step < kFirstSteps; ++step) {
-      const CriterionParts parts = likelihood_.evaluate(factors, true);
-      if (!parts.defined) break;
-      const Factors gradient = likelihood_.profiled_gradient(parts);
-      for (std::size_t t = 0; t < factors.size(); ++t) {
-        const DesignTerm& term = likelihood_.design().terms()[t];
-        const auto nulls = term.precision ? term.precision->null_rows.size() : 0;
-        const double levels = static_cast<double>(term.levels) - static_cast<double>(nulls);
-        factors[t] = em_step(factors[t], gradient[t], static_cast<std::size_t>(term.k), levels);
-      }
-    }
-    return factors;
-  }
-
-  static Dense em_step(const Dense& factor, const Dense& gradient, std::size_t k, double levels) {
-    Dense moment(k * k, 0.0);
-    for (std::size_t b = 0; b < k; ++b) {
-      for (std::size_t a = 0; a < k; ++a) {
-        double sum = 0.0;
-        for (std::size_t e = 0; e < k; ++e) sum += factor[a * k + e] * gradient[b * k + e];
-        moment[b * k + a] = (a == b ? 1.0 : 0.0) - 0.5 * sum / levels;
-      }
-    }
-    return lower_factor(multiplied(factor, moment, k), k);
-  }
-
   Optimum search(Parameters parameters) {
+    Factors factors;
+    CriterionParts parts;
     const Objective objective = [&](std::span<const double> values) {
-      const CriterionParts parts = likelihood_.evaluate(parameters.factors(values), true);
+      factors = parameters.factors(values);
+      parts = likelihood_.evaluate(factors, true);
       Evaluation evaluation{.value = std::numeric_limits<double>::infinity(), .gradient = {}};
       evaluation.gradient.assign(values.size(), 0.0);
       if (!parts.defined) return evaluation;
@@ -106,11 +77,13 @@ class Finder {
     MinimiseOptions options;
     options.max_iterations = options_.max_iterations;
     options.derivative_free = options_.derivative_free;
+    options.curvature = [&] { return average_curvature(likelihood_, parameters, factors, parts); };
     if (!quiet_) options.progress = options_.progress;
     Minimum minimum = minimise(objective, parameters.values(), options);
     return {.parameters = std::move(parameters),
             .values = std::move(minimum.x),
             .criterion = minimum.value,
+            .hessian = std::move(minimum.hessian),
             .convergence = minimum.convergence,
             .optimizer = std::move(minimum.optimizer),
             .iterations = std::move(minimum.iterations)};

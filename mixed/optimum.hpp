@@ -16,7 +16,6 @@ struct SearchOptions {
   int max_iterations = 200;
   bool derivative_free = false;
   bool several_starts = true;  // where evaluations are cheap
-  bool from_afar = true;       // the start is nobody's guess
   std::function<bool(const Iteration&)> progress;
 };
 
@@ -24,6 +23,7 @@ struct Optimum {
   Parameters parameters;  // those that are free there
   std::vector<double> values;
   double criterion = 0.0;
+  std::vector<double> hessian;  // of the criterion by the values, by columns; sound when converged
   Convergence convergence = Convergence::not_converged;
   std::string optimizer;
   std::vector<Iteration> iterations;

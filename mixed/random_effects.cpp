@@ -1,4 +1,5 @@
 #include <cmath>
+#include <numeric>
 
 #include "mixed/effects.hpp"
 #include "mixed/factor_algebra.hpp"
@@ -8,13 +9,69 @@ namespace {
 
 std::size_t at(std::int64_t i) { return static_cast<std::size_t>(i); }
 
-// sqrt(variance * diagonal of F inverse F') for the blocks of the levels, to `place` of each coefficient.
+// What the uncertainty of the fixed effects adds to the covariance of the random effects, Q S Q' with S^-1 the
+// covariance of the fixed effects and Q the columns of C^- that belong to them.
+class FixedShare {
+ public:
+  // Not known where Q would be large, or where what it is taken from is not at hand.
+  explicit FixedShare(Likelihood& likelihood) {
+    const std::vector<std::int64_t>& kept = likelihood.design().model().fixed.kept;
+    if (!likelihood.reml() || kept.empty() || kept.size() > kMost / at(likelihood.design().unknowns()) ||
+        !likelihood.constraint().empty())
+      return;
+    rank_ = kept.size();
+    order_ = at(likelihood.design().unknowns());
+    const std::size_t random = at(likelihood.design().random_count());
+    std::vector<double> unit(order_ * rank_, 0.0);
+    for (std::size_t j = 0; j < rank_; ++j) unit[j * order_ + random + at(kept[j])] = 1.0;
+    columns_ = likelihood.equations().solve(unit, static_cast<std::int64_t>(rank_));
+    Dense covariance;
+    for (std::size_t j = 0; j < rank_; ++j) {
+      for (const std::int64_t i : kept) covariance.push_back(columns_[j * order_ + random + at(i)]);
+    }
+    if (std::optional<Dense> lower = cholesky_factor(covariance, rank_)) lower_ = std::move(*lower);
+  }
+  bool known() const { return !lower_.empty(); }
+
+  // Takes it from the block of the unknowns from `first` on.
+  void take_from(std::size_t first, std::size_t k, std::vector<double>& block) {
+    rows_.resize(k * rank_);
+    for (std::size_t a = 0; a < k; ++a) {
+      double* const row = &rows_[a * rank_];
+      for (std::size_t j = 0; j < rank_; ++j) {
+        double sum = columns_[j * order_ + first + a];
+        for (std::size_t i = 0; i < j; ++i) sum -= lower_[i * rank_ + j] * row[i];
+        row[j] = sum / lower_[j * rank_ + j];
+      }
+      for (std::size_t b = 0; b <= a; ++b) {
+        const double share = std::inner_product(row, row + rank_, &rows_[b * rank_], 0.0);
+        block[a * k + b] -= share;
+        if (a != b) block[b * k + a] -= share;
+      }
+    }
+  }
+
+ private:
+  static constexpr std::size_t kMost = 4000000;  // elements
+
+  std::size_t rank_ = 0;
+  std::size_t order_ = 0;
+  std::vector<double> columns_;  // Q and, behind it, the covariance of the fixed effects
+  Dense lower_;                  // its Cholesky factor
+  std::vector<double> rows_;
+};
+
+// sqrt(variance * diagonal of F inverse F') for the blocks of the levels, to `place` of each coefficient; less the share
+// of the fixed effects, if one is given.
 void set_deviations(Equations& equations, const Constraint& constraint, const std::vector<Dense>& factors,
                     double variance, std::vector<double> RandomEffects::*place, std::vector<RandomEffects*>& effects,
-                    const std::vector<std::size_t>& first_effect, const Gram& gram) {
+                    const std::vector<std::size_t>& first_effect, const Gram& gram, FixedShare* share) {
   const std::size_t terms = factors.size();
-  equations.visit_inverse(constraint, [&](const Block& block, std::span<const double> inverse) {
+  std::vector<double> inverse;
+  equations.visit_inverse(constraint, [&](const Block& block, std::span<const double> whole) {
     if (!block.diagonal() || block.t >= terms) return;
+    inverse.assign(whole.begin(), whole.end());
+    if (share) share->take_from(block.row, block.k, inverse);
     const Dense& factor = factors[block.t];
     const std::size_t level = at(block.node - gram.first_node(block.t));
     for (std::size_t c = 0; c < block.k; ++c) {
@@ -60,11 +117,16 @@ void set_random_effects(Likelihood& likelihood, const AtOptimum& optimum, Fit& f
   std::vector<RandomEffects*> effects;
   for (RandomEffects& one : fit.ranef) effects.push_back(&one);
   set_deviations(likelihood.equations(), likelihood.constraint(), factors, optimum.variance, &RandomEffects::pev_sd,
-                 effects, first_effect, likelihood.gram());
+                 effects, first_effect, likelihood.gram(), nullptr);
+  FixedShare share(likelihood);
+  if (share.known()) {
+    set_deviations(likelihood.equations(), likelihood.constraint(), factors, optimum.variance, &RandomEffects::cond_sd,
+                   effects, first_effect, likelihood.gram(), &share);
+  }
   likelihood.equations().forget_inverse();
-  if (likelihood.factor_random(optimum.factors)) {
+  if (!share.known() && likelihood.factor_random(optimum.factors)) {
     set_deviations(likelihood.random_equations(), likelihood.random_constraint(), factors, optimum.variance,
-                   &RandomEffects::cond_sd, effects, first_effect, likelihood.gram());
+                   &RandomEffects::cond_sd, effects, first_effect, likelihood.gram(), nullptr);
     likelihood.random_equations().forget_inverse();
   }
   for (std::size_t t = 0; t < design.terms().size(); ++t) {

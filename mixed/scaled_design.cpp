@@ -244,15 +244,18 @@ std::vector<double> ScaledDesign::transposed_product(std::span<const double> r) 
   std::vector<double> out(at(unknowns()), 0.0);
   for (const DesignTerm& term : terms_) {
     const auto k = at(term.k);
+    if (k == 1) {
+      for (std::size_t i = 0; i < r.size(); ++i) out[at(term.first + (*term.level)[i])] += term.z[i] * r[i];
+      continue;
+    }
     for (std::size_t i = 0; i < r.size(); ++i) {
       double* const effect = &out[at(term.first) + at((*term.level)[i]) * k];
       for (std::size_t c = 0; c < k; ++c) effect[c] += term.z[i * k + c] * r[i];
     }
   }
-  for (std::int64_t j = 0; j < x_.cols(); ++j) {
-    double sum = 0.0;
-    for (auto p = at(x_.start[at(j)]); p < at(x_.start[at(j) + 1]); ++p) sum += x_.value[p] * r[at(x_.row[p])];
-    out[at(random_count_ + j)] = sum;
+  double* const fixed = out.data() + random_count_;
+  for (std::size_t i = 0; i < r.size(); ++i) {
+    for (auto p = at(row_start_[i]); p < at(row_start_[i + 1]); ++p) fixed[row_col_[p]] += row_value_[p] * r[i];
   }
   return out;
 }

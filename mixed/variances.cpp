@@ -98,16 +98,19 @@ std::vector<double> natural_lengths(const Parameters& parameters, const std::vec
   return lengths;
 }
 
+bool is_cheap(Likelihood& likelihood) {
+  return likelihood.design().unknowns() <= 50000 && likelihood.equations().facts().flops <= 1e8;
+}
+
 // The Hessian of log_det + s2 / variance from central differences of its gradient; of two steps' differences the
-// leading error is taken out where evaluations are cheap (Richardson).
+// leading error is taken out (Richardson).
 Dense factor_hessian(Likelihood& likelihood, const Parameters& parameters, const std::vector<double>& values,
                      double variance) {
   const std::size_t m = values.size();
-  const bool cheap = likelihood.design().unknowns() <= 50000 && likelihood.equations().facts().flops <= 1e8;
   const std::vector<double> lengths = natural_lengths(parameters, values);
   Dense hessian(m * m, 0.0);
   for (std::size_t j = 0; j < m; ++j) {
-    const double step = (cheap ? 2e-3 : 2e-4) * lengths[j];
+    const double step = 2e-3 * lengths[j];
     const auto difference = [&](double h) {
       std::vector<double> there = values;
       there[j] = values[j] + h;
@@ -122,10 +125,8 @@ Dense factor_hessian(Likelihood& likelihood, const Parameters& parameters, const
       return slope;
     };
     std::vector<double> slope = difference(step);
-    if (cheap) {
-      const std::vector<double> half = difference(0.5 * step);
-      for (std::size_t i = 0; i < m; ++i) slope[i] = (4.0 * half[i] - slope[i]) / 3.0;
-    }
+    const std::vector<double> half = difference(0.5 * step);
+    for (std::size_t i = 0; i < m; ++i) slope[i] = (4.0 * half[i] - slope[i]) / 3.0;
     for (std::size_t i = 0; i < m; ++i) {
       hessian[j * m + i] += 0.5 * slope[i];
       hessian[i * m + j] += 0.5 * slope[i];
@@ -134,13 +135,26 @@ Dense factor_hessian(Likelihood& likelihood, const Parameters& parameters, const
   return hessian;
 }
 
+// That of d log(s2 / d) + log_det, where s2 / d is the variance, without what the variance's moving along takes from it.
+Dense at_fixed_variance(const Dense& profiled, const std::vector<double>& s2, double variance, double degrees) {
+  Dense hessian = profiled;
+  for (std::size_t j = 0; j < s2.size(); ++j) {
+    for (std::size_t i = 0; i < s2.size(); ++i) {
+      hessian[j * s2.size() + i] += s2[i] * s2[j] / (degrees * variance * variance);
+    }
+  }
+  return hessian;
+}
+
 }  // namespace
 
-ParameterCovariance observed_covariance(Likelihood& likelihood, const Parameters& parameters,
-                                        const std::vector<double>& values, double variance) {
-  const std::size_t m = values.size();
-  const Dense hessian = factor_hessian(likelihood, parameters, values, variance);
-  const Derivatives here = derivatives_at(likelihood, parameters, values);
+ParameterCovariance observed_covariance(Likelihood& likelihood, const Optimum& optimum, double variance) {
+  const std::size_t m = optimum.values.size();
+  const bool cheap = is_cheap(likelihood);
+  Dense hessian;
+  if (cheap) hessian = factor_hessian(likelihood, optimum.parameters, optimum.values, variance);
+  const Derivatives here = derivatives_at(likelihood, optimum.parameters, optimum.values);
+  if (!cheap) hessian = at_fixed_variance(optimum.hessian, here.s2, variance, likelihood.degrees());
   // Half the second derivatives of d log v + log_det + s2 / v, by log v at the end.
   Dense information((m + 1) * (m + 1), 0.0);
   for (std::size_t j = 0; j < m; ++j) {
@@ -272,7 +286,7 @@ class AverageInformation {
 
  private:
   void add(std::vector<double> working) {
-    Likelihood::Solution solved = likelihood_.solve_response(working, factors_);
+    Likelihood::Solution solved = likelihood_.solve_response(working, factors_, 0);
     residuals_.push_back(std::move(solved.residual));
     solutions_.push_back(std::move(solved.unknowns));
   }

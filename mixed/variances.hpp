@@ -4,6 +4,7 @@
 #include "mixed/estimate.hpp"
 #include "mixed/factor_algebra.hpp"
 #include "mixed/likelihood.hpp"
+#include "mixed/optimum.hpp"
 #include "mixed/parameters.hpp"
 
 namespace sm::mixed {
@@ -22,8 +23,7 @@ struct ParameterCovariance {
   std::size_t count = 0;
   bool known() const { return !covariance.empty(); }
 };
-ParameterCovariance observed_covariance(Likelihood& likelihood, const Parameters& parameters,
-                                        const std::vector<double>& values, double variance);
+ParameterCovariance observed_covariance(Likelihood& likelihood, const Optimum& optimum, double variance);
 
 // Free components, standard errors and both kinds of information.
 void set_observed_information(const ScaledDesign& design, const Parameters& parameters,

@@ -1,5 +1,5 @@
 // Models that the data do not determine, in part or at all: no number then, and the cause in words.
-#include <fmt/format.h>
+#include <fmt/core.h>
 #include <gtest/gtest.h>
 
 #include <cmath>

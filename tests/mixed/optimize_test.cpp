@@ -111,6 +111,61 @@ TEST(Minimise, needs_few_evaluations_of_a_quadratic_function) {
   }
 }
 
+// Powers of e in each direction and a square that ties them together; the Hessian, but for a part of each element.
+struct Tied {
+  double missing = 0.0;
+  Vector at = {};
+
+  Evaluation operator()(Point x) {
+    at.assign(x.begin(), x.end());
+    double sum = 0.0;
+    for (const double v : x) sum += v;
+    Evaluation e{.value = 0.5 * sum * sum, .gradient = Vector(x.size(), sum)};
+    for (std::size_t i = 0; i < x.size(); ++i) {
+      e.value += 1e4 * (std::exp(x[i]) - 2.0 * x[i]);
+      e.gradient[i] += 1e4 * (std::exp(x[i]) - 2.0);
+    }
+    return e;
+  }
+  Vector hessian() const {
+    const std::size_t n = at.size();
+    Vector h(n * n, 1.0 - missing);
+    for (std::size_t i = 0; i < n; ++i) h[i * n + i] += 1e4 * (1.0 - missing) * std::exp(at[i]);
+    return h;
+  }
+};
+
+TEST(Minimise, takes_steps_with_an_approximate_hessian_and_returns_the_true_one) {
+  for (const double missing : {0.0, 0.05, -0.1}) {
+    Tied tied{.missing = missing};
+    const Objective objective = [&](Point x) { return tied(x); };
+    const Minimum found = minimise(objective, Vector(4, 1.0), {.curvature = [&] { return tied.hessian(); }});
+    EXPECT_EQ(found.convergence, Convergence::converged);
+    EXPECT_LE(found.evaluations, 7 + 4 + 1) << missing;
+    EXPECT_LT(largest(found.gradient), 1e-4) << missing;
+    tied.missing = 0.0;
+    tied.at = found.x;
+    const Vector exact = tied.hessian();
+    for (std::size_t i = 0; i < exact.size(); ++i) EXPECT_NEAR(found.hessian[i], exact[i], 2e-5 * exact[0]) << missing;
+  }
+}
+
+TEST(Minimise, is_not_led_astray_by_a_hessian_that_is_wrong) {
+  for (const double factor : {-1.0, 0.0, 1e-3, 100.0, kInfinity}) {
+    Tied tied;
+    const Objective objective = [&](Point x) { return tied(x); };
+    const auto wrong = [&] {
+      Vector h = tied.hessian();
+      for (double& v : h) v *= factor;
+      return h;
+    };
+    const Minimum found = minimise(objective, {3.0, -2.0, 0.0}, {.curvature = wrong});
+    EXPECT_EQ(found.convergence, Convergence::converged) << factor;
+    EXPECT_EQ(found.optimizer, "trust-region Newton") << factor;
+    EXPECT_LT(largest(found.gradient), 1e-3) << factor;
+  }
+}
+
 TEST(Minimise, finds_a_variance_in_closed_form) {
   // Davies and Goldsmith (1972), table 6.1: six batches of five.
   const OneWay dyestuff{6.0, 5.0, 56357.5, 58830.0};

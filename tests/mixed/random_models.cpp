@@ -1,8 +1,9 @@
 #include "random_models.hpp"
 
-#include <Eigen/Dense>
 #include <cmath>
 #include <memory>
+
+#include "mixed/eigenvalues.hpp"
 
 namespace sm::mixed::test {
 namespace {
@@ -87,7 +88,7 @@ std::shared_ptr<const Precision> precision_of(Field field, std::int64_t order) {
     }
     made->row_start.push_back(static_cast<std::int64_t>(made->col.size()));
   }
-  const Eigen::VectorXd eigenvalues = Eigen::SelfAdjointEigenSolver<Eigen::MatrixXd>(dense).eigenvalues();
+  const Eigen::VectorXd eigenvalues = eigenvalues_of(dense);
   const bool singular = field == Field::ring;
   for (Eigen::Index i = singular ? 1 : 0; i < order; ++i) made->log_det += std::log(eigenvalues(i));
   if (singular) {
