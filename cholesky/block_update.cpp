@@ -8,6 +8,7 @@ namespace sm {
 
 namespace {
 
+constexpr i64 kLongRun = 6;        // runs that are shorter on average are not worth their bounds
 constexpr i64 kInPlaceWidth = 16;  // narrower sources are read where they stand
 
 class BlockUpdate {
@@ -25,6 +26,7 @@ class BlockUpdate {
   void find_places(i64 begin, i64 end);
   void fetch_targets(int rows, i64 from, double* const* row) const;
   void strip(i64 first_row, i64 begin, i64 end);
+  void scatter(int rows, const std::int32_t* to, i64 columns, double* const* row) const;
   i64 head_of_strip(i64 first_row, int rows, i64 end);
   TileSource in_place(i64 column) const { return {s_.value + column, s_.step, 1, tiles_.tile_columns}; }
 
@@ -92,6 +94,25 @@ void BlockUpdate::fetch_targets(int rows, i64 from, double* const* row) const {
   }
 }
 
+// Adds the sums one by one, a few rows with each place that is read.
+void BlockUpdate::scatter(int rows, const std::int32_t* to, i64 columns, double* const* row) const {
+  const double* sum = panels_.sums;
+  int i = 0;
+  for (; i + 4 <= rows; i += 4, sum += 4 * kPanelColumns) {
+    double *a = row[i], *b = row[i + 1], *c = row[i + 2], *d = row[i + 3];
+    for (i64 j = 0; j < columns; ++j) {
+      const i64 place = to[j];
+      a[place] += sum[j];
+      b[place] += sum[j + kPanelColumns];
+      c[place] += sum[j + 2 * kPanelColumns];
+      d[place] += sum[j + 3 * kPanelColumns];
+    }
+  }
+  for (; i < rows; ++i, sum += kPanelColumns) {
+    for (i64 j = 0; j < columns; ++j) row[i][to[j]] += sum[j];
+  }
+}
+
 // The columns of the strip's own rows, where every row begins one later, and what must be added through `to` with them.
 // Answers where the rest begins.
 i64 BlockUpdate::head_of_strip(i64 first_row, int rows, i64 end) {
@@ -131,6 +152,10 @@ void BlockUpdate::strip(i64 first_row, i64 begin, i64 end) {
   double* sums[kMostStripRows];
   for (int i = 0; i < rows; ++i) sums[i] = panels_.sums + i * kPanelColumns;
   tiles_.strip(rows, s_.width, coefficients(first_row), source, end - from, sums, Finish::store);
+  if (end - from < kLongRun * runs_) {
+    scatter(rows, panels_.to + (from - begin), end - from, row);
+    return;
+  }
   tiles_.spread(rows, panels_.sums, kPanelColumns, from - begin, panels_.run, panels_.run + runs_, row);
 }
 

@@ -165,10 +165,7 @@ SM_TILE_TARGET void spread(int rows, const double* sums, i64 sums_step, i64 firs
       double* out = target[i] + to;
       i64 x = 0;
       for (; x + X::kWidth <= length; x += X::kWidth) X::store(out + x, X::add(X::load(out + x), X::load(from + x)));
-      if (x < length) {
-        const int last = static_cast<int>(length - x);
-        X::store(out + x, X::add(X::load(out + x, last), X::load(from + x, last)), last);
-      }
+      for (; x < length; ++x) out[x] += from[x];
     }
   }
 }

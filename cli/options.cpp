@@ -1,6 +1,6 @@
 #include "cli/options.hpp"
 
-#include <fmt/core.h>
+#include <fmt/format.h>
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
