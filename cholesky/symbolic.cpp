@@ -256,13 +256,13 @@ SmStatus find_structure(SmMatrix& m) {
   }
 }
 
-// Room for n positions, n reciprocal pivots and the values of U behind the integers.
+// Room for n positions, n reciprocal pivots and the values of U behind the integers, which alone are kept.
 SmStatus make_room_for_values(SmMatrix& m) {
   const i64 n = m.rows;
   const i64 integers = 3 * n + 1 + m.work[n - 1];
   const i64 available = (m.work_capacity - 2 * n) - (integers + m.factor_block) / m.factor_block;
   const i64 values = m.work[2 * n];
-  return values <= available ? SM_OK : extend_workspace(m, values - available, m.work_capacity);
+  return values <= available ? SM_OK : extend_workspace(m, values - available, integers + 1);
 }
 
 Gate may_find_structure(const SmMatrix& m) {

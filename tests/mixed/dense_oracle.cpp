@@ -1,5 +1,6 @@
 #include "dense_oracle.hpp"
 
+#include <Eigen/Dense>
 #include <cmath>
 
 namespace sm::mixed::test {
@@ -35,6 +36,10 @@ MatrixL kronecker(const MatrixL& a, const MatrixL& b) {
 Real log_det(const Eigen::LDLT<MatrixL>& ldlt) { return ldlt.vectorD().array().log().sum(); }
 
 }  // namespace
+
+MatrixL inverse_of(const MatrixL& matrix) { return matrix.inverse(); }
+
+Real log_det(const MatrixL& positive) { return log_det(Eigen::LDLT<MatrixL>(positive)); }
 
 DenseOracle::DenseOracle(const Model& model) {
   const Eigen::Index n = model.rows();

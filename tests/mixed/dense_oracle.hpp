@@ -1,7 +1,7 @@
 // The same models with dense matrices in extended precision: Var(y) = V is formed, and everything follows from it.
 #pragma once
 
-#include <Eigen/Dense>
+#include <Eigen/Core>
 #include <vector>
 
 #include "mixed/model.hpp"
@@ -11,6 +11,9 @@ namespace sm::mixed::test {
 using Real = long double;
 using MatrixL = Eigen::Matrix<Real, Eigen::Dynamic, Eigen::Dynamic>;
 using VectorL = Eigen::Matrix<Real, Eigen::Dynamic, 1>;
+
+MatrixL inverse_of(const MatrixL& matrix);
+Real log_det(const MatrixL& positive);
 
 class DenseOracle {
  public:

@@ -89,8 +89,8 @@ void expect_variances(const Fit& fit, const DenseOracle::Answer& answer) {
       average(i, j) = answer.average(a, b);
     }
   }
-  const MatrixL inverse = observed.inverse();
-  const MatrixL average_inverse = average.inverse();
+  const MatrixL inverse = inverse_of(observed);
+  const MatrixL average_inverse = inverse_of(average);
   for (Eigen::Index i = 0; i < count; ++i) {
     const VarianceComponent& component = fit.varcomp[fit.free[std::size_t(i)]];
     ASSERT_TRUE(component.se_observed && component.se_average);
