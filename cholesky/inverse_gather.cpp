@@ -31,14 +31,22 @@ void gather(const InverseRows& z, const DensePart& part, const Square& out, i64*
     const Block b = z.at(z.tree.block_of(part.column[i]));
     const i64 first = symmetric ? i + 1 : part.from;
     find_places(b, part.column, first, part.to, place + (first - part.from));
+    const i64 count = part.to - part.from;
+    // Places that follow each other stay so for all rows of the block: none of them is left of a row's own.
+    const bool in_one_run = first < part.to && place[count - 1] - place[first - part.from] == part.to - 1 - first;
     for (; i < part.end && part.column[i] < b.first + b.width; ++i) {
       const double* from = b.row(part.column[i] - b.first);
       double* to = out.row(i - part.begin);
-      for (i64 j = symmetric ? i + 1 - part.from : 0; j < part.to - part.from; ++j) to[j] = from[place[j]];
+      const i64 begin = symmetric ? i + 1 - part.from : 0;
+      if (in_one_run && begin < count) {
+        std::copy_n(from + place[begin], count - begin, to + begin);
+      } else {
+        for (i64 j = begin; j < count; ++j) to[j] = from[place[j]];
+      }
       if (!symmetric) continue;
       const i64 own = i - part.from;
       to[own] = z.diag[part.column[i]];
-      for (i64 j = own + 1; j < part.to - part.from; ++j) out.row(j)[own] = to[j];
+      for (i64 j = own + 1; j < count; ++j) out.row(j)[own] = to[j];
     }
   }
 }

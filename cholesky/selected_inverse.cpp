@@ -21,6 +21,7 @@
 #include <algorithm>
 
 #include "cholesky/inverse_work.hpp"
+#include "cholesky/search.hpp"
 
 namespace sm {
 
@@ -243,10 +244,9 @@ i64 SelectedInverse::place(const SmMatrix& m, i64 i, i64 j) {
   if (i == j) return -1;
   const i64 row = std::min(m.inv_perm[i], m.inv_perm[j]);
   const i64 column = std::max(m.inv_perm[i], m.inv_perm[j]);
-  const i64* begin = m.factor_ju + m.factor_iju[row];
-  const i64* end = begin + (m.factor_iu[row + 1] - m.factor_iu[row]);
-  const i64* hit = std::lower_bound(begin, end, column);
-  return hit != end && *hit == column ? m.factor_iu[row] + (hit - begin) : -2;
+  const i64 length = m.factor_iu[row + 1] - m.factor_iu[row];
+  const i64 at = find_column(m.factor_ju + m.factor_iju[row], length, column);
+  return at < length ? m.factor_iu[row] + at : -2;
 }
 
 const double* SelectedInverse::find(i64 i, i64 j) const {

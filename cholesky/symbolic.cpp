@@ -14,6 +14,7 @@
 #include <cmath>
 
 #include "cholesky/lookahead.hpp"
+#include "cholesky/search.hpp"
 #include "cholesky/steps.hpp"
 #include "store/checks.hpp"
 
@@ -27,12 +28,6 @@ struct ColumnState {
   i64 block;  // the row with which the column was last stored in ju
   i64 flag;   // row in work: 2k for an entry of A, 2k + 1 for a column of the tail or an extra
 };
-
-// Whether the ascending list has c. Without branches on what is read: searches of one tail go everywhere in it.
-bool has(const i64* list, i64 length, i64 c) {
-  for (; length > 1; length -= length / 2) list += list[length / 2 - 1] < c ? length / 2 : 0;
-  return *list == c;
-}
 
 class SymbolicRows {
  public:
@@ -153,7 +148,9 @@ void SymbolicRows::collect_extras(i64 k, i64 others) {
   if ((count_ + others) * kSearchGain < tail_length_) {
     const i64 block = block_of_tail();
     const i64 last = tail_[tail_length_ - 1];
-    collect(k, [&](i64 c) { return (columns_[c].block == block && c <= last) || has(tail_, tail_length_, c); });
+    collect(k, [&](i64 c) {
+      return (columns_[c].block == block && c <= last) || find_column(tail_, tail_length_, c) < tail_length_;
+    });
   } else {
     for (const i64* c = tail_; c != tail_ + tail_length_; ++c) columns_[*c].flag = 2 * k + 1;
     collect(k, [](i64) { return false; });

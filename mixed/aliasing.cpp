@@ -29,6 +29,16 @@ void subtract(double factor, const Vector& b, Vector& a) {
   for (std::size_t i = 0; i < a.size(); ++i) a[i] -= factor * b[i];
 }
 
+// Both in one pass: a -= factor * b, and then the product of a with c.
+double subtract_and_multiply(double factor, const Vector& b, Vector& a, const Vector& c) {
+  double sum = 0.0;
+  for (std::size_t i = 0; i < a.size(); ++i) {
+    a[i] -= factor * b[i];
+    sum += c[i] * a[i];
+  }
+  return sum;
+}
+
 // The nearest fraction of small denominator, when there is one that rounding explains.
 double nearest_fraction(double value) {
   for (int q = 1; q <= kLargestDenominator; ++q) {
@@ -83,12 +93,15 @@ class GramSchmidt {
   // Projections of `values` on the directions so far, which are taken off it.
   Vector project(Vector& values) const {
     Vector parts(directions_.size(), 0.0);
-    for (int pass = 0; pass < 2; ++pass) {
-      for (std::size_t k = 0; k < directions_.size(); ++k) {
-        const double part = dot(directions_[k], values);
-        subtract(part, directions_[k], values);
+    const std::size_t count = directions_.size();
+    for (int pass = 0; pass < 2 && count > 0; ++pass) {
+      double part = dot(directions_[0], values);
+      for (std::size_t k = 0; k + 1 < count; ++k) {
         parts[k] += part;
+        part = subtract_and_multiply(part, directions_[k], values, directions_[k + 1]);
       }
+      parts[count - 1] += part;
+      subtract(part, directions_[count - 1], values);
     }
     return parts;
   }

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cmath>
-#include <numeric>
 
 namespace sm::mixed {
 namespace {
@@ -42,9 +41,6 @@ class Directions {
  private:
   std::size_t count() const { return effects_.size() / order_; }
   std::span<double> part(std::vector<double>& all, std::size_t j) const { return {&all[j * order_], order_}; }
-  static double dot(std::span<const double> a, std::span<const double> b) {
-    return std::inner_product(a.begin(), a.end(), b.begin(), 0.0);
-  }
 
   void add(const Parameters::Place& place) {
     const DesignTerm& term = design_.terms()[place.term];

@@ -10,12 +10,6 @@ namespace {
 
 constexpr double kRounding = 1e-13;
 
-double dot(std::span<const double> a, std::span<const double> b) {
-  return std::inner_product(a.begin(), a.end(), b.begin(), 0.0);
-}
-
-double norm(std::span<const double> a) { return std::sqrt(dot(a, a)); }
-
 void subtract(double factor, std::span<const double> a, std::span<double> from) {
   for (std::size_t i = 0; i < a.size(); ++i) from[i] -= factor * a[i];
 }

@@ -9,17 +9,12 @@
 #include <string>
 #include <vector>
 
+#include "mixed/dense.hpp"
 #include "mixed/optimize.hpp"
 #include "mixed/trust_region.hpp"
 #include "mixed/value_search.hpp"
 
 namespace sm::mixed {
-
-inline double dot(std::span<const double> a, std::span<const double> b) {
-  double sum = 0.0;
-  for (std::size_t i = 0; i < a.size(); ++i) sum += a[i] * b[i];
-  return sum;
-}
 
 inline double scaled_norm(std::span<const double> p, std::span<const double> scale) {
   double sum = 0.0;

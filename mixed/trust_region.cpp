@@ -2,18 +2,11 @@
 
 #include <algorithm>
 #include <cmath>
-#include <numeric>
 
 #include "mixed/dense.hpp"
 
 namespace sm::mixed {
 namespace {
-
-double dot(std::span<const double> a, std::span<const double> b) {
-  return std::inner_product(a.begin(), a.end(), b.begin(), 0.0);
-}
-
-double norm(std::span<const double> a) { return std::sqrt(dot(a, a)); }
 
 // The curvatures that a step reckons with: what is not told apart from zero is taken as slightly positive.
 std::vector<double> firm_curvatures(const Spectrum& spectrum) {
