@@ -63,6 +63,23 @@ void permute_entries(SmMatrix& m, i64* target) {
   }
 }
 
+// Through copies where the workspace has room for them: along cycles each entry waits for the memory of the one before.
+void move_entries(SmMatrix& m, i64* target) {
+  const i64 used = m.rows + m.nnz;
+  if (!has_workspace(m, used + 2 * m.nnz)) {
+    permute_entries(m, target);
+    return;
+  }
+  i64* column = m.work + used;
+  auto* value = reinterpret_cast<double*>(column + m.nnz);
+  std::copy_n(m.col_index, m.nnz, column);
+  std::copy_n(m.nz_values, m.nnz, value);
+  for (i64 p = 0; p < m.nnz; ++p) {
+    m.col_index[target[p]] = column[p];
+    m.nz_values[target[p]] = value[p];
+  }
+}
+
 Gate may_reorder(const SmMatrix& m) {
   SM_STOP_IF(m.nnz < 1, SM_OK);
   SM_STOP_IF(m.state >= SM_STATE_REORDERED, SM_OK);
@@ -96,7 +113,7 @@ SmStatus reorder(SmMatrix& m) {
   find_owners(m, counts, target);
   move_row_starts(m, counts);
   find_targets(m, counts, target);
-  permute_entries(m, target);
+  move_entries(m, target);
   m.state = SM_STATE_REORDERED;
   return SM_OK;
 }

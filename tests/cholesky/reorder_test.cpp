@@ -48,6 +48,7 @@ TEST_P(ReorderTest, moves_every_entry_to_the_row_of_the_index_that_comes_first) 
     if (problem.n == 0) continue;
     SmMatrix* m = ordered(problem);
     if (random.chance(50)) impose_order(m, random.permutation(problem.n));
+    if (random.chance(50)) replace_work(m, problem.n + m->nnz);  // no room but for the targets
     const StoredRows want = expected_rows(m);
     ASSERT_EQ(qxsmreorder(m), SM_OK);
     EXPECT_EQ(m->state, SM_STATE_REORDERED);
