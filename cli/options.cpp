@@ -286,7 +286,8 @@ std::string help_command(const CLI::App& app) {
 void refuse_extra(const CLI::App& app) {
   if (app.get_subcommands().empty()) return;
   const CLI::App& command = *app.get_subcommands().front();
-  const std::vector<std::string> extras = command.remaining(true);
+  std::vector<std::string> extras = command.remaining(true);
+  if (extras.empty()) extras = app.remaining();  // in front of the subcommand
   const auto option =
       std::find_if(extras.begin(), extras.end(), [](const std::string& word) { return word.starts_with('-'); });
   if (option == extras.end()) {

@@ -9,9 +9,14 @@ namespace {
 std::string without_controls(const std::string& text) {
   constexpr std::array<char, 17> kDigits{"0123456789abcdef"};
   std::string out;
+  unsigned char before = 0;
   for (const char c : text) {
     const auto byte = static_cast<unsigned char>(c);
-    if (byte >= 0x20 && byte != 0x7f) {
+    // Behind C2, bytes up to 9F are a second set of controls.
+    const bool second = before == 0xc2 && byte < 0xa0;
+    if (second) out.replace(out.size() - 1, 1, "\\xc2");
+    before = byte;
+    if (!second && byte >= 0x20 && byte != 0x7f) {
       out += c;
     } else {
       out += "\\x";

@@ -78,10 +78,23 @@ Dense lower_factor(const Dense& factor, std::size_t n) {
 }
 
 std::optional<Dense> lower_factor_of_covariance(const Dense& covariance, std::size_t n) {
-  Eigensystem eigen = eigensystem(covariance, n);
+  // As correlations: a variance that is small beside another is as good as that.
+  std::vector<double> scale(n, 1.0);
+  Dense correlations = covariance;
+  for (std::size_t i = 0; i < n; ++i) {
+    if (covariance[i * n + i] > 0.0) scale[i] = std::sqrt(covariance[i * n + i]);
+  }
+  for (std::size_t j = 0; j < n; ++j) {
+    for (std::size_t i = 0; i < n; ++i) correlations[j * n + i] /= scale[i] * scale[j];
+  }
+  Eigensystem eigen = eigensystem(correlations, n);
   if (n > 0 && !(eigen.values.front() >= -1e-12 * std::max(eigen.values.back(), 0.0))) return std::nullopt;
   for (double& value : eigen.values) value = std::sqrt(std::max(value, 0.0));
-  return lower_factor(scaled_columns(std::move(eigen.vectors), eigen.values), n);
+  Dense root = scaled_columns(std::move(eigen.vectors), eigen.values);
+  for (std::size_t j = 0; j < n; ++j) {
+    for (std::size_t i = 0; i < n; ++i) root[j * n + i] *= scale[i];
+  }
+  return lower_factor(root, n);
 }
 
 std::vector<double> singular_values(const Dense& factor, std::size_t n) { return singular_system(factor, n).values; }

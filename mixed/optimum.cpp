@@ -133,6 +133,7 @@ class Finder {
 
   // Where rounding may hide that a boundary is none a search from beside it tells. `boundary` is then where it ended.
   bool leads_inside(Optimum& boundary, const Factors& beside) {
+    if (!likelihood_.evaluate(beside, false).defined) return false;
     Optimum restarted = search(Parameters(beside));
     if (restarted.criterion >= boundary.criterion - noise(boundary.criterion)) return false;
     append(restarted, boundary);

@@ -31,7 +31,8 @@ class FixedShare {
     }
     if (std::optional<Dense> lower = cholesky_factor(covariance, rank_)) lower_ = std::move(*lower);
   }
-  bool known() const { return !lower_.empty(); }
+  // Not where next to nothing was left of a block that it was taken from.
+  bool known() const { return !lower_.empty() && !cancelled_; }
 
   // Takes it from the block of the unknowns from `first` on.
   void take_from(std::size_t first, std::size_t k, std::vector<double>& block) {
@@ -45,6 +46,7 @@ class FixedShare {
       }
       for (std::size_t b = 0; b <= a; ++b) {
         const double share = std::inner_product(row, row + rank_, &rows_[b * rank_], 0.0);
+        if (a == b && share > kAlmostAll * block[a * k + a]) cancelled_ = true;
         block[a * k + b] -= share;
         if (a != b) block[b * k + a] -= share;
       }
@@ -53,11 +55,13 @@ class FixedShare {
 
  private:
   static constexpr std::size_t kMost = 4000000;  // elements
+  static constexpr double kAlmostAll = 1.0 - 1e-6;
 
   std::size_t rank_ = 0;
   std::size_t order_ = 0;
   std::vector<double> columns_;  // Q and, behind it, the covariance of the fixed effects
   Dense lower_;                  // its Cholesky factor
+  bool cancelled_ = false;
   std::vector<double> rows_;
 };
 

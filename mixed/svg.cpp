@@ -134,8 +134,11 @@ std::vector<std::string> told_apart(const std::vector<std::string>& names, doubl
           std::mismatch(first.begin(), first.begin() + static_cast<std::ptrdiff_t>(same), other.begin(), other.end());
       same = static_cast<std::size_t>(ends.first - first.begin());
     }
-    if (same == first.size()) continue;  // it is the only one, or begins as all of them
-    for (const std::size_t place : places) shown[place] = cut_around(printable(names[place]), same, size, width);
+    if (places.size() == 1) continue;
+    for (const std::size_t place : places) {
+      const std::string name = printable(names[place]);
+      if (same < name.size()) shown[place] = cut_around(name, same, size, width);
+    }
   }
   return shown;
 }

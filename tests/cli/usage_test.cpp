@@ -47,6 +47,10 @@ TEST(Usage, standard_output_is_not_promised_twice) {
   expect_message(qxsm({"solve", "-", "-b", "-"}), 2, {"standard input", "; give one of them as a file"});
 }
 
+TEST(Usage, an_option_of_a_subcommand_in_front_of_it_is_named) {
+  expect_message(qxsm({"--json", "info", "a.mtx"}), 2, {"--json", "no option of qxsm"});
+}
+
 TEST(Usage, the_version_is_printed) {
   const Outcome run = qxsm({"--version"});
   EXPECT_EQ(run.code, 0);

@@ -25,6 +25,9 @@ TEST(Fault, leaves_out_what_it_does_not_know) {
 TEST(Fault, shows_control_characters_instead_of_sending_them) {
   EXPECT_EQ(describe({.file = "a\x1b[2Jb.csv", .variable = "x\ny", .what = "w\t", .advice = "\x7f"}),
             "a\\x1b[2Jb.csv: 'x\\x0ay': w\\x09; \\x7f");
+  EXPECT_EQ(describe({.what = "1\xc2\x9b"
+                              "31m, 5\xc2\xa0m"}),
+            "1\\xc2\\x9b31m, 5\xc2\xa0m");
   EXPECT_EQ(describe({.what = "naïve", .excerpt = "  y ~\n   ^"}), "naïve\n  y ~\n   ^");
 }
 

@@ -1,6 +1,7 @@
 // What a fit says beside its estimates: boundaries, functions of the effects, given variances, and refusals.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cmath>
 #include <numeric>
 
@@ -141,6 +142,21 @@ TEST(GivenVariances, give_the_determinant_and_rank_of_the_equations) {
   equations.topLeftCorner(8, 8) += MatrixL::Identity(8, 8) / 3.0L;
   EXPECT_NEAR(fitted.log_det_equations, static_cast<double>(log_det(equations)), 1e-10);
   EXPECT_EQ(fitted.rank_equations, 10);
+}
+
+// Of a level that is all but fixed, the conditional variance is next to nothing of the prediction variance.
+TEST(GivenVariances, give_conditional_deviations_however_large_a_variance_is) {
+  LoadedModule loaded;
+  const Model model = random_model({.rows = 60, .terms = {kGroups}}, 3);
+  for (const double variance : {1.0, 1e6, 1e12}) {
+    const Fit fitted = fit(model, loaded.module(), {.variances = {variance, 1.0}});
+    for (std::size_t l = 0; l < 8; ++l) {
+      const std::vector<std::int64_t>& level = model.random[0].level;
+      const auto records = static_cast<double>(std::count(level.begin(), level.end(), static_cast<std::int64_t>(l)));
+      const double deviation = 1.0 / std::sqrt(records + 1.0 / variance);
+      EXPECT_NEAR(fitted.ranef[0].cond_sd[l], deviation, 1e-8) << variance << ", level " << l;
+    }
+  }
 }
 
 TEST(GivenVariances, give_reliabilities_where_inbreeding_is_known) {

@@ -80,6 +80,8 @@ TEST(SvgText, is_cut_around_what_tells_names_apart_that_would_look_alike) {
   EXPECT_EQ(shown[4], svg::fitted(names[4], 10.0, 120.0));
   const std::vector<std::string> twice{names[0], names[0]};  // the same name twice stays the same
   EXPECT_EQ(svg::told_apart(twice, 10.0, 120.0)[1], svg::fitted(names[0], 10.0, 120.0));
+  const std::vector<std::string> longer{std::string(155, 'a'), std::string(150, 'a')};  // one begins as the other
+  for (const std::string& text : svg::told_apart(longer, 10.0, 120.0)) EXPECT_LE(svg::text_width(text, 10.0), 120.0);
   for (const std::string& name : hostile_names()) {
     for (const std::string& text : svg::told_apart({name + "a", name + "b"}, 9.0, 80.0)) {
       EXPECT_LE(svg::text_width(text, 9.0), 80.0) << text;
