@@ -216,6 +216,7 @@ class Fitter {
       set_observed_information(design_, optimum.parameters, optimum.values, variance, at_optimum.covariance, fit_);
       parts = evaluate(factors);
       set_average_information(likelihood_, optimum.parameters, optimum.values, variance, fit_);
+      say_undetermined();
     }
     set_ratios(options_.ratios, fit_);
     finish(at_optimum, parts);
@@ -273,10 +274,25 @@ class Fitter {
         spread_of_residuals() < kSmall
             ? "the residual variance is practically zero: the random effects explain every observation, and its value "
               "and that of the others are where the search ended"
-            : fmt::format("the data do not determine the variance of '{}': the fixed effects explain the differences "
-                          "between its levels, and its value is where the search ended; leave the term out",
-                          model_.random[term].group));
+            : undetermined(model_.random[term].group));
     fit_.obstacle = fit_.messages.back();
+  }
+
+  static std::string undetermined(const std::string& group) {
+    return fmt::format(
+        "the data do not determine the variance of '{}': the fixed effects explain the differences "
+        "between its levels, and its value is where the search ended; leave the term out",
+        group);
+  }
+
+  // A criterion that is flat but for rounding has its optimum everywhere.
+  void say_undetermined() {
+    constexpr double kNothing = 1e4;  // standard errors
+    for (const VarianceComponent& component : fit_.varcomp) {
+      if (!component.var2.empty() || !component.se_observed) continue;
+      if (!(*component.se_observed > kNothing * component.vcov)) continue;
+      fit_.messages.push_back(undetermined(component.group));
+    }
   }
 
   // The sum of squares of the residuals as a part of that of the response about its mean.

@@ -49,6 +49,22 @@ TEST(NoAnswer, to_a_response_that_the_fixed_effects_explain_exactly) {
   EXPECT_NEAR(std::sqrt(small.varcomp.back().vcov), 2e-5, 1e-5);
 }
 
+// Rounding decides how it is noticed: by a boundary, by an information of nothing, or by a standard error without bounds.
+TEST(NoAnswer, to_a_variance_between_groups_that_finer_fixed_effects_explain) {
+  for (int seed = 1; seed <= 40; ++seed) {
+    std::string table = "y,g,f\n";
+    for (int i = 0; i < 96; ++i) {
+      const double noise = i * i * seed % 101 / 25.0;
+      table += fmt::format("{:.4f},g{},f{}\n", 10.0 * (i % 4) + i % 12 + noise, i % 12, i % 4);
+    }
+    const Fit nested = fitted(table, "y ~ g + (1 | f)");
+    EXPECT_TRUE(says(nested, "do not determine the variance of 'f'") || says(nested, "the likelihood is flat") ||
+                says(nested, "its variance is zero"))
+        << seed;
+    EXPECT_FALSE(says(fitted(table, "y ~ f + (1 | g)"), "do not determine")) << seed;
+  }
+}
+
 TEST(NoAnswer, to_a_residual_variance_that_random_effects_leave_nothing_for) {
   const Fit exact = fitted(lines([](int, int x, int g) { return 3.0 + 2.0 * x + g * g % 7; }), "y ~ x + (1 | g)");
   EXPECT_NE(exact.convergence, Convergence::converged);
