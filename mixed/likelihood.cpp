@@ -2,6 +2,7 @@
 
 #include <cmath>
 #include <numbers>
+#include <utility>
 
 namespace sm::mixed {
 namespace {
@@ -48,9 +49,10 @@ CriterionParts Likelihood::evaluate(const Factors& factors, bool with_gradient) 
     last_ = value(factors);
   }
   if (!last_.defined || !with_gradient || last_.s2_gradient.size() == factors.size()) return last_;
-  last_.s2_gradient = gradient_of_squares(factors);
+  Factors squares = gradient_of_squares(factors);
   last_.log_det_gradient =
       reml_ ? all_.log_det_gradient(factors, constraint_) : random_->log_det_gradient(factors, random_constraint_);
+  last_.s2_gradient = std::move(squares);  // last: it tells that both are there
   return last_;
 }
 
