@@ -108,25 +108,29 @@ void* take_small(ChunkPool& pool, std::uint64_t bytes, bool zero) {
   return block;
 }
 
+// A large block begins on its second page, the head ends the first.
+constexpr std::uint64_t kLargeHead = KeptPages::kPage;
+
 void* take_big(ChunkPool& pool, std::uint64_t bytes, bool zero) {
   Pages memory = {nullptr, sizeof(BigHead) + bytes};
   const bool large = bytes >= kLarge;
   if (large) {
-    memory = pool.host->kept_pages.take(memory.span, zero);
+    memory = pool.host->kept_pages.take(kLargeHead + bytes, zero);
   } else {
     memory.start = zero ? std::calloc(1, memory.span) : std::malloc(memory.span);
   }
   if (!memory.start) return nullptr;
-  auto* head = static_cast<BigHead*>(memory.start);
-  *head = {nullptr, pool.big, memory.span, {}, {bytes, large ? kLargeTier : kMediumTier, 0}};
-  if (pool.big) pool.big->previous = head;
-  pool.big = head;
-  return head + 1;
+  auto* block = static_cast<char*>(memory.start) + (large ? kLargeHead : sizeof(BigHead));
+  BigHead& head = big_head_of(block);
+  head = {nullptr, pool.big, memory.span, {}, {bytes, large ? kLargeTier : kMediumTier, 0}};
+  if (pool.big) pool.big->previous = &head;
+  pool.big = &head;
+  return block;
 }
 
 void give_back(ChunkPool& pool, BigHead& head) {
   if (head.tag.tier == kLargeTier) {
-    pool.host->kept_pages.give({&head, head.span});
+    pool.host->kept_pages.give({reinterpret_cast<char*>(&head + 1) - kLargeHead, head.span});
   } else {
     std::free(&head);
   }

@@ -15,12 +15,13 @@ struct Pages {
 
 class KeptPages {
  public:
+  static constexpr std::uint64_t kPage = 4096;
   static constexpr std::uint64_t kLargestKept = std::uint64_t{32} << 20;  // larger ones go back to the system at once
   static constexpr std::uint64_t kMostKept = std::uint64_t{64} << 20;
   // Beyond this many zeros fresh pages are the better ones: much of what is asked for may never be touched.
-  static constexpr std::uint64_t kMostZeroed = std::uint64_t{1} << 20;
+  static constexpr std::uint64_t kMostZeroed = std::uint64_t{4} << 20;
 
-  // At least `span` bytes, of zeros if so asked.
+  // At least `span` bytes, of zeros if so asked. Huge pages begin with the second page, if there are any.
   Pages take(std::uint64_t span, bool zero);
   // Keeps them, or gives them and older ones back to the system.
   void give(Pages pages);

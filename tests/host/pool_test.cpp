@@ -168,7 +168,7 @@ TEST_F(PoolTest, large_blocks_are_freed_in_any_order) {
 TEST_F(PoolTest, a_slab_of_640_megabytes_that_is_not_touched_costs_no_memory) {
   const std::int64_t before = resident_bytes();
   char* zeroed = take(640 * kMiB, SM_POOL_ZERO);
-  char* plain = take(640 * kMiB - 64);  // with its head a whole number of huge pages
+  char* plain = take(640 * kMiB - 4096);  // with the page in front of it a whole number of huge pages
   ASSERT_NE(zeroed, nullptr);
   ASSERT_NE(plain, nullptr);
   ASSERT_GT(before, 0);
