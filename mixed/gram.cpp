@@ -58,10 +58,12 @@ void Gram::number_nodes(const ScaledDesign& design) {
     first_node_.push_back(random_nodes_);
     first_unknown_.push_back(term.first);
     size_.push_back(term.k);
+    single_ = single_ && term.k == 1 && term.first == random_nodes_;
     random_nodes_ += term.levels;
   }
   first_node_.push_back(random_nodes_);
   first_unknown_.push_back(design.random_count());
+  single_ = single_ && design.random_count() == random_nodes_;
   size_.push_back(1);
   first_node_.push_back(random_nodes_ + design.fixed_count());
 }
@@ -176,7 +178,21 @@ Gram::Gram(const ScaledDesign& design) {
   value_.shrink_to_fit();
 }
 
+void Gram::add_product_of_single_unknowns(std::span<const double> x, std::span<double> y) const {
+  for (std::size_t i = 0; i < at(nodes()); ++i) {
+    auto p = at(start_[i]);
+    double sum = value_[p] * x[i];  // the diagonal comes first
+    for (++p; p < at(start_[i + 1]); ++p) {
+      const auto j = at(column_[p]);
+      sum += value_[p] * x[j];
+      y[j] += value_[p] * x[i];
+    }
+    y[i] += sum;
+  }
+}
+
 void Gram::add_product(std::span<const double> x, std::span<double> y) const {
+  if (single_) return add_product_of_single_unknowns(x, y);
   for (std::size_t t = 0; t < size_.size(); ++t) {
     for (std::int64_t node = first_node_[t]; node < first_node_[t + 1]; ++node) {
       const auto k = at(size_[t]);

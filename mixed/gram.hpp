@@ -40,8 +40,10 @@ class Gram {
  private:
   static std::size_t index(std::int64_t i) { return static_cast<std::size_t>(i); }
   void number_nodes(const ScaledDesign& design);
+  void add_product_of_single_unknowns(std::span<const double> x, std::span<double> y) const;
 
   std::int64_t random_nodes_ = 0;
+  bool single_ = true;  // every node is one unknown, of the same number
   std::vector<std::int64_t> first_node_;
   std::vector<std::int64_t> first_unknown_;
   std::vector<std::int64_t> size_;
