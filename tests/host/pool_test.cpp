@@ -1,6 +1,7 @@
 // Pools in normal operation: tiers, zeros, alignment, accounts, ceilings, and what memory they cost.
 #include <gtest/gtest.h>
 #include <qxhost/qxhost.h>
+#include <sys/resource.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -17,16 +18,17 @@ constexpr std::uint64_t kMiB = std::uint64_t{1} << 20;
 const std::vector<std::uint64_t> kSizes = {0,    1,    15,   16,   17,     255,    256,    257,    320,  321,     1024,
                                            4095, 4096, 4097, 8192, 131071, 131072, 131073, 200000, kMiB, 5 * kMiB};
 
-// Pages of the process that are in memory, in bytes.
-std::int64_t resident_bytes() {
-  long size = 0;
-  long resident = 0;
+// Column `k` of the counts of the process's pages, in bytes: 0 mapped, 1 in memory.
+std::int64_t bytes_of_pages(int k) {
+  long counts[2] = {0, 0};
   std::FILE* statm = std::fopen("/proc/self/statm", "r");
   if (!statm) return -1;
-  const int read = std::fscanf(statm, "%ld %ld", &size, &resident);
+  const int read = std::fscanf(statm, "%ld %ld", &counts[0], &counts[1]);
   std::fclose(statm);
-  return read == 2 ? resident * sysconf(_SC_PAGESIZE) : -1;
+  return read == 2 ? counts[k] * sysconf(_SC_PAGESIZE) : -1;
 }
+std::int64_t resident_bytes() { return bytes_of_pages(1); }
+[[maybe_unused]] std::int64_t mapped_bytes() { return bytes_of_pages(0); }
 
 class PoolTest : public ::testing::Test {
  protected:
@@ -248,6 +250,24 @@ TEST_F(PoolTest, a_large_zero_filled_block_costs_no_memory_also_after_others_wer
     pool->free(pool, block);
   }
 }
+
+#if !defined(__SANITIZE_ADDRESS__)  // the sanitizer needs address space of its own
+TEST_F(PoolTest, kept_pages_make_way_when_address_space_is_short) {
+  std::vector<char*> blocks;
+  for (int k = 0; k < 3; ++k) blocks.push_back(take(20 * kMiB));
+  for (char* block : blocks) pool->free(pool, block);
+  rlimit before = {};
+  ASSERT_EQ(getrlimit(RLIMIT_AS, &before), 0);
+  rlimit tight = before;
+  tight.rlim_cur = static_cast<rlim_t>(mapped_bytes()) + 10 * kMiB;
+  ASSERT_EQ(setrlimit(RLIMIT_AS, &tight), 0);
+  char* block = take(50 * kMiB);
+  char* too_large = take(80 * kMiB);
+  ASSERT_EQ(setrlimit(RLIMIT_AS, &before), 0);
+  EXPECT_NE(block, nullptr);
+  EXPECT_EQ(too_large, nullptr);
+}
+#endif
 
 TEST_F(PoolTest, past_the_hosts_ceiling_requests_are_answered_with_null) {
   qxhost_set_memory_ceiling(host, 10'000);
