@@ -69,7 +69,32 @@ std::string advice_for_name(const std::string& name, const std::vector<std::stri
                           : fmt::format("did you mean '{}'? In a formula it stands in backquotes: {}", meant, written);
 }
 
+// Whole numbers that lie close together are sorted by a table of all between. False when they are not such.
+bool distinct_whole_numbers(const std::vector<double>& values, Factor& factor, std::vector<std::size_t>& first) {
+  if (values.empty()) return false;
+  const auto [least, largest] = std::minmax_element(values.begin(), values.end());
+  const double range = *largest - *least;
+  if (!(range < 8.0 * static_cast<double>(values.size())) || !(std::fabs(*least) < 1e15)) return false;
+  std::vector<std::size_t> seen(static_cast<std::size_t>(range) + 1, values.size());
+  for (std::size_t i = values.size(); i-- > 0;) {
+    if (values[i] != std::floor(values[i])) return false;
+    seen[static_cast<std::size_t>(values[i] - *least)] = i;
+  }
+  std::vector<std::int32_t> place(seen.size());
+  for (std::size_t k = 0; k < seen.size(); ++k) {
+    if (seen[k] == values.size()) continue;
+    place[k] = static_cast<std::int32_t>(first.size());
+    first.push_back(seen[k]);
+    factor.levels.push_back(print_number(*least + static_cast<double>(k)));
+  }
+  factor.code.reserve(values.size());
+  for (const double value : values) factor.code.push_back(place[static_cast<std::size_t>(value - *least)]);
+  return true;
+}
+
 Factor distinct_numbers(const std::vector<double>& values, std::vector<std::size_t>& first) {
+  if (Factor whole; distinct_whole_numbers(values, whole, first)) return whole;
+  first.clear();
   std::vector<double> sorted = values;
   std::sort(sorted.begin(), sorted.end());
   sorted.erase(std::unique(sorted.begin(), sorted.end()), sorted.end());

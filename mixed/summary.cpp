@@ -68,19 +68,19 @@ std::string criterion(const Fit& fit) {
   return text + table.text();
 }
 
-// The quantile of sorted values that R calls type 7: Hyndman and Fan, "Sample quantiles in statistical packages", The
-// American Statistician 50 (1996) 361-365.
-double quantile(const std::vector<double>& sorted, double p) {
-  const double place = p * static_cast<double>(sorted.size() - 1);
-  const auto below = static_cast<std::size_t>(place);
-  const std::size_t above = std::min(below + 1, sorted.size() - 1);
-  return sorted[below] + (place - static_cast<double>(below)) * (sorted[above] - sorted[below]);
+// The quantile that R calls type 7: Hyndman and Fan, "Sample quantiles in statistical packages", The American
+// Statistician 50 (1996) 361-365. Moves the values about.
+double quantile(std::vector<double>& values, double p) {
+  const double place = p * static_cast<double>(values.size() - 1);
+  const auto below = values.begin() + static_cast<std::ptrdiff_t>(place);
+  std::nth_element(values.begin(), below, values.end());
+  if (below + 1 == values.end()) return *below;
+  return *below + (place - std::floor(place)) * (*std::min_element(below + 1, values.end()) - *below);
 }
 
 std::string residual_quantiles(const Model& model, const Fit& fit) {
   std::vector<double> scaled = standardised_residuals(model, fit);
   if (scaled.empty()) return "";
-  std::sort(scaled.begin(), scaled.end());
   TextTable table{.head = {}, .rows = {{}}, .names = 0};
   constexpr std::array<std::pair<const char*, double>, 5> kQuantiles{
       {{"Min", 0.0}, {"1Q", 0.25}, {"Median", 0.5}, {"3Q", 0.75}, {"Max", 1.0}}};

@@ -113,6 +113,16 @@ TEST(Design, takes_equal_numbers_for_one_level_and_labels_it_as_first_written) {
   EXPECT_EQ(model.random[0].level, (Indices{0, 1, 0, 1, 0}));
 }
 
+// Close together, far apart, and not whole.
+TEST(Design, numbers_levels_in_the_order_of_their_values) {
+  for (const std::string largest : {"12", "2e9", "9.5"}) {
+    const std::string table = "y,id\n1," + largest + "\n2,-3\n3,8\n4,-3\n5," + largest + "\n";
+    const RandomTerm term = model_of(table, "y ~ (1 | id)").random[0];
+    EXPECT_EQ(term.levels, (Strings{"-3", "8", largest}));
+    EXPECT_EQ(term.level, (Indices{2, 0, 1, 0, 2})) << largest;
+  }
+}
+
 TEST(Design, takes_true_and_false_for_levels) {
   EXPECT_EQ(model_of("y,t\n1,TRUE\n2,FALSE\n3,TRUE\n", "y ~ t").fixed.names, (Strings{"(Intercept)", "tTRUE"}));
 }
