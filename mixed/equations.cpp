@@ -82,6 +82,12 @@ void Equations::fill(const Factors& factors) {
     const auto k = block.k;
     const auto m = block.m;
     const double* right = block.g;
+    if (k == 1 && m == 1) {
+      const double half_product = block.s < terms ? right[0] * factors[block.s][0] : right[0];
+      const double product = block.t < terms ? factors[block.t][0] * half_product : half_product;
+      values_[block.place(0, 0)] = block.t == block.s ? product + block.precision : product;
+      return;
+    }
     if (block.s < terms) {
       const std::vector<double>& factor = factors[block.s];
       half.assign(k * m, 0.0);
@@ -240,11 +246,22 @@ class TraceSum {
   // `inverse`: the block of C^-, k x m by rows.
   void add(const Block& block, std::span<const double> inverse) {
     const std::size_t terms = factors_.size();
+    if (block.k == 1 && block.m == 1) {
+      add_number(block, 2.0 * inverse[0]);
+      return;
+    }
     if (block.t < terms) add_row(block, inverse);
     if (!block.diagonal() && block.s < terms) add_column(block, inverse);
   }
 
  private:
+  void add_number(const Block& block, double twice) {
+    const std::size_t terms = factors_.size();
+    const bool fixed = block.s == terms;
+    if (block.t < terms) gradient_[block.t][0] += twice * (fixed ? block.g[0] : factors_[block.s][0] * block.g[0]);
+    if (!block.diagonal() && !fixed) gradient_[block.s][0] += twice * (factors_[block.t][0] * block.g[0]);
+  }
+
   // gradient(b, a) += 2 sum_c inverse(a, c) (T_s' G')(c, b)
   void add_row(const Block& block, std::span<const double> inverse) {
     std::vector<double>& sums = gradient_[block.t];
