@@ -110,6 +110,7 @@ void ModelFit::read() {
   model_ = mixed::build_model(table, formula_, design);
   notes_ = model_.notes;
   notes_.insert(notes_.end(), precisions.notes().begin(), precisions.notes().end());
+  session_->trim();
   resident_ = resident();
 }
 

@@ -33,6 +33,9 @@ class ModuleSession {
   const ExportedSteps& steps() const { return steps_; }
   std::uint64_t peak_bytes() const { return qxhost_usage(host_).bytes_peak; }
 
+  // Freed memory that waits for its next use goes back to the system.
+  void trim() { qxhost_trim(host_); }
+
   // Throws CommandError for every status but 0; `doing` names the phase: "ordering".
   void expect_ok(SmStatus status, const std::string& doing) const;
 

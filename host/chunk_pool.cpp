@@ -48,8 +48,9 @@ struct Tag {
 struct BigHead {
   BigHead* previous;
   BigHead* next;
-  std::uint64_t span;  // bytes of the memory that begins here
-  std::uint64_t unused[3];
+  std::uint64_t span;     // bytes of the memory that it lies in
+  std::uint64_t is_zero;  // whether zeros were asked for
+  std::uint64_t unused[2];
   Tag tag;
 };
 static_assert(sizeof(Tag) == 16 && sizeof(BigHead) == 64, "blocks stay aligned");
@@ -78,8 +79,15 @@ ChunkPool& pool_of(MemoryPool* table) { return static_cast<ChunkPool&>(head_of(t
 Tag& tag_of(void* block) { return static_cast<Tag*>(block)[-1]; }
 BigHead& big_head_of(void* block) { return static_cast<BigHead*>(block)[-1]; }
 
+// Memory from the C library: once more without the kept pages when there is none.
+void* take_from_heap(QxHost& host, std::uint64_t bytes, bool zero) {
+  void* memory = zero ? std::calloc(1, bytes) : std::malloc(bytes);
+  if (memory || !host.kept_pages.trim()) return memory;
+  return zero ? std::calloc(1, bytes) : std::malloc(bytes);
+}
+
 bool add_chunk(ChunkPool& pool) {
-  auto* chunk = static_cast<Chunk*>(std::malloc(pool.chunk_bytes));
+  auto* chunk = static_cast<Chunk*>(take_from_heap(*pool.host, pool.chunk_bytes, false));
   if (!chunk) return false;
   chunk->next = pool.chunks;
   pool.chunks = chunk;
@@ -117,22 +125,29 @@ void* take_big(ChunkPool& pool, std::uint64_t bytes, bool zero) {
   if (large) {
     memory = pool.host->kept_pages.take(kLargeHead + bytes, zero);
   } else {
-    memory.start = zero ? std::calloc(1, memory.span) : std::malloc(memory.span);
+    memory.start = take_from_heap(*pool.host, memory.span, zero);
   }
   if (!memory.start) return nullptr;
   auto* block = static_cast<char*>(memory.start) + (large ? kLargeHead : sizeof(BigHead));
   BigHead& head = big_head_of(block);
-  head = {nullptr, pool.big, memory.span, {}, {bytes, large ? kLargeTier : kMediumTier, 0}};
+  head = {nullptr, pool.big, memory.span, zero, {}, {bytes, large ? kLargeTier : kMediumTier, 0}};
   if (pool.big) pool.big->previous = &head;
   pool.big = &head;
   return block;
 }
 
+// Pages that were asked for zeros would be asked for them again, so they are kept only as far as zeros are written.
 void give_back(ChunkPool& pool, BigHead& head) {
-  if (head.tag.tier == kLargeTier) {
-    pool.host->kept_pages.give({reinterpret_cast<char*>(&head + 1) - kLargeHead, head.span});
-  } else {
+  if (head.tag.tier != kLargeTier) {
     std::free(&head);
+    return;
+  }
+  KeptPages& kept = pool.host->kept_pages;
+  const Pages pages = {reinterpret_cast<char*>(&head + 1) - kLargeHead, head.span};
+  if (head.is_zero && pages.span > KeptPages::kMostZeroed) {
+    kept.release(pages);
+  } else {
+    kept.give(pages);
   }
 }
 
@@ -181,7 +196,7 @@ void destroy(MemoryPool* table) {
 }  // namespace
 
 MemoryPool* create_chunk_pool(QxHost& host) {
-  auto* pool = static_cast<ChunkPool*>(std::calloc(1, sizeof(ChunkPool)));
+  auto* pool = static_cast<ChunkPool*>(take_from_heap(host, sizeof(ChunkPool), true));
   if (!pool) return nullptr;
   pool->table.destroy = destroy;
   pool->table.allocate = allocate;

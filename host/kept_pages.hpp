@@ -16,20 +16,22 @@ struct Pages {
 class KeptPages {
  public:
   static constexpr std::uint64_t kPage = 4096;
-  static constexpr std::uint64_t kLargestKept = std::uint64_t{32} << 20;  // larger ones go back to the system at once
-  static constexpr std::uint64_t kMostKept = std::uint64_t{64} << 20;
+  static constexpr std::uint32_t kMostSpans = 64;
+  // With the page in front of each block. Larger ones go back to the system at once.
+  static constexpr std::uint64_t kLargestKept = (std::uint64_t{32} << 20) + kPage;
+  static constexpr std::uint64_t kMostKept = (std::uint64_t{64} << 20) + kMostSpans * kPage;
   // Beyond this many zeros fresh pages are the better ones: much of what is asked for may never be touched.
-  static constexpr std::uint64_t kMostZeroed = std::uint64_t{4} << 20;
+  static constexpr std::uint64_t kMostZeroed = (std::uint64_t{4} << 20) + kPage;
 
   // At least `span` bytes, of zeros if so asked. Huge pages begin with the second page, if there are any.
   Pages take(std::uint64_t span, bool zero);
-  // Keeps them, or gives them and older ones back to the system.
+  // Keeps them, or gives them or older ones back to the system.
   void give(Pages pages);
-  void trim();
+  void release(Pages pages);
+  // False when there was nothing to give back.
+  bool trim();
 
  private:
-  static constexpr std::uint32_t kMostSpans = 64;
-
   Pages take_kept(std::uint64_t span);
   void forget(std::uint32_t place);
   void drop_oldest();

@@ -1,8 +1,8 @@
-// Gram-Schmidt in which what a projection has made much shorter is projected once more, which leaves nothing but
-// rounding behind: J. W. Daniel, W. B. Gragg, L. Kaufman, G. W. Stewart, "Reorthogonalization and stable algorithms for
-// updating the Gram-Schmidt QR factorization", Math. Comp. 30 (1976) 772-795; L. Giraud, J. Langou, M. Rozloznik,
-// J. van den Eshof, "Rounding error analysis of the classical Gram-Schmidt orthogonalization process", Numer. Math. 101
-// (2005) 87-100.
+// Modified Gram-Schmidt, whose triangle is as good as that of Householder's: A. Bjorck, "Solving linear least squares
+// problems by Gram-Schmidt orthogonalization", BIT 7 (1967) 1-21. A column that its projections have made much shorter is
+// projected once more: J. W. Daniel, W. B. Gragg, L. Kaufman, G. W. Stewart, "Reorthogonalization and stable algorithms
+// for updating the Gram-Schmidt QR factorization", Math. Comp. 30 (1976) 772-795. What is left of a column tells whether
+// it depends on those before; that all directions are orthogonal to the last digit is not needed for it.
 #include "mixed/aliasing.hpp"
 
 #include <algorithm>
@@ -227,7 +227,7 @@ class GramSchmidt {
   const WeightedColumns& x_;
   Dependences found_;
   Vector sizes_;                    // of the kept columns
-  std::vector<Vector> directions_;  // orthonormal
+  std::vector<Vector> directions_;  // of length one, orthogonal but for rounding
   std::vector<Vector> triangle_;    // column k: the parts of kept column k
 };
 

@@ -77,7 +77,8 @@ bool distinct_whole_numbers(const std::vector<double>& values, Factor& factor, s
   if (!(range < 8.0 * static_cast<double>(values.size())) || !(std::fabs(*least) < 1e15)) return false;
   std::vector<std::size_t> seen(static_cast<std::size_t>(range) + 1, values.size());
   for (std::size_t i = values.size(); i-- > 0;) {
-    if (values[i] != std::floor(values[i])) return false;
+    const double beyond = values[i] - *least;
+    if (!(beyond >= 0.0 && beyond <= range) || values[i] != std::floor(values[i])) return false;
     seen[static_cast<std::size_t>(values[i] - *least)] = i;
   }
   std::vector<std::int32_t> place(seen.size());

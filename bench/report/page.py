@@ -20,8 +20,8 @@ PHASES = [
      "The module's own permutation given to all. CHOLMOD's simplicial analysis counts but leaves the subscripts to the "
      "numeric phase; the supernodal one makes them and is the peer here."),
     ("numeric", "Numeric factorization",
-     "The module's own permutation given to all. Everybody allocates anew in each run: the host gives the module fresh "
-     "pages, the C library gives the peers pages that it kept from the run before."),
+     "The module's own permutation given to all. Everybody allocates anew in each run; the module's host, as the C "
+     "library for the peers, keeps pages of moderate size from the run before."),
     ("total", "Order, factor and solve",
      "From a closed matrix to one solution, everybody with orderings of their own."),
     ("solve", "Solves", "With a factor that is there."),

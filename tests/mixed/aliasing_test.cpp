@@ -140,6 +140,21 @@ TEST(Aliasing, allows_for_the_rounding_of_columns_that_nearly_cancel) {
   }
 }
 
+TEST(Aliasing, sees_sums_of_neighbours_wherever_they_stand) {
+  for (Eigen::Index count = 3; count < 12; ++count) {
+    for (Eigen::Index sum = 2; sum < count; ++sum) {
+      std::mt19937 random(static_cast<unsigned>(100 * count + sum));
+      std::normal_distribution<double> normal;
+      Matrix x = Matrix::NullaryExpr(40, count, [&] { return normal(random); });
+      x.col(sum) = x.col(sum - 1) - 3.0 * x.col(sum - 2);
+      const SparseColumns columns = sparse(x);
+      const Dependences found = dense_dependences(WeightedColumns(columns, {}));
+      EXPECT_EQ(found.aliased, std::vector<std::int64_t>{sum}) << count;
+      expect_dependence_holds(x, found);
+    }
+  }
+}
+
 TEST(Aliasing, keeps_powers_of_years_within_many_groups_and_sees_those_of_all_together) {
   constexpr Eigen::Index kGroups = 12;
   Matrix x = Matrix::Zero(31 * kGroups, 4 * kGroups + 4);

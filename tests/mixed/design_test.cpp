@@ -113,8 +113,7 @@ TEST(Design, takes_equal_numbers_for_one_level_and_labels_it_as_first_written) {
   EXPECT_EQ(model.random[0].level, (Indices{0, 1, 0, 1, 0}));
 }
 
-// Close together, far apart, and not whole.
-TEST(Design, numbers_levels_in_the_order_of_their_values) {
+TEST(Design, takes_numbers_close_together_or_far_apart_and_fractions_for_levels) {
   for (const std::string largest : {"12", "2000000000", "9.5"}) {
     const std::string table = "y,id\n1," + largest + "\n2,-3\n3,8\n4,-3\n5," + largest + "\n";
     const RandomTerm term = model_of(table, "y ~ (1 | id)").random[0];

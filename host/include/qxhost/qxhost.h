@@ -13,10 +13,12 @@
  *
  * Pools. Blocks are aligned to 16 bytes. A request for 0 bytes is answered with a block of its own, not with null.
  * Small blocks come from chunks; from 128 KiB on a block has pages of its own, which cost nothing until they are first
- * touched. When such a block is freed its pages go back to the system at once if they are more than 32 MiB; others
- * wait for a request of about their size, up to 64 MiB in all, until qxhost_trim or qxhost_destroy. A request that
- * cannot be met, because of a ceiling, of the system, or of a size near 2^64, is answered with null. free(pool, NULL)
- * does nothing; a block that is freed twice or in another pool is not noticed outside the checking mode.
+ * touched. When such a block is freed its pages go back to the system at once if they are more than 32 MiB (if zeros
+ * were asked for: 4 MiB); others wait for a request of about their size, at most 64 of them and 64 MiB, until younger
+ * ones push them out, memory is short, or qxhost_trim or qxhost_destroy is called. Zeros up to 4 MiB are written into
+ * such pages. A request that cannot be met, because of a ceiling, of the system, or of a size near 2^64, is answered
+ * with null. free(pool, NULL) does nothing; a block that is freed twice or in another pool is not noticed outside the
+ * checking mode.
  *
  * The checking mode serves each block by a malloc of its own, with a guard behind it, looks every freed block up before
  * it touches memory, and keeps destroyed pools, so that mistakes are counted instead of crashing. Memory that was not
