@@ -20,6 +20,7 @@
 
 #include "cholesky/block_work.hpp"
 #include "cholesky/lookahead.hpp"
+#include "cholesky/shared_tails.hpp"
 
 namespace sm {
 
@@ -67,8 +68,10 @@ class BlockedRows {
   SmStatus single_row(i64 k);
   double load_row(i64 k);
   double update_row(i64 k, double d);
+  double add_shared_row(i64 k, double d);
   double subtract_block(const Source& s, double d);
   SmStatus block(i64 first);
+  void add_shared_rows(const Target& target);
   void load_block(const Target& target);
   void update_target(const Target& target, const Source& s);
   void subtract_products(const Target& target, const Source& s, i64 rows);
@@ -78,6 +81,7 @@ class BlockedRows {
   Pivots& pivots_;
   Panels& panels_;
   const LookAhead ahead_;
+  SharedTails shared_;
   i64* place_;  // the words of the dense row, as places
 };
 
@@ -129,10 +133,19 @@ double BlockedRows::update_row(i64 k, double d) {
   return d;
 }
 
+double BlockedRows::add_shared_row(i64 k, double d) {
+  shared_.for_each_row_before(k + 1, [&](i64 i, const SharedTails::SharedTail& tail) {
+    d += tail.at(i, i);
+    for (i64 j = i + 1; j < tail.count; ++j) a_.diag[tail.column[j]] += tail.at(i, j);
+  });
+  return d;
+}
+
 SmStatus BlockedRows::single_row(i64 k) {
   const Block b = blocks_.at(k, 1);
   for (i64 j = 0; j < b.length; ++j) a_.diag[b.tail[j]] = 0.0;
-  const double d = update_row(k, load_row(k));
+  double d = update_row(k, load_row(k));
+  if (shared_.has_rows_before(k + 1)) d = add_shared_row(k, d);
   SM_TRY(pivots_.judge(k, d, a_.diag[k]));
   for (i64 j = 0; j < b.length; ++j) b.values[j] = a_.diag[b.tail[j]];
   blocks_.await(b);
@@ -191,13 +204,23 @@ void BlockedRows::update_target(const Target& target, const Source& s) {
   blocks_.await(s, rows);
 }
 
+void BlockedRows::add_shared_rows(const Target& target) {
+  const Block& b = target.block;
+  shared_.for_each_row_before(b.first + b.width, [&](i64 i, const SharedTails::SharedTail& tail) {
+    a_.diag[tail.column[i]] += tail.at(i, i);
+    double* row = b.row(tail.column[i] - b.first);
+    for (i64 j = i + 1; j < tail.count; ++j) row[target.place_of(tail.column[j])] += tail.at(i, j);
+  });
+}
+
 SmStatus BlockedRows::block(i64 first) {
   const Block b = blocks_.at(first, blocks_.width(first));
   const Target target = {b, place_, a_.diag};
   load_block(target);
   blocks_.for_each_waiting(first, [&](const Source& s) { update_target(target, s); });
+  if (shared_.has_rows_before(first + b.width)) add_shared_rows(target);
   SM_TRY(factor_block(b, a_.diag, pivots_, panels_));
-  blocks_.await(b);
+  if (!shared_.take(b, a_.diag, panels_)) blocks_.await(b);
   return SM_OK;
 }
 
