@@ -8,6 +8,8 @@ namespace sm {
 
 namespace {
 
+constexpr i64 kShortTail = 24;  // that of a small block
+
 class BlockFactor {
  public:
   BlockFactor(const Block& block, double* diag, Pivots& pivots, Panels& panels)
@@ -106,6 +108,9 @@ SmStatus BlockFactor::run() {
 }  // namespace
 
 SmStatus factor_block(const Block& block, double* diag, Pivots& pivots, Panels& panels) {
+  if (block.width <= kMostSmallRows && block.tail_length() <= kShortTail) {
+    return tile_kernels().factor_small(block, diag + block.first, pivots);
+  }
   return BlockFactor(block, diag, pivots, panels).run();
 }
 

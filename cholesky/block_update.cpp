@@ -21,6 +21,8 @@ class BlockUpdate {
 
  private:
   double* coefficients(i64 first_row) { return panels_.coefficient + first_row * s_.width; }
+  void find_coefficients();
+  void keep_multipliers();
   void find_places(i64 begin, i64 end);
   void fetch_targets(int rows, i64 from, double* const* row) const;
   void strip(i64 first_row, i64 begin, i64 end);
@@ -36,6 +38,36 @@ class BlockUpdate {
   bool packed_;
   i64 runs_ = 0;
 };
+
+// -V D of the source's first columns, strip by strip, row s of a strip's coefficients being that of source row s.
+void BlockUpdate::find_coefficients() {
+  const i64 height = tiles_.strip_rows;
+  for (i64 r = 0; r < rows_; r += height) {
+    const i64 rows = std::min(height, rows_ - r);
+    double* out = coefficients(r);
+    const double* v = s_.value + r;
+    for (i64 s = 0; s < s_.width; ++s) {
+      const double d = -s_.pivot[s];
+      for (i64 i = 0; i < rows; ++i) out[i] = v[i] * d;
+      out += height;
+      v += s_.step - s;
+    }
+  }
+}
+
+void BlockUpdate::keep_multipliers() {
+  const i64 height = tiles_.strip_rows;
+  for (i64 r = 0; r < rows_; r += height) {
+    const i64 rows = std::min(height, rows_ - r);
+    const double* from = coefficients(r);
+    double* v = s_.value + r;
+    for (i64 s = 0; s < s_.width; ++s) {
+      for (i64 i = 0; i < rows; ++i) v[i] = from[i];
+      from += height;
+      v += s_.step - s;
+    }
+  }
+}
 
 // Places of the columns [begin, end) in the rows of the target, as they are and in runs.
 void BlockUpdate::find_places(i64 begin, i64 end) {
@@ -128,46 +160,17 @@ void BlockUpdate::strip(i64 first_row, i64 begin, i64 end) {
 }
 
 void BlockUpdate::run() {
-  find_coefficients(s_, rows_, panels_.coefficient);
+  find_coefficients();
   for (i64 begin = 0; begin < s_.count; begin += kPanelColumns) {
     const i64 end = std::min(begin + kPanelColumns, s_.count);
     find_places(begin, end);
     if (packed_) tiles_.pack(s_.width, s_.value + begin, s_.step, end - begin, panels_.source);
     for (i64 r = 0; r < rows_; r += tiles_.strip_rows) strip(r, begin, end);
   }
-  keep_multipliers(s_, rows_, panels_.coefficient);
+  keep_multipliers();
 }
 
 }  // namespace
-
-void find_coefficients(const Source& s, i64 rows, double* coefficient) {
-  const i64 height = tile_kernels().strip_rows;
-  for (i64 r = 0; r < rows; r += height) {
-    const i64 count = std::min(height, rows - r);
-    double* out = coefficient + r * s.width;
-    const double* v = s.value + r;
-    for (i64 q = 0; q < s.width; ++q) {
-      const double d = -s.pivot[q];
-      for (i64 i = 0; i < count; ++i) out[i] = v[i] * d;
-      out += height;
-      v += s.step - q;
-    }
-  }
-}
-
-void keep_multipliers(const Source& s, i64 rows, const double* coefficient) {
-  const i64 height = tile_kernels().strip_rows;
-  for (i64 r = 0; r < rows; r += height) {
-    const i64 count = std::min(height, rows - r);
-    const double* from = coefficient + r * s.width;
-    double* v = s.value + r;
-    for (i64 q = 0; q < s.width; ++q) {
-      for (i64 i = 0; i < count; ++i) v[i] = from[i];
-      from += height;
-      v += s.step - q;
-    }
-  }
-}
 
 void update_block(const Target& target, const Source& s, i64 rows, Panels& panels) {
   BlockUpdate(target, s, rows, panels).run();

@@ -30,11 +30,6 @@ struct Target {
 // Subtracts what block `s` has for the rows of its first `rows` columns, which are rows of the target.
 void update_block(const Target& target, const Source& s, i64 rows, Panels& panels);
 
-// -V D of the source's first `rows` columns, strip by strip, row s of a strip's coefficients being that of source row s.
-void find_coefficients(const Source& s, i64 rows, double* coefficient);
-// Puts these in the place of V.
-void keep_multipliers(const Source& s, i64 rows, const double* coefficient);
-
 // Factors the block, all of whose updates are in: pivots from diag, multipliers among its own rows, raw values behind.
 [[nodiscard]] SmStatus factor_block(const Block& block, double* diag, Pivots& pivots, Panels& panels);
 

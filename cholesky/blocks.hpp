@@ -55,11 +55,6 @@ class Blocks {
   Block at(i64 first, i64 width) const {
     return {first, width, a_.iu[first + 1] - a_.iu[first], a_.ju + a_.iju[first] + width - 1, a_.values + a_.iu[first]};
   }
-  // All of a finished block's tail, as a source.
-  static Source all_of(const Block& b, const double* diag) {
-    return {b.first, b.width,      0,           b.tail_length(), b.tail, b.values + b.width - 1,
-            b.length - 1, diag + b.first};
-  }
   // f(source) for every block that waits for block `first`; f makes it wait elsewhere. Sources are read some at a time,
   // so that what they need from memory is under way before the first of them is used.
   template <class F>

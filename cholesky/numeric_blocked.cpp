@@ -53,6 +53,25 @@ void add_rows(double* target, const Place* to, i64 count, const double* source, 
   }
 }
 
+// Row k of A behind its diagonal, which is answered, into a row of U; place[j] is where column j is.
+[[gnu::noinline]] double enter_row(const SmMatrix& m, i64 k, const i64* place, double* row) {
+  const i64 begin = m.row_start[m.perm[k]];
+  const i64 end = m.row_start[m.perm[k] + 1];
+  const i64* const column = m.col_index;
+  const i64* const inv_perm = m.inv_perm;
+  const double* const value = m.nz_values;
+  double d = 0.0;
+  for (i64 p = begin; p < end; ++p) {
+    const i64 j = inv_perm[column[p]];
+    if (j > k) {
+      row[place[j]] = value[p];
+    } else if (j == k) {
+      d = value[p];
+    }
+  }
+  return d;
+}
+
 class BlockedRows {
  public:
   BlockedRows(const NumericArrays& a, Pivots& pivots, Panels& panels)
@@ -156,21 +175,14 @@ void BlockedRows::load_block(const Target& target) {
   const SmMatrix& m = a_.m;
   const Block& b = target.block;
   std::fill_n(b.values, b.row(b.width) + b.width + 1 - b.values, 0.0);
+  for (i64 r = 0; r < b.width; ++r) place_[b.first + r] = r;
   for (i64 j = 0; j < b.tail_length(); ++j) place_[b.tail[j]] = b.width + j;
+  double diagonal[kMostBlockRows];
   for (i64 r = 0; r < b.width; ++r) {
-    const i64 k = b.first + r;
-    const i64 row = m.perm[k];
-    ahead_.past(k);
-    a_.diag[k] = 0.0;
-    for (i64 p = m.row_start[row]; p < m.row_start[row + 1]; ++p) {
-      const i64 j = m.inv_perm[m.col_index[p]];
-      if (j > k) {
-        b.row(r)[target.place_of(j)] = m.nz_values[p];
-      } else if (j == k) {
-        a_.diag[k] = m.nz_values[p];
-      }
-    }
+    ahead_.past(b.first + r);
+    diagonal[r] = enter_row(m, b.first + r, place_, b.row(r));
   }
+  std::copy_n(diagonal, b.width, a_.diag + b.first);
 }
 
 // The update of a few products.
@@ -220,7 +232,7 @@ SmStatus BlockedRows::block(i64 first) {
   blocks_.for_each_waiting(first, [&](const Source& s) { update_target(target, s); });
   if (shared_.has_rows_before(first + b.width)) add_shared_rows(target);
   SM_TRY(factor_block(b, a_.diag, pivots_, panels_));
-  if (!shared_.take(b, a_.diag, panels_)) blocks_.await(b);
+  if (!shared_.take(b, a_.diag)) blocks_.await(b);
   return SM_OK;
 }
 

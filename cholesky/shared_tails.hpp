@@ -15,12 +15,10 @@
 
 namespace sm {
 
-inline constexpr i64 kMostSharedColumns = 16;
-
 class SharedTails {
  public:
   // Whether the finished block is summed; its updates are taken care of then.
-  bool take(const Block& block, const double* diag, Panels& panels);
+  bool take(const Block& block, const double* diag);
   // Whether rows before `end` have something to come from here, all rows before them being done.
   bool has_rows_before(i64 end) const { return next_row_ < end; }
   // add(i, tail) for every row tail.column[i] before `end` and each tail that has it.
