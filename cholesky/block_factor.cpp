@@ -8,8 +8,6 @@ namespace sm {
 
 namespace {
 
-constexpr i64 kShortTail = 24;  // that of a small block
-
 class BlockFactor {
  public:
   BlockFactor(const Block& block, double* diag, Pivots& pivots, Panels& panels)
@@ -107,11 +105,15 @@ SmStatus BlockFactor::run() {
 
 }  // namespace
 
-SmStatus factor_block(const Block& block, double* diag, Pivots& pivots, Panels& panels) {
-  if (block.width <= kMostSmallRows && block.tail_length() <= kShortTail) {
-    return tile_kernels().factor_small(block, diag + block.first, pivots);
+SmStatus factor_block(const Block& block, double* diag, double* square, Pivots& pivots, Panels& panels) {
+  const TileKernels& tiles = tile_kernels();
+  double* own_diag = diag + block.first;
+  if (block.width <= kMostSmallRows && block.length < kMostSmallColumns) {
+    return tiles.factor_small(block, own_diag, pivots, square);
   }
-  return BlockFactor(block, diag, pivots, panels).run();
+  SM_TRY(BlockFactor(block, diag, pivots, panels).run());
+  if (square) tiles.add_square(block, own_diag, square);
+  return SM_OK;
 }
 
 }  // namespace sm

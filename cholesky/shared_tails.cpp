@@ -13,17 +13,14 @@ bool is_same(const SharedTails::SharedTail& tail, const Block& block) {
 
 }  // namespace
 
-bool SharedTails::take(const Block& block, const double* diag) {
+double* SharedTails::square_for(const Block& block) {
   const i64 count = block.tail_length();
-  if (count == 0 || count > kMostSharedColumns) return false;
+  if (count == 0 || count > kMostSharedColumns) return nullptr;
   const i64 slot = block.tail[0] % kTails;
   SharedTail& tail = tails_[slot];
   if (!is_same(tail, block)) {
-    if (!tail.is_open) {
-      tail.column = block.tail;
-      tail.count = count;
-    }
-    return false;
+    if (!tail.is_open) tail = {.column = block.tail, .count = count};
+    return nullptr;
   }
   if (!tail.is_open) {
     tail.is_open = true;
@@ -31,9 +28,7 @@ bool SharedTails::take(const Block& block, const double* diag) {
     std::fill_n(tail.sum, kMostSharedColumns * kMostSharedColumns, 0.0);
     next_row_ = std::min(next_row_, block.tail[0]);
   }
-  tile_kernels().add_square(block.width, count, block.values + block.width - 1, block.length - 1, diag + block.first,
-                            tail.sum);
-  return true;
+  return tail.sum;
 }
 
 }  // namespace sm

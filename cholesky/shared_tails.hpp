@@ -17,8 +17,8 @@ namespace sm {
 
 class SharedTails {
  public:
-  // Whether the finished block is summed; its updates are taken care of then.
-  bool take(const Block& block, const double* diag);
+  // What the block, once it is factored, adds its square to instead of waiting in a list; null: it waits.
+  double* square_for(const Block& block);
   // Whether rows before `end` have something to come from here, all rows before them being done.
   bool has_rows_before(i64 end) const { return next_row_ < end; }
   // add(i, tail) for every row tail.column[i] before `end` and each tail that has it.

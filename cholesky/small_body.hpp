@@ -3,52 +3,72 @@
 //
 // Deliberately without an include guard.
 
-// p[0, n) += sum over q < kDepth of factor[q] * row q's same columns; the rows begin at `source`, their distance being
-// `step` and falling by one from row to row.
-template <int kDepth>
-SM_TILE_INLINE void add_few_rows(double* p, i64 n, const double* source, i64 step, const double* factor) {
-  using V = typename X::Vector;
-  for (; n > X::kWidth; n -= X::kWidth, p += X::kWidth, source += X::kWidth) {
-    V sum = X::load(p);
-    const double* from = source;
-#pragma GCC unroll 8
-    for (int q = 0; q < kDepth; from += step - q, ++q) sum = X::fma(X::all(factor[q]), X::load(from), sum);
-    X::store(p, sum);
+// Rows of a block from its column 0 on, the same columns in the same vectors for all: what has just been stored is read
+// as it was stored, which the processor does without waiting for the cache.
+struct SmallRows {
+  static constexpr i64 kStep = kMostSmallColumns;
+  static constexpr int kWidth = X::kWidth;
+
+  const Block& block;
+  double* diag;
+  Pivots& pivots;
+  int vectors;
+  int last;  // lanes of the last of them
+  alignas(64) double row[kMostSmallRows * kStep];
+
+  SmallRows(const Block& b, double* d, Pivots& p) : block(b), diag(d), pivots(p) {
+    const int columns = static_cast<int>(b.length + 1);
+    vectors = (columns + kWidth - 1) / kWidth;
+    last = columns - (vectors - 1) * kWidth;
   }
-  if (n <= 0) return;
-  const int last = static_cast<int>(n);
-  V sum = X::load(p, last);
+};
+
+// Row kRow += sum over the rows above of factor[q] * row q.
+template <int kRow>
+SM_TILE_INLINE void add_rows_above(SmallRows& s, const double* factor) {
+  using V = typename X::Vector;
+  const double* from = s.block.row(kRow);
+  for (int v = (kRow + 1) / SmallRows::kWidth; v < s.vectors; ++v) {
+    const i64 at = v * X::kWidth;
+    V total = v + 1 < s.vectors ? X::load(from + at) : X::load(from + at, s.last);
 #pragma GCC unroll 8
-  for (int q = 0; q < kDepth; source += step - q, ++q) sum = X::fma(X::all(factor[q]), X::load(source, last), sum);
-  X::store(p, sum, last);
+    for (int q = 0; q < kRow; ++q) {
+      total = X::fma(X::all(factor[q]), X::load(s.row + q * SmallRows::kStep + at), total);
+    }
+    X::store(s.row + kRow * SmallRows::kStep + at, total);
+  }
 }
 
 // Row by row from row kRow on: what the rows above have for it, which turn into multipliers in its column, and its
 // pivot.
 template <int kRow>
-SM_TILE_TARGET SmStatus factor_rows(const Block& b, double* diag, Pivots& pivots) {
+SM_TILE_TARGET SmStatus factor_rows(SmallRows& s) {
   if constexpr (kRow < kMostSmallRows) {
-    if (kRow == b.width) return SM_OK;
+    if (kRow == s.block.width) return SM_OK;
     double factor[kRow + 1];
-    const i64 step = b.length - 1;
-    double d = diag[kRow];
-    double* above = b.values + kRow - 1;  // the row's column in the first row
+    double d = s.diag[kRow];
+    double* above = s.row + kRow;
 #pragma GCC unroll 8
-    for (int q = 0; q < kRow; above += step - q, ++q) {
+    for (int q = 0; q < kRow; ++q, above += SmallRows::kStep) {
       const double u = *above;
-      *above = factor[q] = -u * diag[q];
+      factor[q] = -u * s.diag[q];
       d += u * factor[q];
     }
-    SM_TRY(pivots.judge(b.first + kRow, d, diag[kRow]));
-    add_few_rows<kRow>(b.row(kRow) + kRow + 1, b.length - kRow, b.values + kRow, step, factor);
-    return factor_rows<kRow + 1>(b, diag, pivots);
+    add_rows_above<kRow>(s, factor);
+    SM_TRY(s.pivots.judge(s.block.first + kRow, d, s.diag[kRow]));
+    above = s.block.values + kRow - 1;
+    const i64 step = s.block.length - 1;
+#pragma GCC unroll 8
+    for (int q = 0; q < kRow; above += step - q, ++q) *above = factor[q];
+    return factor_rows<kRow + 1>(s);
   } else {
     return SM_OK;
   }
 }
 
-SM_TILE_TARGET SmStatus factor_small(const Block& b, double* diag, Pivots& pivots) {
-  return factor_rows<0>(b, diag, pivots);
+SM_TILE_INLINE void copy_row(const double* from, i64 n, double* to) {
+  for (; n > X::kWidth; n -= X::kWidth, from += X::kWidth, to += X::kWidth) X::store(to, X::load(from));
+  if (n > 0) X::store(to, X::load(from, static_cast<int>(n)), static_cast<int>(n));
 }
 
 // Some rows of the square, and a few vectors of their columns.
@@ -105,28 +125,47 @@ SM_TILE_TARGET inline void add_to_square(const double* factor, const double* sou
   }
 }
 
-// Some rows at a time are copied to where they begin on lines of the cache and end in zeros.
-SM_TILE_TARGET void add_square(i64 width, i64 count, double* value, i64 step, const double* pivot, double* sum) {
+// Some rows at a time are copied to where they begin on lines of the cache and end in zeros. from(r): row r of V behind
+// the block's own columns.
+template <class From>
+SM_TILE_INLINE void add_square_of(const Block& b, const double* pivot, From from, double* sum) {
   using V = typename X::Vector;
   constexpr int kVectors = kMostSharedColumns / X::kWidth;
   alignas(64) double source[kMostSmallRows * kMostSharedColumns];
   alignas(64) double factor[kMostSmallRows * kMostSharedColumns];
-  for (i64 r = 0; r < width; r += kMostSmallRows) {
-    const i64 depth = std::min(kMostSmallRows, width - r);
+  const i64 count = b.tail_length();
+  for (i64 r = 0; r < b.width; r += kMostSmallRows) {
+    const i64 depth = std::min(kMostSmallRows, b.width - r);
     for (i64 q = 0; q < depth; ++q) {
       const V scale = X::all(-pivot[r + q]);
+      const double* value = from(r + q);
+      double* out = b.row(r + q) + b.width;
 #pragma GCC unroll 8
       for (int v = 0; v < kVectors; ++v) {
-        const i64 from = v * X::kWidth;
-        const int lanes = static_cast<int>(std::min(X::kWidth, count - from));
-        const V row = lanes > 0 ? X::load(value + from, lanes) : X::zero();
+        const i64 at = v * X::kWidth;
+        const int lanes = static_cast<int>(std::min(X::kWidth, count - at));
+        const V row = lanes > 0 ? X::load(value + at, lanes) : X::zero();
         const V multipliers = X::fma(row, scale, X::zero());
-        X::store(source + q * kMostSharedColumns + from, row);
-        X::store(factor + q * kMostSharedColumns + from, multipliers);
-        if (lanes > 0) X::store(value + from, multipliers, lanes);
+        X::store(source + q * kMostSharedColumns + at, row);
+        X::store(factor + q * kMostSharedColumns + at, multipliers);
+        if (lanes > 0) X::store(out + at, multipliers, lanes);
       }
-      value += step - (r + q);
     }
     add_to_square(factor, source, depth, count, sum);
   }
+}
+
+SM_TILE_TARGET void add_square(const Block& b, const double* pivot, double* sum) {
+  add_square_of(b, pivot, [&b](i64 r) SM_TILE_TARGET { return b.row(r) + b.width; }, sum);
+}
+
+SM_TILE_TARGET SmStatus factor_small(const Block& b, double* diag, Pivots& pivots, double* sum) {
+  SmallRows s(b, diag, pivots);
+  SM_TRY(factor_rows<0>(s));
+  if (sum) {
+    add_square_of(b, diag, [&s](i64 r) SM_TILE_TARGET { return s.row + r * SmallRows::kStep + s.block.width; }, sum);
+    return SM_OK;
+  }
+  for (i64 r = 0; r < b.width; ++r) copy_row(s.row + r * SmallRows::kStep + b.width, b.tail_length(), b.row(r) + b.width);
+  return SM_OK;
 }

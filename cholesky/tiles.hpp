@@ -13,6 +13,7 @@ class Pivots;
 
 inline constexpr int kMostStripRows = 8;  // of any set
 inline constexpr i64 kMostSmallRows = 8;
+inline constexpr i64 kMostSmallColumns = 32;  // of a small block, its own ones included
 inline constexpr i64 kMostSharedColumns = 16;
 
 // Rows of doubles that are read together. Row s + 1 begins `step` behind row s, and the step falls by `shrink` from row
@@ -54,11 +55,11 @@ struct TileKernels {
   // them left out.
   void (*spread)(int rows, const double* sums, i64 sums_step, i64 first, const Run* run, const Run* end,
                  double* const* target);
-  // A block of at most kMostSmallRows rows, as factor_block; diag: of the block's first row.
-  SmStatus (*factor_small)(const Block& block, double* diag, Pivots& pivots);
-  // The square of kMostSharedColumns += -V' D V of the first `count` columns of some rows, the first of them at
-  // `value`, on and above its diagonal; what is below is spoiled. The rows are left as multipliers.
-  void (*add_square)(i64 width, i64 count, double* value, i64 step, const double* pivot, double* sum);
+  // A small block; diag: of its first row. With a square to add to, as add_square too.
+  SmStatus (*factor_small)(const Block& block, double* diag, Pivots& pivots, double* square);
+  // The square of kMostSharedColumns += -V' D V of the tail of a finished block, on and above the diagonal; what is
+  // below is spoiled. The tail is left as multipliers.
+  void (*add_square)(const Block& block, const double* pivot, double* square);
 };
 
 enum class TileSet { portable, avx2, avx512 };
