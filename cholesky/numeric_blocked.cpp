@@ -53,9 +53,9 @@ void add_rows(double* target, const Place* to, i64 count, const double* source, 
   }
 }
 
-// Row k of A behind its diagonal, which is answered, into a row of U; place(j) is where column j is.
-template <class Place>
-[[gnu::noinline]] double enter_row(const SmMatrix& m, i64 k, Place place, double* row) {
+// Row k of A behind its diagonal, which is answered, into a row of U; place[j] is where column j is. Not inlined: the
+// loop needs all registers.
+[[gnu::noinline]] double enter_row(const SmMatrix& m, i64 k, const i64* place, double* row) {
   const i64 begin = m.row_start[m.perm[k]];
   const i64 end = m.row_start[m.perm[k] + 1];
   const i64* const column = m.col_index;
@@ -65,7 +65,7 @@ template <class Place>
   for (i64 p = begin; p < end; ++p) {
     const i64 j = inv_perm[column[p]];
     if (j > k) {
-      row[place(j)] = value[p];
+      row[place[j]] = value[p];
     } else if (j == k) {
       d = value[p];
     }
@@ -178,19 +178,10 @@ void BlockedRows::load_block(const Target& target) {
   std::fill_n(b.values, b.row(b.width) + b.width + 1 - b.values, 0.0);
   for (i64 r = 0; r < b.width; ++r) place_[b.first + r] = r;
   for (i64 j = 0; j < b.tail_length(); ++j) place_[b.tail[j]] = b.width + j;
-  const i64 tail = b.tail_length();
-  const i64 end = b.first + b.width;
-  const i64 gap = tail > 0 ? b.tail[0] - end : 0;
-  const bool in_one_run = tail == 0 || b.tail[tail - 1] - b.tail[0] == tail - 1;
-  const auto place_in_run = [first = b.first, end, gap](i64 j) { return j - first - (j < end ? 0 : gap); };
   double diagonal[kMostBlockRows];
   for (i64 r = 0; r < b.width; ++r) {
-    //ahead_.past(b.first + r);
-    if (in_one_run) {
-      diagonal[r] = enter_row(m, b.first + r, place_in_run, b.row(r));
-    } else {
-      diagonal[r] = enter_row(m, b.first + r, [place = place_](i64 j) { return place[j]; }, b.row(r));
-    }
+    ahead_.past(b.first + r);
+    diagonal[r] = enter_row(m, b.first + r, place_, b.row(r));
   }
   std::copy_n(diagonal, b.width, a_.diag + b.first);
 }
