@@ -83,12 +83,15 @@ void FrontStack::replace(i64 block, i64 order) {
 
 class Inversion {
  public:
-  Inversion(const InverseRows& z, FrontStack& fronts, InverseWork& work) : z_(z), fronts_(fronts), work_(work) {}
+  Inversion(const InverseRows& z, FrontStack& fronts, InverseWork& work) : z_(z), fronts_(fronts), work_(work) {
+    work_.tail_length = -1;
+  }
   void run();
 
  private:
   void invert(i64 first);
-  void copy_tail(const Block& u, const Front* parent, const Square& z);
+  void copy_tail(const Block& u, const Front* parent, const Square& behind);
+  void invert_small_leaf(const Block& u, const Front* parent);
   void invert_row(const Block& u, const Square& z);
   void invert_leaf(const Block& u, const Front* parent);
   void store(const Block& u, const Square& z);
@@ -99,9 +102,8 @@ class Inversion {
 };
 
 // The square behind the block's own columns.
-void Inversion::copy_tail(const Block& u, const Front* parent, const Square& z) {
+void Inversion::copy_tail(const Block& u, const Front* parent, const Square& behind) {
   const i64 tail = u.tail_length();
-  const Square behind = {z.row(u.width) + u.width, z.step};
   if (!parent) {
     gather(z_, {u.tail, 0, tail, 0, tail}, behind, work_.place);
     return;
@@ -166,6 +168,18 @@ void Inversion::invert_leaf(const Block& u, const Front* parent) {
   z_.diag[u.first] = z_.u.diag[u.first] + diagonal;
 }
 
+// A few rows without children.
+void Inversion::invert_small_leaf(const Block& u, const Front* parent) {
+  const i64 tail = u.tail_length();
+  if (tail != work_.tail_length || !std::equal(u.tail, u.tail + tail, work_.tail)) {
+    std::fill_n(work_.behind, tail * kMostSmallTail, 0.0);
+    copy_tail(u, parent, {work_.behind, kMostSmallTail});
+    work_.tail = u.tail;
+    work_.tail_length = tail;
+  }
+  tile_kernels().invert_small(u, z_.u.diag + u.first, work_.behind, z_.at(u.first), z_.diag + u.first);
+}
+
 void Inversion::store(const Block& u, const Square& z) {
   const Block out = z_.at(u.first);
   for (i64 r = 0; r < u.width; ++r) {
@@ -185,6 +199,10 @@ void Inversion::invert(i64 first) {
     invert_leaf(u, parent);
     return;
   }
+  if (!single && !keep && u.width <= kMostSmallRows && u.tail_length() <= kMostSmallTail) {
+    invert_small_leaf(u, parent);
+    return;
+  }
   double* room = order <= kMostFrontOrder ? fronts_.room(order) : nullptr;
   if (!room) {
     invert_in_panels(z_, first, work_);
@@ -192,7 +210,7 @@ void Inversion::invert(i64 first) {
   }
   const Square z = {room, order};
   std::fill_n(room, u.width * order, 0.0);
-  copy_tail(u, parent, z);
+  copy_tail(u, parent, {z.row(u.width) + u.width, z.step});
   if (single) {
     invert_row(u, z);
   } else {

@@ -14,6 +14,7 @@ class Pivots;
 inline constexpr int kMostStripRows = 8;  // of any set
 inline constexpr i64 kMostSmallRows = 8;
 inline constexpr i64 kMostSmallColumns = 32;  // of a small block, its own ones included
+inline constexpr i64 kMostSmallTail = kMostSmallColumns - kMostSmallRows;
 inline constexpr i64 kMostSharedColumns = 16;
 
 // Rows of doubles that are read together. Row s + 1 begins `step` behind row s, and the step falls by `shrink` from row
@@ -60,6 +61,9 @@ struct TileKernels {
   // The square of kMostSharedColumns += -V' D V of the tail of a finished block, on and above the diagonal; what is
   // below is spoiled. The tail is left as multipliers.
   void (*add_square)(const Block& block, const double* pivot, double* square);
+  // The inverse in the rows of a small block with a tail of at most kMostSmallTail columns. behind: the inverse on the
+  // tail, rows kMostSmallTail apart, to the end of the last vector of each.
+  void (*invert_small)(const Block& u, const double* diag, const double* behind, const Block& out, double* out_diag);
 };
 
 enum class TileSet { portable, avx2, avx512 };

@@ -35,8 +35,10 @@ struct X {
 #include "cholesky/tiles_body.hpp"
 //
 #include "cholesky/small_body.hpp"
+//
+#include "cholesky/small_inverse_body.hpp"
 
-const TileKernels kKernels = {"AVX2", X::kRows, X::kVectors* X::kWidth, strip, pack, spread, factor_small, add_square};
+const TileKernels kKernels = {"AVX2", X::kRows, X::kVectors* X::kWidth, strip, pack, spread, factor_small, add_square, invert_small};
 
 }  // namespace
 
