@@ -83,7 +83,9 @@ void FrontStack::replace(i64 block, i64 order) {
 
 class Inversion {
  public:
-  Inversion(const InverseRows& z, FrontStack& fronts, InverseWork& work) : z_(z), fronts_(fronts), work_(work) {
+  // Without leaves only the diagonal is kept of blocks that no other one needs.
+  Inversion(const InverseRows& z, bool leaves, FrontStack& fronts, InverseWork& work)
+      : z_(z), leaves_(leaves), fronts_(fronts), work_(work) {
     work_.tail_length = -1;
   }
   void run();
@@ -94,9 +96,10 @@ class Inversion {
   void invert_small_leaf(const Block& u, const Front* parent);
   void invert_row(const Block& u, const Square& z);
   void invert_leaf(const Block& u, const Front* parent);
-  void store(const Block& u, const Square& z);
+  void store(const Block& u, const Square& z, bool rows);
 
   const InverseRows& z_;
+  bool leaves_;
   FrontStack& fronts_;
   InverseWork& work_;
 };
@@ -143,7 +146,7 @@ void Inversion::invert_row(const Block& u, const Square& z) {
 void Inversion::invert_leaf(const Block& u, const Front* parent) {
   const i64 tail = u.length;
   const double* v = u.values;
-  double* y = z_.values + z_.u.iu[u.first];
+  double* y = leaves_ ? z_.values + z_.u.iu[u.first] : work_.panel;
   i64* place = work_.place;
   if (parent) find_places(z_.tree.at(parent->block), u.tail, 0, tail, place);
   Block b = {-1, 0, 0, nullptr, nullptr};
@@ -177,14 +180,15 @@ void Inversion::invert_small_leaf(const Block& u, const Front* parent) {
     work_.tail = u.tail;
     work_.tail_length = tail;
   }
-  tile_kernels().invert_small(u, z_.u.diag + u.first, work_.behind, z_.at(u.first), z_.diag + u.first);
+  const Block out = z_.at(u.first);
+  tile_kernels().invert_small(u, z_.u.diag + u.first, work_.behind, leaves_ ? &out : nullptr, z_.diag + u.first);
 }
 
-void Inversion::store(const Block& u, const Square& z) {
+void Inversion::store(const Block& u, const Square& z, bool rows) {
   const Block out = z_.at(u.first);
   for (i64 r = 0; r < u.width; ++r) {
     const double* from = z.row(r);
-    std::copy(from + r + 1, from + u.length + 1, out.row(r) + r + 1);
+    if (rows) std::copy(from + r + 1, from + u.length + 1, out.row(r) + r + 1);
     z_.diag[u.first + r] = from[r];
   }
 }
@@ -216,7 +220,7 @@ void Inversion::invert(i64 first) {
   } else {
     solve_square(u, z_.u.diag + first, z, order, work_);
   }
-  store(u, z);
+  store(u, z, keep || leaves_);
   if (!keep) return;
   if (parent && z_.tree.sibling(first) < 0) {
     fronts_.replace(first, order);
@@ -241,7 +245,7 @@ i64 front_values(const BlockTree& tree) {
 
 }  // namespace
 
-SmStatus SelectedInverse::compute() {
+SmStatus SelectedInverse::compute(Wanted wanted) {
   const NumericArrays u(m_, m_.factor_scratch - m_.work);
   SM_TRY(need_pool(m_));
   SM_TRY(diag_.take(m_.pool, u.n));
@@ -254,7 +258,7 @@ SmStatus SelectedInverse::compute() {
   SM_TRY(room.take(m_.pool, capacity));
   SM_TRY(work.take(m_.pool, 1));
   FrontStack fronts(room.data(), capacity);
-  Inversion({u, tree, values_.data(), diag_.data()}, fronts, *work.data()).run();
+  Inversion({u, tree, values_.data(), diag_.data()}, wanted == Wanted::pattern, fronts, *work.data()).run();
   return SM_OK;
 }
 

@@ -65,7 +65,7 @@ SM_TILE_TARGET void add_rows_below(const SmallInverse& s, i64 columns, double* r
   }
 }
 
-SM_TILE_TARGET void invert_small(const Block& u, const double* diag, const double* behind, const Block& out,
+SM_TILE_TARGET void invert_small(const Block& u, const double* diag, const double* behind, const Block* out,
                                  double* out_diag) {
   SmallInverse s;
   s.width = static_cast<int>(u.width);
@@ -78,9 +78,7 @@ SM_TILE_TARGET void invert_small(const Block& u, const double* diag, const doubl
     for (int r = s.width; r < SmallInverse::kOwnStep; ++r) to[r] = 0.0;
   }
   many_sums(s.width, s.v, s.width, s.tail, s.turned, SmallInverse::kOwnStep, s.width, s.own, SmallInverse::kOwnStep);
-  add_rows_below(s, s.tail, s.y, SmallInverse::kStep);
   for (int r = 0; r < s.width; ++r) {
-    copy_row(s.y + r * SmallInverse::kStep, s.tail, out.row(r) + s.width);
     if (diag[r] > 0.0) s.own[r * SmallInverse::kOwnStep + r] += diag[r];
   }
   add_rows_below(s, s.width, s.own, SmallInverse::kOwnStep);
@@ -93,6 +91,9 @@ SM_TILE_TARGET void invert_small(const Block& u, const double* diag, const doubl
   for (int r = 0; r < s.width; ++r) {
     const double* from = s.own_turned + r * SmallInverse::kOwnStep;
     out_diag[r] = from[r];
-    std::copy(from + r + 1, from + s.width, out.row(r) + r + 1);
+    if (out) std::copy(from + r + 1, from + s.width, out->row(r) + r + 1);
   }
+  if (!out) return;
+  add_rows_below(s, s.tail, s.y, SmallInverse::kStep);
+  for (int r = 0; r < s.width; ++r) copy_row(s.y + r * SmallInverse::kStep, s.tail, out->row(r) + s.width);
 }

@@ -62,8 +62,8 @@ struct TileKernels {
   // below is spoiled. The tail is left as multipliers.
   void (*add_square)(const Block& block, const double* pivot, double* square);
   // The inverse in the rows of a small block with a tail of at most kMostSmallTail columns. behind: the inverse on the
-  // tail, rows kMostSmallTail apart, to the end of the last vector of each.
-  void (*invert_small)(const Block& u, const double* diag, const double* behind, const Block& out, double* out_diag);
+  // tail, rows kMostSmallTail apart, to the end of the last vector of each. out: where the rows go, null for nowhere.
+  void (*invert_small)(const Block& u, const double* diag, const double* behind, const Block* out, double* out_diag);
 };
 
 enum class TileSet { portable, avx2, avx512 };
