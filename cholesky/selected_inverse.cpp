@@ -263,18 +263,12 @@ SmStatus SelectedInverse::compute(Wanted wanted) {
 }
 
 i64 SelectedInverse::place(const SmMatrix& m, i64 i, i64 j) {
-  if (i == j) return -1;
   const i64 row = std::min(m.inv_perm[i], m.inv_perm[j]);
+  if (i == j) return -1 - row;
   const i64 column = std::max(m.inv_perm[i], m.inv_perm[j]);
   const i64 length = m.factor_iu[row + 1] - m.factor_iu[row];
-  const i64 at = find_column(m.factor_ju + m.factor_iju[row], length, column);
-  return at < length ? m.factor_iu[row] + at : -2;
-}
-
-const double* SelectedInverse::find(i64 i, i64 j) const {
-  const i64 p = place(m_, i, j);
-  if (p < -1) return nullptr;
-  return p < 0 ? diag_.data() + m_.inv_perm[i] : values_.data() + p;
+  const i64 at = find_column_at_ends(m.factor_ju + m.factor_iju[row], length, column);
+  return at < length ? m.factor_iu[row] + at : kNowhere;
 }
 
 }  // namespace sm
