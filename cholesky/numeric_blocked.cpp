@@ -10,7 +10,8 @@
 //   blocks.hpp        what a block is, and the lists
 //   block_update.cpp  a block updates a later one: strips of coefficients -V D times the rows of the source
 //   block_factor.cpp  a block is factored
-//   tiles.hpp         the kernels under both
+//   shared_tails.hpp  what blocks with one tail have for it, summed beforehand
+//   tiles.hpp         the kernels under all of them
 //
 // Most blocks of two-dimensional and of pedigree matrices are single rows, and so are most updates. A single row
 // gathers its updates in the dense row, by column; a wider block in its stored rows, at places that the words of the

@@ -15,6 +15,7 @@
 //   block_tree.hpp      the tree, and the walk
 //   inverse_gather.cpp  Z on a tail from its rows
 //   inverse_square.cpp  the rows of a block from the square behind them
+//   small_inverse_body.hpp  the rows of a small leaf
 //   inverse_panels.cpp  the same for blocks that are too large for a square
 #include "cholesky/selected_inverse.hpp"
 

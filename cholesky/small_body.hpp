@@ -156,16 +156,19 @@ SM_TILE_INLINE void add_square_of(const Block& b, const double* pivot, From from
 }
 
 SM_TILE_TARGET void add_square(const Block& b, const double* pivot, double* sum) {
-  add_square_of(b, pivot, [&b](i64 r) SM_TILE_TARGET { return b.row(r) + b.width; }, sum);
+  add_square_of(
+      b, pivot, [&b](i64 r) SM_TILE_TARGET { return b.row(r) + b.width; }, sum);
 }
 
 SM_TILE_TARGET SmStatus factor_small(const Block& b, double* diag, Pivots& pivots, double* sum) {
   SmallRows s(b, diag, pivots);
   SM_TRY(factor_rows<0>(s));
   if (sum) {
-    add_square_of(b, diag, [&s](i64 r) SM_TILE_TARGET { return s.row + r * SmallRows::kStep + s.block.width; }, sum);
+    add_square_of(
+        b, diag, [&s](i64 r) SM_TILE_TARGET { return s.row + r * SmallRows::kStep + s.block.width; }, sum);
     return SM_OK;
   }
-  for (i64 r = 0; r < b.width; ++r) copy_row(s.row + r * SmallRows::kStep + b.width, b.tail_length(), b.row(r) + b.width);
+  for (i64 r = 0; r < b.width; ++r)
+    copy_row(s.row + r * SmallRows::kStep + b.width, b.tail_length(), b.row(r) + b.width);
   return SM_OK;
 }

@@ -36,7 +36,8 @@ struct X {
 //
 #include "cholesky/small_inverse_body.hpp"
 
-const TileKernels kKernels = {"AVX-512", X::kRows, X::kVectors* X::kWidth, strip, pack, spread, factor_small, add_square, invert_small};
+const TileKernels kKernels = {"AVX-512",  X::kRows,    X::kVectors* X::kWidth, strip, pack, spread, factor_small,
+                              add_square, invert_small};
 
 }  // namespace
 
