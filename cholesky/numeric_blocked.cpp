@@ -76,11 +76,12 @@ void add_rows(double* target, const Place* to, i64 count, const double* source, 
 
 class BlockedRows {
  public:
-  BlockedRows(const NumericArrays& a, Pivots& pivots, Panels& panels)
+  BlockedRows(const NumericArrays& a, Pivots& pivots, Panels& panels, SharedTails& shared)
       : a_(a),
         blocks_(a),
         pivots_(pivots),
         panels_(panels),
+        shared_(shared),
         ahead_(a.m, true),
         place_(reinterpret_cast<i64*>(a.diag)) {}
   SmStatus run();
@@ -101,8 +102,8 @@ class BlockedRows {
   const Blocks blocks_;
   Pivots& pivots_;
   Panels& panels_;
+  SharedTails& shared_;
   const LookAhead ahead_;
-  SharedTails shared_;
   i64* place_;  // the words of the dense row, as places
 };
 
@@ -252,7 +253,8 @@ SmStatus BlockedRows::run() {
 
 SmStatus factor_in_blocks(const NumericArrays& a, Pivots& pivots) {
   Panels panels;
-  return BlockedRows(a, pivots, panels).run();
+  SharedTails shared;
+  return BlockedRows(a, pivots, panels, shared).run();
 }
 
 }  // namespace sm
