@@ -105,8 +105,15 @@ SmStatus BlockFactor::run() {
 
 }  // namespace
 
-SmStatus factor_block(const Block& block, double* diag, Pivots& pivots, Panels& panels) {
-  return BlockFactor(block, diag, pivots, panels).run();
+SmStatus factor_block(const Block& block, double* diag, double* square, Pivots& pivots, Panels& panels) {
+  const TileKernels& tiles = tile_kernels();
+  double* own_diag = diag + block.first;
+  if (block.width <= kMostSmallRows && block.length < kMostSmallColumns) {
+    return tiles.factor_small(block, own_diag, pivots, square);
+  }
+  SM_TRY(BlockFactor(block, diag, pivots, panels).run());
+  if (square) tiles.add_square(block, own_diag, square);
+  return SM_OK;
 }
 
 }  // namespace sm

@@ -31,6 +31,7 @@ struct Target {
 void update_block(const Target& target, const Source& s, i64 rows, Panels& panels);
 
 // Factors the block, all of whose updates are in: pivots from diag, multipliers among its own rows, raw values behind.
-[[nodiscard]] SmStatus factor_block(const Block& block, double* diag, Pivots& pivots, Panels& panels);
+// With a square for its short tail (shared_tails.hpp) -V' D V of the tail is added to that, and multipliers are left.
+[[nodiscard]] SmStatus factor_block(const Block& block, double* diag, double* square, Pivots& pivots, Panels& panels);
 
 }  // namespace sm

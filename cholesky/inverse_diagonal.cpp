@@ -13,7 +13,7 @@ namespace {
 
 void sparse_diagonal(SmMatrix& m, double* x) {
   SelectedInverse inverse(m);
-  if (inverse.compute() != SM_OK) {
+  if (inverse.compute(SelectedInverse::Wanted::diagonal) != SM_OK) {
     diagonal_by_columns(m, x);
     return;
   }

@@ -25,13 +25,12 @@ SmStatus inverse_on_pattern(SmMatrix& m, double* values) {
   SM_TRY(need_closing_places(m));
   SelectedInverse inverse(m);
   SM_TRY(inverse.compute());
-  Scratch<double> stored;
-  SM_TRY(stored.take(m.pool, m.nnz));
-  double* z = stored.data();
-  for (i64 i = 0; i < m.rows; ++i) {
-    for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) z[p] = *inverse.find(i, m.col_index[p]);
+  for (i64 k = 0; k < m.rows; ++k) {  // rows of A lie in rows of U
+    const i64 i = m.perm[k];
+    for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
+      values[m.factor_reserved[p]] = inverse.at(SelectedInverse::place(m, i, m.col_index[p]));
+    }
   }
-  for (i64 p = 0; p < m.nnz; ++p) values[p] = z[m.factor_reserved[p]];
   return SM_OK;
 }
 

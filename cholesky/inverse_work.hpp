@@ -37,6 +37,10 @@ struct InverseWork {
   double coefficient[kMostBlockRows * kInversePanel];
   double square[kMostBlockRows * kMostBlockRows];
   i64 place[kMostFrontOrder];
+  // Z on the last short tail that was asked for: leaves that follow each other often have the same.
+  const i64* tail;
+  i64 tail_length;
+  double behind[kMostSmallTail * kMostSmallTail];
 };
 
 // place[j - begin] <- where column[j] is in the rows of block b, for ascending columns that are all there.

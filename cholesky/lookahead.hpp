@@ -9,7 +9,7 @@ namespace sm {
 
 class LookAhead {
  public:
-  LookAhead(const SmMatrix& m, bool values) : m_(m), values_(values) {}
+  LookAhead(const SmMatrix& m, bool values) : m_(m), values_(values), columns_(m.rows > kCached) {}
 
   // While row k is in work: each stage needs what the one before has fetched some rows earlier. Inlined by order: GCC
   // takes a function that only fetches for one without effect, and drops its calls.
@@ -22,6 +22,7 @@ class LookAhead {
       __builtin_prefetch(m_.col_index + p);
       if (values_) __builtin_prefetch(m_.nz_values + p);
     }
+    if (!columns_) return;
     const i64 row = m_.perm[k + kRows];
     const i64 end = std::min(m_.row_start[row + 1], m_.row_start[row] + kEntries);
     for (i64 p = m_.row_start[row]; p < end; ++p) __builtin_prefetch(m_.inv_perm + m_.col_index[p]);
@@ -30,9 +31,11 @@ class LookAhead {
  private:
   static constexpr i64 kRows = 8;
   static constexpr i64 kEntries = 8;
+  static constexpr i64 kCached = 50000;  // words that stay in the second-level cache anyway
 
   const SmMatrix& m_;
   bool values_;
+  bool columns_;
 };
 
 }  // namespace sm

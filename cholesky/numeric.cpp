@@ -2,23 +2,9 @@
 // the results; numeric_blocked.cpp does the work, numeric_rows.cpp is the plain road.
 #include "cholesky/numeric.hpp"
 
-#include <cmath>
-
 #include "store/checks.hpp"
 
 namespace sm {
-
-SmStatus Pivots::judge(i64 k, double d, double& reciprocal) {
-  const PivotLimits limits(m_.nz_values[m_.row_start[m_.perm[k]]], tolerance_);
-  if (d > limits.accept) {
-    reciprocal = 1.0 / d;
-    ++rank_;
-    log_sum_ += std::log(d);
-    return SM_OK;
-  }
-  reciprocal = 0.0;
-  return d < limits.refuse ? SM_NOT_DEFINITE : SM_OK;
-}
 
 namespace {
 

@@ -10,7 +10,8 @@
 //   blocks.hpp        what a block is, and the lists
 //   block_update.cpp  a block updates a later one: strips of coefficients -V D times the rows of the source
 //   block_factor.cpp  a block is factored
-//   tiles.hpp         the kernels under both
+//   shared_tails.hpp  what blocks with one tail have for it, summed beforehand
+//   tiles.hpp         the kernels under all of them
 //
 // Most blocks of two-dimensional and of pedigree matrices are single rows, and so are most updates. A single row
 // gathers its updates in the dense row, by column; a wider block in its stored rows, at places that the words of the
@@ -20,6 +21,7 @@
 
 #include "cholesky/block_work.hpp"
 #include "cholesky/lookahead.hpp"
+#include "cholesky/shared_tails.hpp"
 
 namespace sm {
 
@@ -52,13 +54,34 @@ void add_rows(double* target, const Place* to, i64 count, const double* source, 
   }
 }
 
+// Row k of A behind its diagonal, which is answered, into a row of U; place[j] is where column j is. Not inlined: the
+// loop needs all registers.
+[[gnu::noinline]] double enter_row(const SmMatrix& m, i64 k, const i64* place, double* row) {
+  const i64 begin = m.row_start[m.perm[k]];
+  const i64 end = m.row_start[m.perm[k] + 1];
+  const i64* const column = m.col_index;
+  const i64* const inv_perm = m.inv_perm;
+  const double* const value = m.nz_values;
+  double d = 0.0;
+  for (i64 p = begin; p < end; ++p) {
+    const i64 j = inv_perm[column[p]];
+    if (j > k) {
+      row[place[j]] = value[p];
+    } else if (j == k) {
+      d = value[p];
+    }
+  }
+  return d;
+}
+
 class BlockedRows {
  public:
-  BlockedRows(const NumericArrays& a, Pivots& pivots, Panels& panels)
+  BlockedRows(const NumericArrays& a, Pivots& pivots, Panels& panels, SharedTails& shared)
       : a_(a),
         blocks_(a),
         pivots_(pivots),
         panels_(panels),
+        shared_(shared),
         ahead_(a.m, true),
         place_(reinterpret_cast<i64*>(a.diag)) {}
   SmStatus run();
@@ -67,8 +90,10 @@ class BlockedRows {
   SmStatus single_row(i64 k);
   double load_row(i64 k);
   double update_row(i64 k, double d);
+  double add_shared_row(i64 k, double d);
   double subtract_block(const Source& s, double d);
   SmStatus block(i64 first);
+  void add_shared_rows(const Target& target);
   void load_block(const Target& target);
   void update_target(const Target& target, const Source& s);
   void subtract_products(const Target& target, const Source& s, i64 rows);
@@ -77,6 +102,7 @@ class BlockedRows {
   const Blocks blocks_;
   Pivots& pivots_;
   Panels& panels_;
+  SharedTails& shared_;
   const LookAhead ahead_;
   i64* place_;  // the words of the dense row, as places
 };
@@ -129,10 +155,19 @@ double BlockedRows::update_row(i64 k, double d) {
   return d;
 }
 
+double BlockedRows::add_shared_row(i64 k, double d) {
+  shared_.for_each_row_before(k + 1, [&](i64 i, const SharedTails::SharedTail& tail) {
+    d += tail.at(i, i);
+    for (i64 j = i + 1; j < tail.count; ++j) a_.diag[tail.column[j]] += tail.at(i, j);
+  });
+  return d;
+}
+
 SmStatus BlockedRows::single_row(i64 k) {
   const Block b = blocks_.at(k, 1);
   for (i64 j = 0; j < b.length; ++j) a_.diag[b.tail[j]] = 0.0;
-  const double d = update_row(k, load_row(k));
+  double d = update_row(k, load_row(k));
+  if (shared_.has_rows_before(k + 1)) d = add_shared_row(k, d);
   SM_TRY(pivots_.judge(k, d, a_.diag[k]));
   for (i64 j = 0; j < b.length; ++j) b.values[j] = a_.diag[b.tail[j]];
   blocks_.await(b);
@@ -143,21 +178,14 @@ void BlockedRows::load_block(const Target& target) {
   const SmMatrix& m = a_.m;
   const Block& b = target.block;
   std::fill_n(b.values, b.row(b.width) + b.width + 1 - b.values, 0.0);
+  for (i64 r = 0; r < b.width; ++r) place_[b.first + r] = r;
   for (i64 j = 0; j < b.tail_length(); ++j) place_[b.tail[j]] = b.width + j;
+  double diagonal[kMostBlockRows];
   for (i64 r = 0; r < b.width; ++r) {
-    const i64 k = b.first + r;
-    const i64 row = m.perm[k];
-    ahead_.past(k);
-    a_.diag[k] = 0.0;
-    for (i64 p = m.row_start[row]; p < m.row_start[row + 1]; ++p) {
-      const i64 j = m.inv_perm[m.col_index[p]];
-      if (j > k) {
-        b.row(r)[target.place_of(j)] = m.nz_values[p];
-      } else if (j == k) {
-        a_.diag[k] = m.nz_values[p];
-      }
-    }
+    ahead_.past(b.first + r);
+    diagonal[r] = enter_row(m, b.first + r, place_, b.row(r));
   }
+  std::copy_n(diagonal, b.width, a_.diag + b.first);
 }
 
 // The update of a few products.
@@ -191,13 +219,24 @@ void BlockedRows::update_target(const Target& target, const Source& s) {
   blocks_.await(s, rows);
 }
 
+void BlockedRows::add_shared_rows(const Target& target) {
+  const Block& b = target.block;
+  shared_.for_each_row_before(b.first + b.width, [&](i64 i, const SharedTails::SharedTail& tail) {
+    a_.diag[tail.column[i]] += tail.at(i, i);
+    double* row = b.row(tail.column[i] - b.first);
+    for (i64 j = i + 1; j < tail.count; ++j) row[target.place_of(tail.column[j])] += tail.at(i, j);
+  });
+}
+
 SmStatus BlockedRows::block(i64 first) {
   const Block b = blocks_.at(first, blocks_.width(first));
   const Target target = {b, place_, a_.diag};
   load_block(target);
   blocks_.for_each_waiting(first, [&](const Source& s) { update_target(target, s); });
-  SM_TRY(factor_block(b, a_.diag, pivots_, panels_));
-  blocks_.await(b);
+  if (shared_.has_rows_before(first + b.width)) add_shared_rows(target);
+  double* square = shared_.square_for(b);
+  SM_TRY(factor_block(b, a_.diag, square, pivots_, panels_));
+  if (!square) blocks_.await(b);
   return SM_OK;
 }
 
@@ -214,7 +253,8 @@ SmStatus BlockedRows::run() {
 
 SmStatus factor_in_blocks(const NumericArrays& a, Pivots& pivots) {
   Panels panels;
-  return BlockedRows(a, pivots, panels).run();
+  SharedTails shared;
+  return BlockedRows(a, pivots, panels, shared).run();
 }
 
 }  // namespace sm

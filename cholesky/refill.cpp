@@ -26,7 +26,8 @@ SmStatus refill(SmMatrix& m, const double* values) {
     std::copy_n(values, m.nnz, m.nz_values);
   } else {
     SM_TRY(need_closing_places(m));
-    for (i64 p = 0; p < m.nnz; ++p) m.nz_values[m.factor_reserved[p]] = values[p];
+    // In the order of the rows as they are: what few rows of the caller have for them is read in as many streams.
+    for (i64 p = 0; p < m.nnz; ++p) m.nz_values[p] = values[m.factor_reserved[p]];
   }
   if (m.state == SM_STATE_FACTORED) m.state = SM_STATE_SYMBOLIC;
   m.definite = -1;

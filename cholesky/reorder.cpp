@@ -136,7 +136,7 @@ void find_closing_places(const SmMatrix& m, i64* place, i64* scratch) {
   std::fill_n(start, n + 1, 0);
   for (i64 s = 0; s < m.nnz; ++s) ++start[row[s] + 1];
   to_offsets(start, n);
-  for (i64 s = 0; s < m.nnz; ++s) place[start[row[s]]++] = by_column[s];
+  for (i64 s = 0; s < m.nnz; ++s) place[by_column[s]] = start[row[s]]++;
 }
 
 SmStatus need_closing_places(SmMatrix& m) {
@@ -158,9 +158,7 @@ void restore_order(SmMatrix& m) {
   m.factor_diag = m.factor_values = nullptr;
   i64* place = m.work;
   i64* start = place + m.nnz;
-  i64* target = start + n + 1;
   find_closing_places(m, place, start);
-  for (i64 k = 0; k < m.nnz; ++k) target[place[k]] = k;
   std::fill_n(start, n + 1, 0);
   for_each_entry(m, [&](i64 p, i64 smaller, i64 larger) {
     ++start[smaller + 1];
@@ -168,7 +166,7 @@ void restore_order(SmMatrix& m) {
   });
   to_offsets(start, n);
   std::copy_n(start, n + 1, m.row_start);
-  permute_entries(m, target);
+  permute_entries(m, place);
 }
 
 }  // namespace sm

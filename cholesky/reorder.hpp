@@ -8,7 +8,7 @@ namespace sm {
 // Undoes reorder in the workspace that ordering left: upper triangle, columns ascending. Allocates nothing.
 void restore_order(SmMatrix& m);
 
-// place[k] <- where the entry is that was the k-th when closing wrote the rows.
+// place[p] <- which entry is at p, counted as they were when closing wrote the rows.
 void find_closing_places(const SmMatrix& m, i64* place, i64* scratch);
 inline i64 closing_places_scratch(const SmMatrix& m) { return m.rows + 1 + 2 * m.nnz; }
 

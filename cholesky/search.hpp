@@ -12,4 +12,15 @@ inline i64 find_column(const i64* list, i64 length, i64 c) {
   return length > 0 && *at == c ? at - list : length;
 }
 
+// The same where columns are often neighbours at either end of the list: those of its own block in a row of a factor,
+// and those of a border.
+inline i64 find_column_at_ends(const i64* list, i64 length, i64 c) {
+  if (length == 0) return 0;
+  const i64 from_front = c - list[0];
+  if (from_front >= 0 && from_front < length && list[from_front] == c) return from_front;
+  const i64 from_back = length - 1 - (list[length - 1] - c);
+  if (from_back >= 0 && from_back < length && list[from_back] == c) return from_back;
+  return find_column(list, length, c);
+}
+
 }  // namespace sm

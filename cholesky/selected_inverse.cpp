@@ -15,6 +15,7 @@
 //   block_tree.hpp      the tree, and the walk
 //   inverse_gather.cpp  Z on a tail from its rows
 //   inverse_square.cpp  the rows of a block from the square behind them
+//   small_inverse_body.hpp  the rows of a small leaf
 //   inverse_panels.cpp  the same for blocks that are too large for a square
 #include "cholesky/selected_inverse.hpp"
 
@@ -83,25 +84,30 @@ void FrontStack::replace(i64 block, i64 order) {
 
 class Inversion {
  public:
-  Inversion(const InverseRows& z, FrontStack& fronts, InverseWork& work) : z_(z), fronts_(fronts), work_(work) {}
+  // Without leaves only the diagonal is kept of blocks that no other one needs.
+  Inversion(const InverseRows& z, bool leaves, FrontStack& fronts, InverseWork& work)
+      : z_(z), leaves_(leaves), fronts_(fronts), work_(work) {
+    work_.tail_length = -1;
+  }
   void run();
 
  private:
   void invert(i64 first);
-  void copy_tail(const Block& u, const Front* parent, const Square& z);
+  void copy_tail(const Block& u, const Front* parent, const Square& behind);
+  void invert_small_leaf(const Block& u, const Front* parent);
   void invert_row(const Block& u, const Square& z);
   void invert_leaf(const Block& u, const Front* parent);
-  void store(const Block& u, const Square& z);
+  void store(const Block& u, const Square& z, bool rows);
 
   const InverseRows& z_;
+  bool leaves_;
   FrontStack& fronts_;
   InverseWork& work_;
 };
 
 // The square behind the block's own columns.
-void Inversion::copy_tail(const Block& u, const Front* parent, const Square& z) {
+void Inversion::copy_tail(const Block& u, const Front* parent, const Square& behind) {
   const i64 tail = u.tail_length();
-  const Square behind = {z.row(u.width) + u.width, z.step};
   if (!parent) {
     gather(z_, {u.tail, 0, tail, 0, tail}, behind, work_.place);
     return;
@@ -141,7 +147,7 @@ void Inversion::invert_row(const Block& u, const Square& z) {
 void Inversion::invert_leaf(const Block& u, const Front* parent) {
   const i64 tail = u.length;
   const double* v = u.values;
-  double* y = z_.values + z_.u.iu[u.first];
+  double* y = leaves_ ? z_.values + z_.u.iu[u.first] : work_.panel;
   i64* place = work_.place;
   if (parent) find_places(z_.tree.at(parent->block), u.tail, 0, tail, place);
   Block b = {-1, 0, 0, nullptr, nullptr};
@@ -166,11 +172,24 @@ void Inversion::invert_leaf(const Block& u, const Front* parent) {
   z_.diag[u.first] = z_.u.diag[u.first] + diagonal;
 }
 
-void Inversion::store(const Block& u, const Square& z) {
+// A few rows without children.
+void Inversion::invert_small_leaf(const Block& u, const Front* parent) {
+  const i64 tail = u.tail_length();
+  if (tail != work_.tail_length || !std::equal(u.tail, u.tail + tail, work_.tail)) {
+    std::fill_n(work_.behind, tail * kMostSmallTail, 0.0);
+    copy_tail(u, parent, {work_.behind, kMostSmallTail});
+    work_.tail = u.tail;
+    work_.tail_length = tail;
+  }
+  const Block out = z_.at(u.first);
+  tile_kernels().invert_small(u, z_.u.diag + u.first, work_.behind, leaves_ ? &out : nullptr, z_.diag + u.first);
+}
+
+void Inversion::store(const Block& u, const Square& z, bool rows) {
   const Block out = z_.at(u.first);
   for (i64 r = 0; r < u.width; ++r) {
     const double* from = z.row(r);
-    std::copy(from + r + 1, from + u.length + 1, out.row(r) + r + 1);
+    if (rows) std::copy(from + r + 1, from + u.length + 1, out.row(r) + r + 1);
     z_.diag[u.first + r] = from[r];
   }
 }
@@ -185,6 +204,10 @@ void Inversion::invert(i64 first) {
     invert_leaf(u, parent);
     return;
   }
+  if (!single && !keep && u.width <= kMostSmallRows && u.tail_length() <= kMostSmallTail) {
+    invert_small_leaf(u, parent);
+    return;
+  }
   double* room = order <= kMostFrontOrder ? fronts_.room(order) : nullptr;
   if (!room) {
     invert_in_panels(z_, first, work_);
@@ -192,13 +215,13 @@ void Inversion::invert(i64 first) {
   }
   const Square z = {room, order};
   std::fill_n(room, u.width * order, 0.0);
-  copy_tail(u, parent, z);
+  copy_tail(u, parent, {z.row(u.width) + u.width, z.step});
   if (single) {
     invert_row(u, z);
   } else {
     solve_square(u, z_.u.diag + first, z, order, work_);
   }
-  store(u, z);
+  store(u, z, keep || leaves_);
   if (!keep) return;
   if (parent && z_.tree.sibling(first) < 0) {
     fronts_.replace(first, order);
@@ -223,7 +246,7 @@ i64 front_values(const BlockTree& tree) {
 
 }  // namespace
 
-SmStatus SelectedInverse::compute() {
+SmStatus SelectedInverse::compute(Wanted wanted) {
   const NumericArrays u(m_, m_.factor_scratch - m_.work);
   SM_TRY(need_pool(m_));
   SM_TRY(diag_.take(m_.pool, u.n));
@@ -236,23 +259,17 @@ SmStatus SelectedInverse::compute() {
   SM_TRY(room.take(m_.pool, capacity));
   SM_TRY(work.take(m_.pool, 1));
   FrontStack fronts(room.data(), capacity);
-  Inversion({u, tree, values_.data(), diag_.data()}, fronts, *work.data()).run();
+  Inversion({u, tree, values_.data(), diag_.data()}, wanted == Wanted::pattern, fronts, *work.data()).run();
   return SM_OK;
 }
 
 i64 SelectedInverse::place(const SmMatrix& m, i64 i, i64 j) {
-  if (i == j) return -1;
   const i64 row = std::min(m.inv_perm[i], m.inv_perm[j]);
+  if (i == j) return -1 - row;
   const i64 column = std::max(m.inv_perm[i], m.inv_perm[j]);
   const i64 length = m.factor_iu[row + 1] - m.factor_iu[row];
-  const i64 at = find_column(m.factor_ju + m.factor_iju[row], length, column);
-  return at < length ? m.factor_iu[row] + at : -2;
-}
-
-const double* SelectedInverse::find(i64 i, i64 j) const {
-  const i64 p = place(m_, i, j);
-  if (p < -1) return nullptr;
-  return p < 0 ? diag_.data() + m_.inv_perm[i] : values_.data() + p;
+  const i64 at = find_column_at_ends(m.factor_ju + m.factor_iju[row], length, column);
+  return at < length ? m.factor_iu[row] + at : kNowhere;
 }
 
 }  // namespace sm

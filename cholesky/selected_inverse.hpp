@@ -1,27 +1,29 @@
 // The generalized inverse of a factored sparse matrix on the pattern of its factor.
 #pragma once
 
+#include <limits>
+
 #include "frame/memory.hpp"
 
 namespace sm {
 
 class SelectedInverse {
  public:
+  enum class Wanted { diagonal, pattern };
+
   explicit SelectedInverse(SmMatrix& m) : m_(m) {}
 
   // Of a symmetric sparse matrix in state 5, in memory from its pool; 101. Uses the record's factor_scratch.
-  [[nodiscard]] SmStatus compute();
+  [[nodiscard]] SmStatus compute(Wanted wanted = Wanted::pattern);
   // In the order of the factor.
   double diagonal(i64 k) const { return diag_.data()[k]; }
-  // Element (i, j) of the matrix's own numbering, null where U has none. Needs compute().
-  const double* find(i64 i, i64 j) const;
-  // Whether U has element (i, j).
-  static bool is_on_pattern(const SmMatrix& m, i64 i, i64 j) { return place(m, i, j) >= -1; }
+  // Where element (i, j) of the matrix's own numbering is, kNowhere when U has none. Needs a factor only.
+  static i64 place(const SmMatrix& m, i64 i, i64 j);
+  static constexpr i64 kNowhere = std::numeric_limits<i64>::min();
+  // What is there, after compute() of the pattern.
+  const double& at(i64 place) const { return place < 0 ? diag_.data()[-1 - place] : values_.data()[place]; }
 
  private:
-  // Where (i, j) is in the values of U; -1 for the diagonal, -2 for none.
-  static i64 place(const SmMatrix& m, i64 i, i64 j);
-
   SmMatrix& m_;
   Scratch<double> values_;
   Scratch<double> diag_;

@@ -8,7 +8,14 @@
 
 namespace sm {
 
+struct Block;
+class Pivots;
+
 inline constexpr int kMostStripRows = 8;  // of any set
+inline constexpr i64 kMostSmallRows = 8;
+inline constexpr i64 kMostSmallColumns = 32;  // of a small block, its own ones included
+inline constexpr i64 kMostSmallTail = kMostSmallColumns - kMostSmallRows;
+inline constexpr i64 kMostSharedColumns = 16;
 
 // Rows of doubles that are read together. Row s + 1 begins `step` behind row s, and the step falls by `shrink` from row
 // to row: 1 for rows of U where they stand, 0 for a packed panel. Tile t of the columns begins t * tile_step behind the
@@ -49,6 +56,14 @@ struct TileKernels {
   // them left out.
   void (*spread)(int rows, const double* sums, i64 sums_step, i64 first, const Run* run, const Run* end,
                  double* const* target);
+  // A small block; diag: of its first row. With a square to add to, as add_square too.
+  SmStatus (*factor_small)(const Block& block, double* diag, Pivots& pivots, double* square);
+  // The square of kMostSharedColumns += -V' D V of the tail of a finished block, on and above the diagonal; what is
+  // below is spoiled. The tail is left as multipliers.
+  void (*add_square)(const Block& block, const double* pivot, double* square);
+  // The inverse in the rows of a small block with a tail of at most kMostSmallTail columns. behind: the inverse on the
+  // tail, rows kMostSmallTail apart, to the end of the last vector of each. out: where the rows go, null for nowhere.
+  void (*invert_small)(const Block& u, const double* diag, const double* behind, const Block* out, double* out_diag);
 };
 
 enum class TileSet { portable, avx2, avx512 };

@@ -1,4 +1,5 @@
 // Tile kernels for AVX2 with FMA: strips of 4 rows, tiles of 12 columns, 12 of the 16 registers for the sums.
+#include "cholesky/blocks.hpp"
 #include "cholesky/tiles.hpp"
 
 #if defined(__x86_64__)
@@ -32,8 +33,13 @@ struct X {
 };
 
 #include "cholesky/tiles_body.hpp"
+//
+#include "cholesky/small_body.hpp"
+//
+#include "cholesky/small_inverse_body.hpp"
 
-const TileKernels kKernels = {"AVX2", X::kRows, X::kVectors* X::kWidth, strip, pack, spread};
+const TileKernels kKernels = {"AVX2",     X::kRows,    X::kVectors* X::kWidth, strip, pack, spread, factor_small,
+                              add_square, invert_small};
 
 }  // namespace
 

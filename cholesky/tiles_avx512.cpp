@@ -1,4 +1,5 @@
 // Tile kernels for AVX-512: strips of 8 rows, tiles of 24 columns, 24 of the 32 registers for the sums.
+#include "cholesky/blocks.hpp"
 #include "cholesky/tiles.hpp"
 
 #if defined(__x86_64__)
@@ -30,8 +31,13 @@ struct X {
 };
 
 #include "cholesky/tiles_body.hpp"
+//
+#include "cholesky/small_body.hpp"
+//
+#include "cholesky/small_inverse_body.hpp"
 
-const TileKernels kKernels = {"AVX-512", X::kRows, X::kVectors* X::kWidth, strip, pack, spread};
+const TileKernels kKernels = {"AVX-512",  X::kRows,    X::kVectors* X::kWidth, strip, pack, spread, factor_small,
+                              add_square, invert_small};
 
 }  // namespace
 

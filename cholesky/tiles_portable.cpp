@@ -2,6 +2,7 @@
 // factor has the same bits everywhere.
 #include <cstring>
 
+#include "cholesky/blocks.hpp"
 #include "cholesky/tiles.hpp"
 
 #define SM_TILE_TARGET
@@ -32,8 +33,13 @@ struct X {
 };
 
 #include "cholesky/tiles_body.hpp"
+//
+#include "cholesky/small_body.hpp"
+//
+#include "cholesky/small_inverse_body.hpp"
 
-const TileKernels kKernels = {"portable", X::kRows, X::kVectors* X::kWidth, strip, pack, spread};
+const TileKernels kKernels = {"portable", X::kRows,    X::kVectors* X::kWidth, strip, pack, spread, factor_small,
+                              add_square, invert_small};
 
 }  // namespace
 

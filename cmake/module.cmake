@@ -39,6 +39,7 @@ add_library(qxesm_objects OBJECT
   cholesky/refill.cpp
   cholesky/reorder.cpp
   cholesky/selected_inverse.cpp
+  cholesky/shared_tails.cpp
   cholesky/slabs.cpp
   cholesky/solve.cpp
   cholesky/sparse_solve.cpp

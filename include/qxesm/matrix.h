@@ -58,7 +58,7 @@ struct SmMatrix {
   int64_t* factor_iju;      /* n words: where row k's subscripts start in factor_ju */
   int64_t* factor_iu;       /* n + 1 words: row k of U is at factor_iu[k] .. factor_iu[k+1] - 1 */
   int64_t* factor_ju;       /* compressed column subscripts of U, in the new order */
-  int64_t* factor_reserved; /* null, or nnz words of its own: where each entry was moved, in closing order */
+  int64_t* factor_reserved; /* null, or nnz words of its own: the place of each entry in closing order */
   uint64_t* sym_roots;      /* symmetric sparse while open: the root array, row_capacity words */
 };
 

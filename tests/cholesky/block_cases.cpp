@@ -54,6 +54,55 @@ Graph bordered_clique(std::int64_t width, std::int64_t gap, std::int64_t tail) {
   return g;
 }
 
+Graph subjects(const std::vector<Indices>& tails, std::int64_t width, std::int64_t border) {
+  const auto own = static_cast<std::int64_t>(tails.size()) * width;
+  Graph g{own + border, {}};
+  for (std::size_t s = 0; s < tails.size(); ++s) {
+    const std::int64_t first = static_cast<std::int64_t>(s) * width;
+    for (std::int64_t i = first; i < first + width; ++i) {
+      for (std::int64_t j = i + 1; j < first + width; ++j) g.edges.emplace_back(i, j);
+      for (const std::int64_t b : tails[s]) g.edges.emplace_back(i, own + b);
+    }
+  }
+  return g;
+}
+
+std::vector<Indices> whole_tails(std::int64_t count, std::int64_t border) {
+  return std::vector<Indices>(at(count), natural_order(border));
+}
+
+std::vector<Indices> mixed_tails(Random& random, std::int64_t count, std::int64_t border) {
+  std::vector<Indices> parts(3);
+  for (Indices& part : parts) {
+    const std::int64_t share = 20 + random.below(81);
+    for (std::int64_t b = 0; b < border; ++b)
+      if (random.chance(share)) part.push_back(b);
+  }
+  std::vector<Indices> tails;
+  for (std::int64_t s = 0; s < count; ++s) tails.push_back(parts[at(random.below(3))]);
+  return tails;
+}
+
+Twins twin_subjects(Random& random, std::int64_t count, std::int64_t width, std::int64_t border) {
+  const std::int64_t own = count * width;
+  const std::int64_t n = own + border;
+  std::vector<std::vector<double>> x(at(n), std::vector<double>(at(n), 0.0));
+  std::int64_t rank = border;
+  for (std::int64_t first = 0; first < own; first += width) {
+    std::vector<std::int64_t> kind(at(width), 0);  // which unit vector a coefficient holds besides the common part
+    for (std::int64_t i = 1; i < width; ++i) kind[at(i)] = kind[at(i - 1)] + (random.chance(40) ? 0 : 1);
+    rank += kind.back() + 1;
+    for (std::int64_t i = 0; i < width; ++i) {
+      for (std::int64_t j = 0; j < width; ++j)
+        x[at(first + i)][at(first + j)] = 1.0 + (kind[at(i)] == kind[at(j)] ? 4.0 : 0.0);
+      for (std::int64_t b = 0; b < border; ++b)
+        x[at(first + i)][at(own + b)] = x[at(own + b)][at(first + i)] = 0.125 * static_cast<double>(b + 1);
+    }
+  }
+  for (std::int64_t b = 0; b < border; ++b) x[at(own + b)][at(own + b)] = 64.0 * static_cast<double>(n);
+  return {problem_of(x), rank};
+}
+
 Problem crossed_counts(Random& random, std::int64_t a, std::int64_t b) {
   const std::int64_t n = 1 + a + b;
   std::vector<std::vector<double>> x(at(n), std::vector<double>(at(n), 0.0));

@@ -4,6 +4,7 @@
 #include "cholesky/block_cases.hpp"
 #include "cholesky/block_work.hpp"
 #include "cholesky/cholesky_support.hpp"
+#include "cholesky/shared_tails.hpp"
 
 namespace sm::test {
 namespace {
@@ -172,6 +173,76 @@ TEST_P(BlockedTest, drops_pivots_anywhere_in_a_wide_block) {
   }
 }
 
+TEST_P(BlockedTest, agrees_with_the_rows_on_subjects_with_one_border) {
+  Random random(8);
+  for (std::int64_t width = 1; width <= 10; ++width)
+    for (std::int64_t border = 0; border <= 33; border += border < 18 ? 1 : 3)
+      for (const std::int64_t count : {1, 2, 3, 7}) {
+        compare(positive_definite(subjects(whole_tails(count, border), width, border), random), true);
+        if (HasFailure()) FAIL() << count << " subjects of " << width << " with a border of " << border;
+      }
+}
+
+TEST_P(BlockedTest, agrees_with_the_rows_on_subjects_with_parts_of_a_border) {
+  for (std::uint64_t seed = 0; seed < 400; ++seed) {
+    Random random(seed);
+    const std::int64_t border = 1 + random.below(40);
+    const std::vector<Indices> tails = mixed_tails(random, 1 + random.below(12), border);
+    compare(positive_definite(subjects(tails, 1 + random.below(9), border), random), random.chance(70));
+    if (HasFailure()) FAIL() << "seed " << seed;
+  }
+}
+
+TEST_P(BlockedTest, agrees_with_the_rows_on_a_clique_of_many_rows_beside_others_with_its_tail) {
+  Random random(9);
+  for (const std::int64_t width : {9, 17, 64, 129, 140})
+    for (const std::int64_t border : {1, 8, 10, 16}) {
+      compare(positive_definite(subjects(whole_tails(3, border), width, border), random), true);
+    }
+}
+
+TEST_P(BlockedTest, drops_pivots_anywhere_in_small_blocks) {
+  Random random(10);
+  for (std::int64_t width = 2; width <= 9; ++width)
+    for (std::int64_t border = 0; border <= 25; border += border < 18 ? 1 : 7) {
+      const Twins twins = twin_subjects(random, 4, width, border);
+      EXPECT_EQ(compare(twins.problem, true).rank, twins.rank);
+      if (HasFailure()) FAIL() << "width " << width << " border " << border;
+    }
+}
+
+TEST_P(BlockedTest, gives_up_in_a_small_block_where_the_rows_do) {
+  for (std::uint64_t seed = 0; seed < 200; ++seed) {
+    Random random(seed);
+    const std::int64_t border = random.below(20);
+    const std::vector<Indices> tails = mixed_tails(random, 6, border);
+    Problem problem = positive_definite(subjects(tails, 2 + random.below(7), border), random);
+    const std::int64_t bad = random.below(problem.n);
+    for (Entry& e : problem.upper)
+      if (e.row == bad && e.col == bad) e.value = -e.value;
+    EXPECT_EQ(compare(problem, true).status, SM_NOT_DEFINITE);
+    if (HasFailure()) FAIL() << "seed " << seed;
+  }
+}
+
+TEST_P(BlockedTest, the_log_determinant_holds_pivots_of_any_size) {
+  for (std::uint64_t seed = 0; seed < 40; ++seed) {
+    Random random(seed);
+    Problem problem = positive_definite(random.chance(50) ? grid(7, 8) : any_linked_cliques(random), random);
+    Indices exponent;
+    const std::int64_t most = seed % 2 == 0 ? 255 : 40;
+    for (std::int64_t k = 0; k < problem.n; ++k) exponent.push_back(random.below(2 * most + 1) - most);
+    for (Entry& e : problem.upper) {
+      e.value = std::ldexp(e.value, static_cast<int>(exponent[at(e.row)] + exponent[at(e.col)]));
+    }
+    const Outcome got = compare(problem, true);
+    ASSERT_EQ(got.rank, problem.n);
+    long double want = 0.0L;
+    for (const double reciprocal : got.reciprocals) want -= std::log(static_cast<long double>(reciprocal));
+    EXPECT_NEAR(got.log_det, static_cast<double>(want), 1e-11 * (1.0 + std::fabs(static_cast<double>(want)))) << seed;
+  }
+}
+
 TEST_P(BlockedTest, gives_up_at_the_row_where_the_rows_do) {
   int refused = 0;
   for (std::uint64_t seed = 0; seed < 600; ++seed) {
@@ -206,7 +277,9 @@ TEST_P(BlockedTest, can_be_done_again_from_what_it_left) {
   EXPECT_EQ(bits(m->factor_diag, problem.n), d);
 }
 
-TEST_P(BlockedTest, its_work_memory_fits_the_stack_of_a_host) { EXPECT_LE(sizeof(Panels), 448U * 1024U); }
+TEST_P(BlockedTest, its_work_memory_fits_the_stack_of_a_host) {
+  EXPECT_LE(sizeof(Panels) + sizeof(SharedTails), 448U * 1024U);
+}
 
 TEST_P(BlockedTest, the_public_operations_take_either_road_to_the_same_record) {
   Random random(7);

@@ -7,6 +7,7 @@
 
 #include "cholesky/block_cases.hpp"
 #include "cholesky/inverse_work.hpp"
+#include "cholesky/search.hpp"
 #include "cholesky/steps.hpp"
 #include "cholesky/tiles.hpp"
 
@@ -29,6 +30,8 @@ class SelectedInverseTest : public ModuleTest {
   }
   // Every element of U's pattern, and only those, beside A^- from solves.
   static void expect_inverse(SmMatrix* m, const Dense& want, double tolerance) {
+    SelectedInverse diagonal(*m);
+    ASSERT_EQ(diagonal.compute(SelectedInverse::Wanted::diagonal), SM_OK);
     SelectedInverse z(*m);
     ASSERT_EQ(z.compute(), SM_OK);
     const double bound = tolerance * static_cast<double>(largest(want));
@@ -36,12 +39,13 @@ class SelectedInverseTest : public ModuleTest {
     for (std::int64_t k = 0; k < m->rows; ++k) {
       const std::int64_t i = m->perm[k];
       ASSERT_NEAR(z.diagonal(k), static_cast<double>(want(i, i)), bound) << "row " << k;
-      ASSERT_EQ(*z.find(i, i), z.diagonal(k));
+      ASSERT_EQ(diagonal.diagonal(k), z.diagonal(k));
+      ASSERT_EQ(z.at(SelectedInverse::place(*m, i, i)), z.diagonal(k));
       for (const std::int64_t c : rows[at(k)]) {
-        const double* element = z.find(m->perm[c], i);
-        ASSERT_NE(element, nullptr);
-        ASSERT_EQ(z.find(i, m->perm[c]), element);
-        ASSERT_NEAR(*element, static_cast<double>(want(i, m->perm[c])), bound) << "row " << k << " column " << c;
+        const std::int64_t place = SelectedInverse::place(*m, m->perm[c], i);
+        ASSERT_NE(place, SelectedInverse::kNowhere);
+        ASSERT_EQ(SelectedInverse::place(*m, i, m->perm[c]), place);
+        ASSERT_NEAR(z.at(place), static_cast<double>(want(i, m->perm[c])), bound) << "row " << k << " column " << c;
       }
     }
   }
@@ -119,7 +123,49 @@ TEST_P(SelectedInverseTest, agrees_with_solves_on_grids_trees_and_hubs) {
   check(positive_definite(elements(random, 200, 60, 12), random), false);
 }
 
-TEST_P(SelectedInverseTest, leaves_zeros_where_pivots_were_dropped) {
+TEST_P(SelectedInverseTest, agrees_with_solves_on_subjects_with_one_border) {
+  Random random(5);
+  for (std::int64_t width = 1; width <= 10; ++width)
+    for (const std::int64_t border : {0, 1, 2, 3, 4, 5, 7, 8, 9, 12, 15, 16, 17, 23, 24, 25, 33}) {
+      check(positive_definite(subjects(whole_tails(3, border), width, border), random), true);
+      if (HasFailure()) FAIL() << "width " << width << " border " << border;
+    }
+}
+
+TEST_P(SelectedInverseTest, agrees_with_solves_on_subjects_with_parts_of_a_border) {
+  for (std::uint64_t seed = 0; seed < 80; ++seed) {
+    Random random(seed);
+    const std::int64_t border = 1 + random.below(30);
+    const std::vector<Indices> tails = mixed_tails(random, 1 + random.below(7), border);
+    check(positive_definite(subjects(tails, 1 + random.below(9), border), random), random.chance(70));
+    if (HasFailure()) FAIL() << "seed " << seed;
+  }
+}
+
+TEST_P(SelectedInverseTest, leaves_zeros_for_pivots_that_were_dropped_in_small_blocks) {
+  Random random(6);
+  for (std::int64_t width = 2; width <= 9; ++width)
+    for (const std::int64_t border : {0, 1, 4, 7, 10, 16, 24, 25}) {
+      const Twins twins = twin_subjects(random, 3, width, border);
+      EXPECT_EQ(check(twins.problem, true, 1e-9), twins.rank);
+      if (HasFailure()) FAIL() << "width " << width << " border " << border;
+    }
+}
+
+TEST(FindColumnAtEnds, answers_as_a_search_from_the_front) {
+  for (std::uint64_t seed = 0; seed < 200; ++seed) {
+    Random random(seed);
+    Indices list;
+    for (std::int64_t c = 0; c < 40; ++c)
+      if (random.chance(20 + static_cast<std::int64_t>(seed) % 81)) list.push_back(c);
+    const auto length = static_cast<std::int64_t>(list.size());
+    for (std::int64_t c = -2; c < 43; ++c) {
+      ASSERT_EQ(find_column_at_ends(list.data(), length, c), std::find(list.begin(), list.end(), c) - list.begin());
+    }
+  }
+}
+
+TEST_P(SelectedInverseTest, leaves_zeros_where_where_pivots_were_dropped) {
   for (std::uint64_t seed = 0; seed < 150; ++seed) {
     Random random(seed);
     const Semidefinite s = cross_product(random, 1 + random.below(50), random.below(20), random.below(8));
