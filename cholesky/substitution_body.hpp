@@ -3,10 +3,6 @@
 //
 // Deliberately without an include guard.
 
-typedef double Lanes __attribute__((vector_size(kLanes * sizeof(double)), aligned(sizeof(double)), may_alias));
-
-#define SM_PASS_INLINE SM_PASS_TARGET __attribute__((always_inline)) inline
-
 // Rows first .. first + kRows - 1 of a block. Column c of a row, counted from the block's own first column on, is at
 // row[i][c], for c > first + i; those behind the strip have the numbers column[0 .. count).
 template <int kRows>
@@ -34,70 +30,14 @@ SM_PASS_INLINE Strip<kRows> strip_of(const FactorRows& f, i64 block, i64 first) 
   return s;
 }
 
-// One vector. Behind the strip eight columns are taken together.
-struct Single {
-  template <int kRows>
-  SM_PASS_INLINE static void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
-    double w[kRows];
-    for (int i = 0; i < kRows; ++i) w[i] = y[first + i];
-#pragma GCC unroll 8
-    for (int i = 0; i < kRows; ++i) {
-#pragma GCC unroll 8
-      for (int j = i + 1; j < kRows; ++j) w[j] += s.row[i][s.inside + j] * w[i];
-    }
-    i64 c = 0;
-    if constexpr (kRows > 1) {
-      for (; c + kLanes <= s.count; c += kLanes) {
-        Lanes sum = *reinterpret_cast<const Lanes*>(s.row[0] + s.behind + c) * w[0];
-#pragma GCC unroll 8
-        for (int i = 1; i < kRows; ++i) sum += *reinterpret_cast<const Lanes*>(s.row[i] + s.behind + c) * w[i];
-#pragma GCC unroll 8
-        for (int q = 0; q < kLanes; ++q) y[s.column[c + q]] += sum[q];
-      }
-    }
-    for (; c < s.count; ++c) {
-      double sum = s.row[0][s.behind + c] * w[0];
-#pragma GCC unroll 8
-      for (int i = 1; i < kRows; ++i) sum += s.row[i][s.behind + c] * w[i];
-      y[s.column[c]] += sum;
-    }
-    for (int i = 0; i < kRows; ++i) y[first + i] = f.diag[first + i] * w[i];
-  }
+constexpr int kMostRows = 8;
+constexpr i64 kAhead = 128;
 
-  template <int kRows>
-  SM_PASS_INLINE static void backward(const Strip<kRows>& s, i64 first, double* y) {
-    Lanes sum[kRows];
-#pragma GCC unroll 8
-    for (int i = 0; i < kRows; ++i) sum[i] = Lanes{};
-    i64 c = 0;
-    for (; c + kLanes <= s.count; c += kLanes) {
-      Lanes z;
-#pragma GCC unroll 8
-      for (int q = 0; q < kLanes; ++q) z[q] = y[s.column[c + q]];
-#pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) sum[i] += *reinterpret_cast<const Lanes*>(s.row[i] + s.behind + c) * z;
-    }
-    double w[kRows];
-    for (int i = 0; i < kRows; ++i) {
-      const Lanes& t = sum[i];
-      w[i] = ((t[0] + t[4]) + (t[2] + t[6])) + ((t[1] + t[5]) + (t[3] + t[7]));
-    }
-    for (; c < s.count; ++c) {
-      const double z = y[s.column[c]];
-#pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) w[i] += s.row[i][s.behind + c] * z;
-    }
-#pragma GCC unroll 8
-    for (int i = kRows - 1; i >= 0; --i) {
-#pragma GCC unroll 8
-      for (int j = i + 1; j < kRows; ++j) w[i] += s.row[i][s.inside + j] * w[j];
-      y[first + i] = w[i] += y[first + i];
-    }
-  }
-};
+#include "cholesky/substitution_single.hpp"
 
 // Eight vectors, one to a lane.
 struct Several {
+  static constexpr bool kNarrow = false;
   SM_PASS_INLINE static Lanes& at(double* y, i64 k) { return *reinterpret_cast<Lanes*>(y + k * kLanes); }
 
   template <int kRows>
@@ -140,58 +80,84 @@ struct Several {
   }
 };
 
-constexpr int kMostRows = 8;
-
 // A strip of `rows` <= kRows rows of a block.
 template <class Road, int kRows = kMostRows>
-SM_PASS_INLINE void forward_strip(const FactorRows& f, i64 block, i64 first, i64 rows, double* y) {
+SM_PASS_INLINE void forward_strip(Road& road, const FactorRows& f, i64 block, i64 first, i64 rows, double* y) {
   if constexpr (kRows > 1) {
     if (rows < kRows) {
-      forward_strip<Road, kRows - 1>(f, block, first, rows, y);
+      forward_strip<Road, kRows - 1>(road, f, block, first, rows, y);
       return;
     }
   }
-  Road::forward(f, strip_of<kRows>(f, block, first), first, y);
+  road.forward(f, strip_of<kRows>(f, block, first), first, y);
 }
 
 template <class Road, int kRows = kMostRows>
-SM_PASS_INLINE void backward_strip(const FactorRows& f, i64 block, i64 first, i64 rows, double* y) {
+SM_PASS_INLINE void backward_strip(Road& road, const FactorRows& f, i64 block, i64 first, i64 rows, double* y) {
   if constexpr (kRows > 1) {
     if (rows < kRows) {
-      backward_strip<Road, kRows - 1>(f, block, first, rows, y);
+      backward_strip<Road, kRows - 1>(road, f, block, first, rows, y);
       return;
     }
   }
-  Road::backward(strip_of<kRows>(f, block, first), first, y);
+  road.backward(strip_of<kRows>(f, block, first), first, y);
 }
 
+// The same for a block of one strip with a short tail.
+struct Narrow {
+  SharedTail tail;
+
+  static bool serves(const FactorRows& f, i64 block, i64 width) {
+    return width <= kMostRows && f.length(block) + 1 - width <= SharedTail::kMost;
+  }
+  template <int kRows>
+  SM_PASS_INLINE void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
+    Single::forward_narrow(f, s, first, tail, y);
+  }
+  template <int kRows>
+  SM_PASS_INLINE void backward(const Strip<kRows>& s, i64 first, double* y) {
+    Single::backward_narrow(s, first, tail, y);
+  }
+};
 template <class Road>
-SM_PASS_TARGET void forward_pass(const FactorRows& f, double* y) {
+SM_PASS_TARGET void forward_pass(const FactorRows& rows, double* y) {
+  const FactorRows f = rows;
+  Road road;
+  Narrow narrow;
   for (i64 block = 0; block < f.n;) {
-    i64 end = block + 1;
-    while (f.continues(end - 1)) ++end;
-    if (end == block + 1) {
-      Road::forward(f, strip_of<1>(f, block, block), block, y);
+    const i64 end = f.end_of_block(block);
+    if (Road::kNarrow && end - block > 1 && narrow.serves(f, block, end - block)) {
+      forward_strip(narrow, f, block, block, end - block, y);
     } else {
-      for (i64 k = block; k < end; k += kMostRows)
-        forward_strip<Road>(f, block, k, std::min<i64>(kMostRows, end - k), y);
+      if (Road::kNarrow) narrow.tail.flush(y);
+      if (end == block + 1) {
+        road.forward(f, strip_of<1>(f, block, block), block, y);
+      } else {
+        for (i64 k = block; k < end; k += kMostRows)
+          forward_strip(road, f, block, k, std::min<i64>(kMostRows, end - k), y);
+      }
     }
     block = end;
   }
 }
 
 template <class Road>
-SM_PASS_TARGET void backward_pass(const FactorRows& f, double* y) {
+SM_PASS_TARGET void backward_pass(const FactorRows& rows, double* y) {
+  const FactorRows f = rows;
+  Road road;
+  Narrow narrow;
   for (i64 end = f.n; end > 0;) {
     i64 block = end - 1;
     while (block > 0 && f.continues(block - 1)) --block;
     if (end == block + 1) {
-      Road::backward(strip_of<1>(f, block, block), block, y);
+      road.backward(strip_of<1>(f, block, block), block, y);
+    } else if (Road::kNarrow && narrow.serves(f, block, end - block)) {
+      backward_strip(narrow, f, block, block, end - block, y);
     } else {
       for (i64 k = end; k > block;) {
-        const i64 rows = std::min<i64>(kMostRows, k - block);
-        k -= rows;
-        backward_strip<Road>(f, block, k, rows, y);
+        const i64 rows_of_strip = std::min<i64>(kMostRows, k - block);
+        k -= rows_of_strip;
+        backward_strip(road, f, block, k, rows_of_strip, y);
       }
     }
     end = block;
