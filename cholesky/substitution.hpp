@@ -14,6 +14,7 @@
 namespace sm {
 
 inline constexpr int kLanes = 8;
+inline constexpr int kStripRows = 8;
 typedef double Lanes __attribute__((vector_size(kLanes * sizeof(double)), aligned(sizeof(double)), may_alias));
 
 struct FactorRows {
@@ -21,18 +22,9 @@ struct FactorRows {
       : n(m.rows), iju(m.factor_iju), iu(m.factor_iu), ju(m.factor_ju), values(m.factor_values), diag(m.factor_diag) {}
 
   i64 length(i64 k) const { return iu[k + 1] - iu[k]; }
+  const i64* columns(i64 k) const { return ju + iju[k]; }
   // Rows k and k + 1 have the same structure but for column k + 1.
-  bool continues(i64 k) const {
-    return k + 1 < n && length(k) > 0 && length(k + 1) == length(k) - 1 && ju[iju[k]] == k + 1;
-  }
-  // The block that begins with row k: its other rows are found in the subscripts of the first.
-  i64 end_of_block(i64 k) const {
-    const i64* column = ju + iju[k] - k - 1;
-    i64 left = length(k);
-    i64 end = k + 1;
-    while (end < n && left > 0 && length(end) == left - 1 && column[end] == end) ++end, --left;
-    return end;
-  }
+  bool continues(i64 k) const { return length(k) > 0 && length(k + 1) == length(k) - 1 && columns(k)[0] == k + 1; }
 
   i64 n;
   const i64 *iju, *iu, *ju;

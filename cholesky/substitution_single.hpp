@@ -32,10 +32,7 @@ class SharedTail {
   static constexpr i64 kMost = 4 * kLanes;
 
   SM_PASS_INLINE bool is(const i64* column, i64 count) const {
-    if (count != count_) return false;
-    i64 c = 0;
-    while (c < count && column[c] == column_[c]) ++c;
-    return c == count;
+    return count == count_ && Access::equal(column, column_, count);
   }
   SM_PASS_INLINE void become(const i64* column, i64 count) {
     column_ = column;
@@ -66,7 +63,7 @@ class SharedTail {
 };
 
 struct Single {
-  static constexpr bool kNarrow = true;
+  SharedTail tail;
 
   template <int kRows>
   SM_PASS_INLINE static void forward_triangle(const Strip<kRows>& s, const double* y, double (&w)[kRows]) {
@@ -75,7 +72,7 @@ struct Single {
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) {
 #pragma GCC unroll 8
-      for (int j = i + 1; j < kRows; ++j) w[j] += s.row[i][s.inside + j] * w[i];
+      for (int j = i + 1; j < kRows; ++j) w[j] += s.at(i)[j] * w[i];
     }
   }
 
@@ -87,15 +84,32 @@ struct Single {
     for (int i = kRows - 1; i >= 0; --i) {
       double sum = sums[i] + y[i];
 #pragma GCC unroll 8
-      for (int j = kRows - 1; j > i; --j) sum += s.row[i][s.inside + j] * w[j];
+      for (int j = kRows - 1; j > i; --j) sum += s.at(i)[j] * w[j];
       y[i] = w[i] = sum;
     }
   }
 
+  // What as many rows hold some way off, for narrow ones are over before a line of the cache has come.
+  template <int kRows>
+  SM_PASS_INLINE static void fetch_rows(const Strip<kRows>& s, i64 distance) {
+    const double* from = s.at(0) + 1 + distance;
+    const double* end = s.at(kRows - 1) + kRows + s.count + distance;
+    for (; from < end; from += kLanes) __builtin_prefetch(from);
+    __builtin_prefetch(s.column + (distance < 0 ? -kSubs : kSubs));
+    __builtin_prefetch(s.column + (distance < 0 ? -kSubs + 8 : kSubs + 8));
+  }
+
+  template <int kRows>
+  SM_PASS_INLINE static void fetch_single(const Strip<kRows>& s, i64 distance) {
+    __builtin_prefetch(s.at(0) + 1 + distance);
+    __builtin_prefetch(s.column + distance);
+  }
+
   // A block of kRows rows whose tail is at most SharedTail::kMost columns.
   template <int kRows>
-  SM_PASS_INLINE static void forward_narrow(const FactorRows& f, const Strip<kRows>& s, i64 first, SharedTail& tail,
-                                            double* y) {
+  SM_PASS_INLINE void forward_narrow(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
+    fetch_rows(s, kFarAhead);
+    fetch_row_words(f, first + kRowsAhead);
     double w[kRows];
     forward_triangle(s, y + first, w);
     const bool shared = tail.is(s.column, s.count);
@@ -105,9 +119,9 @@ struct Single {
     }
     for (i64 c = 0; c < s.count; c += kLanes) {
       const i64 lanes = std::min<i64>(kLanes, s.count - c);
-      Lanes sum = Access::load(s.row[0] + s.behind + c, lanes) * w[0];
+      Lanes sum = Access::load(s.at(0) + kRows + c, lanes) * w[0];
 #pragma GCC unroll 8
-      for (int i = 1; i < kRows; ++i) sum += Access::load(s.row[i] + s.behind + c, lanes) * w[i];
+      for (int i = 1; i < kRows; ++i) sum += Access::load(s.at(i) + kRows + c, lanes) * w[i];
       if (shared) {
         tail.add(c, sum);
       } else {
@@ -119,7 +133,9 @@ struct Single {
   }
 
   template <int kRows>
-  SM_PASS_INLINE static void backward_narrow(const Strip<kRows>& s, i64 first, SharedTail& tail, double* y) {
+  SM_PASS_INLINE void backward_narrow(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
+    fetch_rows(s, -kFarAhead);
+    fetch_row_words(f, first - kRowsAhead);
     if (!tail.is(s.column, s.count)) {
       tail.become(s.column, s.count);
       tail.gather(y);
@@ -131,56 +147,74 @@ struct Single {
       const i64 lanes = std::min<i64>(kLanes, s.count - c);
       const Lanes z = tail.at(c);
 #pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) sum[i] += Access::load(s.row[i] + s.behind + c, lanes) * z;
+      for (int i = 0; i < kRows; ++i) sum[i] += Access::load(s.at(i) + kRows + c, lanes) * z;
     }
     backward_triangle(s, sums_of(sum), y + first);
   }
 
   template <int kRows>
-  SM_PASS_INLINE static void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
+  SM_PASS_INLINE void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
+    if constexpr (kRows > 1) {
+      if (s.count <= SharedTail::kMost) {
+        forward_narrow(f, s, first, y);
+        return;
+      }
+    }
+    tail.flush(y);
+    if constexpr (kRows == 1) {
+      fetch_single(s, kSingleAhead);
+    }
     double w[kRows];
     forward_triangle(s, y + first, w);
     i64 c = 0;
     if constexpr (kRows > 1) {
       for (; c + kLanes <= s.count; c += kLanes) {
-        Lanes sum = *reinterpret_cast<const Lanes*>(s.row[0] + s.behind + c) * w[0];
+        Lanes sum = *reinterpret_cast<const Lanes*>(s.at(0) + kRows + c) * w[0];
 #pragma GCC unroll 8
-        for (int i = 1; i < kRows; ++i) sum += *reinterpret_cast<const Lanes*>(s.row[i] + s.behind + c) * w[i];
+        for (int i = 1; i < kRows; ++i) sum += *reinterpret_cast<const Lanes*>(s.at(i) + kRows + c) * w[i];
 #pragma GCC unroll 8
-        for (int i = 0; i < kRows; ++i) __builtin_prefetch(s.row[i] + s.behind + c + kAhead);
+        for (int i = 0; i < kRows; ++i) __builtin_prefetch(s.at(i) + kRows + c + kAhead);
 #pragma GCC unroll 8
         for (int q = 0; q < kLanes; ++q) y[s.column[c + q]] += sum[q];
       }
     }
     for (; c < s.count; ++c) {
-      double sum = s.row[0][s.behind + c] * w[0];
+      double sum = s.at(0)[kRows + c] * w[0];
 #pragma GCC unroll 8
-      for (int i = 1; i < kRows; ++i) sum += s.row[i][s.behind + c] * w[i];
+      for (int i = 1; i < kRows; ++i) sum += s.at(i)[kRows + c] * w[i];
       y[s.column[c]] += sum;
     }
     for (int i = 0; i < kRows; ++i) y[first + i] = f.diag[first + i] * w[i];
   }
 
   template <int kRows>
-  SM_PASS_INLINE static void backward(const Strip<kRows>& s, i64 first, double* y) {
+  SM_PASS_INLINE void backward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
+    if constexpr (kRows > 1) {
+      if (s.count <= SharedTail::kMost) {
+        backward_narrow(f, s, first, y);
+        return;
+      }
+    } else {
+      fetch_single(s, -kSingleAhead);
+    }
     Lanes sum[kRows];
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) sum[i] = Lanes{};
     i64 c = 0;
     for (; c + kLanes <= s.count; c += kLanes) {
 #pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) __builtin_prefetch(s.row[i] + s.behind + c + kAhead);
+      for (int i = 0; i < kRows; ++i) __builtin_prefetch(s.at(i) + kRows + c + kAhead);
       Lanes z;
 #pragma GCC unroll 8
       for (int q = 0; q < kLanes; ++q) z[q] = y[s.column[c + q]];
 #pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) sum[i] += *reinterpret_cast<const Lanes*>(s.row[i] + s.behind + c) * z;
+      for (int i = 0; i < kRows; ++i) sum[i] += *reinterpret_cast<const Lanes*>(s.at(i) + kRows + c) * z;
     }
     Lanes sums = sums_of(sum);
     for (; c < s.count; ++c) {
       const double z = y[s.column[c]];
 #pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) sums[i] += s.row[i][s.behind + c] * z;
+      for (int i = 0; i < kRows; ++i) sums[i] += s.at(i)[kRows + c] * z;
     }
     backward_triangle(s, sums, y + first);
   }
