@@ -64,6 +64,7 @@ extern "C" QxHost* qxhost_create(const QxHostOptions* options) {
 extern "C" void qxhost_destroy(QxHost* host) {
   if (!host) return;
   while (PoolHead* pool = host->pools) pool->table.destroy(&pool->table);
+  host->kept_pages.trim();
   sm::host::unload_all(host->loader);
   sm::host::discard_checker(host->checker);
   std::free(host);
@@ -82,6 +83,8 @@ extern "C" void* qxhost_load_extension(QxHost* host, const wchar_t* name, int64_
 extern "C" const char* qxhost_last_error(const QxHost* host) { return host->loader.error; }
 
 extern "C" void qxhost_set_memory_ceiling(QxHost* host, uint64_t bytes) { host->account.ceiling = bytes; }
+
+extern "C" void qxhost_trim(QxHost* host) { host->kept_pages.trim(); }
 
 extern "C" int32_t qxhost_set_pool_ceiling(QxHost* host, MemoryPool* pool, uint64_t bytes) {
   PoolHead* head = host->pools;

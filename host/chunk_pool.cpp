@@ -1,10 +1,8 @@
 // The pool of normal operation. Three tiers, told apart by a tag in front of each block:
 //   small   up to 4 KiB, from chunks, by size class; freed blocks wait in their class for the next request
 //   medium  each from malloc
-//   large   each from pages of its own: fresh pages are zero without being touched, and go back to the system at once
+//   large   each on pages of its own: fresh ones are zero without being touched; freed ones wait in the host for a while
 // Medium and large blocks are chained, so that destroying the pool finds them.
-#include <sys/mman.h>
-
 #include <bit>
 #include <cstdlib>
 #include <cstring>
@@ -18,8 +16,6 @@ constexpr std::uint64_t kSmall = 4096;
 constexpr std::uint64_t kLarge = std::uint64_t{128} << 10;
 constexpr std::uint64_t kFirstChunk = std::uint64_t{4} << 10;
 constexpr std::uint64_t kLastChunk = std::uint64_t{256} << 10;
-constexpr std::uint64_t kHugePage = std::uint64_t{2} << 20;
-constexpr std::uint64_t kHuge = std::uint64_t{4} << 20;  // from here on the block asks for huge pages
 
 constexpr std::uint32_t kClasses = 32;  // 16-byte steps up to 256, then four to a doubling
 constexpr std::uint32_t kMediumTier = kClasses;
@@ -52,7 +48,7 @@ struct Tag {
 struct BigHead {
   BigHead* previous;
   BigHead* next;
-  std::uint64_t span;  // bytes of the block with its head
+  std::uint64_t span;  // bytes of the memory that begins here
   std::uint64_t unused[3];
   Tag tag;
 };
@@ -112,39 +108,29 @@ void* take_small(ChunkPool& pool, std::uint64_t bytes, bool zero) {
   return block;
 }
 
-// Fresh zero pages, or null. Huge pages make the first touch of a very large block four times faster and its return
-// to the system twenty times (640 MB written once: 0.055 s for 0.248 s). The first one is left out, so that the head,
-// which is all that is ever touched of an unused block, costs a small page.
-void* map_pages(std::uint64_t span) {
-  void* pages = mmap(nullptr, span, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
-  if (pages == MAP_FAILED) return nullptr;
-  if (span >= kHuge) {
-    const std::uint64_t address = reinterpret_cast<std::uintptr_t>(pages);
-    const std::uint64_t skipped = kHugePage - address % kHugePage;
-    madvise(static_cast<char*>(pages) + skipped, span - skipped, MADV_HUGEPAGE);  // a hint: refusal changes nothing
-  }
-  return pages;
-}
+// A large block begins on its second page, the head ends the first.
+constexpr std::uint64_t kLargeHead = KeptPages::kPage;
 
 void* take_big(ChunkPool& pool, std::uint64_t bytes, bool zero) {
-  BigHead* head = nullptr;
-  const std::uint64_t span = sizeof(BigHead) + bytes;
+  Pages memory = {nullptr, sizeof(BigHead) + bytes};
   const bool large = bytes >= kLarge;
   if (large) {
-    head = static_cast<BigHead*>(map_pages(span));
+    memory = pool.host->kept_pages.take(kLargeHead + bytes, zero);
   } else {
-    head = static_cast<BigHead*>(zero ? std::calloc(1, span) : std::malloc(span));
+    memory.start = zero ? std::calloc(1, memory.span) : std::malloc(memory.span);
   }
-  if (!head) return nullptr;
-  *head = {nullptr, pool.big, span, {}, {bytes, large ? kLargeTier : kMediumTier, 0}};
-  if (pool.big) pool.big->previous = head;
-  pool.big = head;
-  return head + 1;
+  if (!memory.start) return nullptr;
+  auto* block = static_cast<char*>(memory.start) + (large ? kLargeHead : sizeof(BigHead));
+  BigHead& head = big_head_of(block);
+  head = {nullptr, pool.big, memory.span, {}, {bytes, large ? kLargeTier : kMediumTier, 0}};
+  if (pool.big) pool.big->previous = &head;
+  pool.big = &head;
+  return block;
 }
 
-void give_back(BigHead& head) {
+void give_back(ChunkPool& pool, BigHead& head) {
   if (head.tag.tier == kLargeTier) {
-    munmap(&head, head.span);
+    pool.host->kept_pages.give({reinterpret_cast<char*>(&head + 1) - kLargeHead, head.span});
   } else {
     std::free(&head);
   }
@@ -174,7 +160,7 @@ void free_block(MemoryPool* table, void* block) {
   BigHead& head = big_head_of(block);
   if (head.next) head.next->previous = head.previous;
   (head.previous ? head.previous->next : pool.big) = head.next;
-  give_back(head);
+  give_back(pool, head);
 }
 
 void destroy(MemoryPool* table) {
@@ -183,7 +169,7 @@ void destroy(MemoryPool* table) {
   retire(pool);
   while (BigHead* head = pool.big) {
     pool.big = head->next;
-    give_back(*head);
+    give_back(pool, *head);
   }
   while (Chunk* chunk = pool.chunks) {
     pool.chunks = chunk->next;

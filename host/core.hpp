@@ -8,6 +8,8 @@
 #include <cstdint>
 #include <initializer_list>
 
+#include "host/kept_pages.hpp"
+
 namespace sm::host {
 
 // Bytes handed out, counted as they were requested, against a ceiling (0: none).
@@ -75,6 +77,7 @@ struct QxHost {
   sm::host::PoolHead* pools;
   std::int64_t pools_live;
   bool ceiling_met;
+  sm::host::KeptPages kept_pages;
   sm::host::Loader loader;
   sm::host::Checker* checker;  // null outside the checking mode
 };

@@ -1,9 +1,12 @@
-// Gram-Schmidt with every projection made twice, which leaves nothing but rounding behind: L. Giraud, J. Langou,
-// M. Rozloznik, J. van den Eshof, "Rounding error analysis of the classical Gram-Schmidt orthogonalization process",
-// Numer. Math. 101 (2005) 87-100.
+// Gram-Schmidt in which what a projection has made much shorter is projected once more, which leaves nothing but
+// rounding behind: J. W. Daniel, W. B. Gragg, L. Kaufman, G. W. Stewart, "Reorthogonalization and stable algorithms for
+// updating the Gram-Schmidt QR factorization", Math. Comp. 30 (1976) 772-795; L. Giraud, J. Langou, M. Rozloznik,
+// J. van den Eshof, "Rounding error analysis of the classical Gram-Schmidt orthogonalization process", Numer. Math. 101
+// (2005) 87-100.
 #include "mixed/aliasing.hpp"
 
 #include <algorithm>
+#include <array>
 #include <cmath>
 #include <numeric>
 
@@ -14,6 +17,7 @@ namespace {
 
 constexpr double kSlack = 1e-11;
 constexpr double kDoubtful = 1e-4;  // what is left of a column when it is looked at twice
+constexpr double kShortened = 0.7;  // what is left of a column when it is projected twice
 constexpr int kLargestDenominator = 60;
 constexpr double kSmallPart = 1e-8;  // of a null vector: rounding
 // Beyond these the columns are not held as a dense array.
@@ -79,38 +83,105 @@ class Residual {
   Vector work_;
 };
 
+// A few columns side by side, so that the sums of one need not wait for each other.
+class ColumnGroup {
+ public:
+  static constexpr std::size_t kColumns = 4;
+  using Parts = std::array<double, kColumns>;
+
+  // Columns from `first` on, zeros past the last.
+  ColumnGroup(const WeightedColumns& x, std::int64_t first) : values_(static_cast<std::size_t>(x.rows())) {
+    for (std::size_t c = 0; c < kColumns && first + static_cast<std::int64_t>(c) < x.cols(); ++c) {
+      x.for_each(first + static_cast<std::int64_t>(c),
+                 [&](std::size_t row, double value) { values_[row][c] += value; });
+    }
+  }
+
+  // Takes the projections on the directions off, one after the other, and answers them.
+  std::vector<Parts> project(const std::vector<Vector>& directions) {
+    std::vector<Parts> parts(directions.size());
+    if (directions.empty()) return parts;
+    const std::size_t last = directions.size() - 1;
+    Parts part{};
+    for (std::size_t i = 0; i < values_.size(); ++i) {
+      for (std::size_t c = 0; c < kColumns; ++c) part[c] += directions[0][i] * values_[i][c];
+    }
+    for (std::size_t k = 0; k < last; ++k) {
+      parts[k] = part;
+      part = subtract_and_multiply(part, directions[k], directions[k + 1]);
+    }
+    parts[last] = part;
+    for (std::size_t i = 0; i < values_.size(); ++i) {
+      for (std::size_t c = 0; c < kColumns; ++c) values_[i][c] -= part[c] * directions[last][i];
+    }
+    return parts;
+  }
+
+  Vector column(std::size_t c) const {
+    Vector values(values_.size());
+    for (std::size_t i = 0; i < values.size(); ++i) values[i] = values_[i][c];
+    return values;
+  }
+
+ private:
+  Parts subtract_and_multiply(const Parts& factors, const Vector& b, const Vector& next) {
+    Parts sums{};
+    for (std::size_t i = 0; i < values_.size(); ++i) {
+      Parts& row = values_[i];
+      for (std::size_t c = 0; c < kColumns; ++c) {
+        row[c] -= factors[c] * b[i];
+        sums[c] += next[i] * row[c];
+      }
+    }
+    return sums;
+  }
+
+  std::vector<Parts> values_;  // of a row
+};
+
 class GramSchmidt {
  public:
   explicit GramSchmidt(const WeightedColumns& x) : x_(x) {}
 
   Dependences run() {
-    for (std::int64_t j = 0; j < x_.cols(); ++j) take(j);
+    constexpr auto kColumns = static_cast<std::int64_t>(ColumnGroup::kColumns);
+    for (std::int64_t first = 0; first < x_.cols(); first += kColumns) {
+      ColumnGroup group(x_, first);
+      const std::vector<ColumnGroup::Parts> shared = group.project(directions_);
+      for (std::int64_t c = 0; c < kColumns && first + c < x_.cols(); ++c) {
+        Vector parts;
+        for (const ColumnGroup::Parts& part : shared) parts.push_back(part[static_cast<std::size_t>(c)]);
+        take(first + c, group.column(static_cast<std::size_t>(c)), std::move(parts));
+      }
+    }
     for (Vector& dependence : found_.dependence) dependence.resize(found_.kept.size(), 0.0);
     return std::move(found_);
   }
 
  private:
-  // Projections of `values` on the directions so far, which are taken off it.
-  Vector project(Vector& values) const {
-    Vector parts(directions_.size(), 0.0);
+  // Takes the projections of `values` on the directions from `first` on off it, and adds them to the parts.
+  void project(std::size_t first, Vector& values, Vector& parts) const {
     const std::size_t count = directions_.size();
-    for (int pass = 0; pass < 2 && count > 0; ++pass) {
-      double part = dot(directions_[0], values);
-      for (std::size_t k = 0; k + 1 < count; ++k) {
-        parts[k] += part;
-        part = subtract_and_multiply(part, directions_[k], values, directions_[k + 1]);
-      }
-      parts[count - 1] += part;
-      subtract(part, directions_[count - 1], values);
+    parts.resize(count, 0.0);
+    if (first == count) return;
+    double part = dot(directions_[first], values);
+    for (std::size_t k = first; k + 1 < count; ++k) {
+      parts[k] += part;
+      part = subtract_and_multiply(part, directions_[k], values, directions_[k + 1]);
     }
-    return parts;
+    parts[count - 1] += part;
+    subtract(part, directions_[count - 1], values);
   }
 
-  void take(std::int64_t j) {
-    Vector left = x_.column(j);
-    const double size = norm_of(left);
-    Vector parts = project(left);
-    const double rest = norm_of(left);
+  // Column j: what the directions that were there when its group was begun have left of it, and its parts in them.
+  void take(std::int64_t j, Vector left, Vector parts) {
+    const double size = x_.norm(j);
+    project(parts.size(), left, parts);
+    double rest = norm_of(left);
+    if (rest <= kShortened * size) {
+      project(0, left, parts);
+      rest = norm_of(left);
+    }
     if (rest <= kDoubtful * size) {
       Vector b = dependence(j, parts);
       if (rest <= kNothing * size + kRounding * sum_of_lengths(b)) {
@@ -140,7 +211,9 @@ class GramSchmidt {
     Vector b = solve(std::move(parts));
     Vector left = x_.column(j);
     for (std::size_t k = 0; k < b.size(); ++k) x_.add(-b[k], found_.kept[k], left);
-    const Vector correction = solve(project(left));
+    Vector correction;
+    for (int pass = 0; pass < 2; ++pass) project(0, left, correction);
+    correction = solve(std::move(correction));
     for (std::size_t k = 0; k < b.size(); ++k) b[k] += correction[k];
     return b;
   }

@@ -35,6 +35,8 @@ class Module {
   [[nodiscard]] const SmFunctionTable& fn() const { return instance_.fn(); }
   [[nodiscard]] const Exports& by_name() const { return exports_; }
   [[nodiscard]] std::uint64_t bytes_in_use() const { return host_.usage().bytes_in_use; }
+  // Freed blocks that wait for their next use go back to the system.
+  void trim() { host_.trim(); }
   // The file that it came from.
   [[nodiscard]] const std::string& file() const { return file_; }
 

@@ -34,6 +34,7 @@ void measure_memory(Workbench& bench) {
   enter(bench.module().fn(), matrix, problem.upper);
   expect_ok(bench.module().fn().qxsmclose(matrix, 0.0), "closing");
   const auto closed = static_cast<double>(bench.module().bytes_in_use() - before);
+  bench.module().trim();
   if (!forget_peak()) return;
   const double begin = resident("VmRSS");
   expect_ok(bench.module().fn().qxsmfact(matrix, 0), "factoring");

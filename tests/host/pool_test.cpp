@@ -168,7 +168,7 @@ TEST_F(PoolTest, large_blocks_are_freed_in_any_order) {
 TEST_F(PoolTest, a_slab_of_640_megabytes_that_is_not_touched_costs_no_memory) {
   const std::int64_t before = resident_bytes();
   char* zeroed = take(640 * kMiB, SM_POOL_ZERO);
-  char* plain = take(640 * kMiB - 64);  // with its head a whole number of huge pages
+  char* plain = take(640 * kMiB - 4096);  // with the page in front of it a whole number of huge pages
   ASSERT_NE(zeroed, nullptr);
   ASSERT_NE(plain, nullptr);
   ASSERT_GT(before, 0);
@@ -178,7 +178,7 @@ TEST_F(PoolTest, a_slab_of_640_megabytes_that_is_not_touched_costs_no_memory) {
   EXPECT_EQ(zeroed[640 * kMiB - 1], 0);
 }
 
-TEST_F(PoolTest, a_freed_large_block_goes_back_to_the_system_at_once) {
+TEST_F(PoolTest, a_freed_block_of_more_than_32_megabytes_goes_back_to_the_system_at_once) {
   char* block = take(64 * kMiB);
   ASSERT_NE(block, nullptr);
   const std::int64_t before = resident_bytes();
@@ -188,10 +188,60 @@ TEST_F(PoolTest, a_freed_large_block_goes_back_to_the_system_at_once) {
   EXPECT_LT(resident_bytes() - before, 4 * std::int64_t{kMiB});
 }
 
-TEST_F(PoolTest, a_large_block_is_made_of_fresh_pages_also_after_others_were_used_and_freed) {
+TEST_F(PoolTest, freed_pages_are_handed_out_again_to_any_pool_for_about_the_same_size) {
+  char* first = take(3 * kMiB);
+  pool->free(pool, first);
+  EXPECT_NE(take(2 * kMiB), first);  // a third would lie idle
+  EXPECT_NE(take(3 * kMiB + 4096), first);
+  MemoryPool* other = create_pool();
+  EXPECT_EQ(other->allocate(other, 3 * kMiB - 10'000, 0), first);
+  EXPECT_NE(take(3 * kMiB), first);
+}
+
+TEST_F(PoolTest, of_kept_pages_the_smallest_that_will_do_are_taken) {
+  std::vector<char*> blocks;
+  for (const std::uint64_t size : {10U, 9U, 8U, 11U}) blocks.push_back(take(size * kMiB));
+  for (char* block : blocks) pool->free(pool, block);
+  EXPECT_EQ(take(9 * kMiB), blocks[1]);
+  EXPECT_EQ(take(9 * kMiB), blocks[0]);
+  EXPECT_EQ(take(9 * kMiB), blocks[3]);
+}
+
+TEST_F(PoolTest, of_freed_pages_64_megabytes_are_kept_and_the_oldest_go) {
+  const std::int64_t before = resident_bytes();
+  std::vector<char*> blocks;
+  for (int k = 0; k < 10; ++k) {
+    blocks.push_back(take(16 * kMiB));
+    ASSERT_NE(blocks.back(), nullptr);
+    std::memset(blocks.back(), 1, 16 * kMiB);
+  }
+  for (char* block : blocks) pool->free(pool, block);
+  EXPECT_LT(resident_bytes() - before, 80 * std::int64_t{kMiB});
+  EXPECT_GT(resident_bytes() - before, 40 * std::int64_t{kMiB});
+  qxhost_trim(host);
+  EXPECT_LT(resident_bytes() - before, 20 * std::int64_t{kMiB});
+}
+
+TEST_F(PoolTest, many_kept_blocks_do_not_grow_without_bound) {
+  const std::int64_t before = resident_bytes();
+  std::vector<char*> blocks;
+  for (int k = 0; k < 200; ++k) {
+    blocks.push_back(take(kMiB / 4));
+    ASSERT_NE(blocks.back(), nullptr);
+    std::memset(blocks.back(), 1, kMiB / 4);
+  }
+  for (char* block : blocks) pool->free(pool, block);
+  EXPECT_LT(resident_bytes() - before, 20 * std::int64_t{kMiB});
+  EXPECT_EQ(take(kMiB / 4, SM_POOL_ZERO)[kMiB / 8], 0);
+}
+
+TEST_F(PoolTest, a_large_zero_filled_block_costs_no_memory_also_after_others_were_used_and_freed) {
+  char* block = take(20 * kMiB);
+  std::memset(block, 1, 20 * kMiB);
+  pool->free(pool, block);
   for (int round = 0; round < 4; ++round) {
     const std::int64_t before = resident_bytes();
-    char* block = take(20 * kMiB, SM_POOL_ZERO);
+    block = take(20 * kMiB, SM_POOL_ZERO);
     ASSERT_NE(block, nullptr);
     EXPECT_LT(resident_bytes() - before, std::int64_t{kMiB}) << "round " << round;
     std::memset(block, 1, 20 * kMiB);

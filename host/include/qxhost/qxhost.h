@@ -12,10 +12,11 @@
  * handed last, so a process has one host alive at a time for each extension library.
  *
  * Pools. Blocks are aligned to 16 bytes. A request for 0 bytes is answered with a block of its own, not with null.
- * Small blocks come from chunks; from 128 KiB on a block has pages of its own, which cost nothing until they are
- * touched (zero-filled or not) and go back to the system as soon as the block is freed. A request that cannot be met,
- * because of a ceiling, of the system, or of a size near 2^64, is answered with null. free(pool, NULL) does nothing; a
- * block that is freed twice or in another pool is not noticed outside the checking mode.
+ * Small blocks come from chunks; from 128 KiB on a block has pages of its own, which cost nothing until they are first
+ * touched. When such a block is freed its pages go back to the system at once if they are more than 32 MiB; others
+ * wait for a request of about their size, up to 64 MiB in all, until qxhost_trim or qxhost_destroy. A request that
+ * cannot be met, because of a ceiling, of the system, or of a size near 2^64, is answered with null. free(pool, NULL)
+ * does nothing; a block that is freed twice or in another pool is not noticed outside the checking mode.
  *
  * The checking mode serves each block by a malloc of its own, with a guard behind it, looks every freed block up before
  * it touches memory, and keeps destroyed pools, so that mistakes are counted instead of crashing. Memory that was not
@@ -86,6 +87,9 @@ QXHOST_API const char* qxhost_last_error(const QxHost* host);
 
 /* Sets the host's ceiling (0: none), in bytes as they are requested. Blocks that are out already stay. */
 QXHOST_API void qxhost_set_memory_ceiling(QxHost* host, uint64_t bytes);
+
+/* Gives the pages of freed blocks that wait for their next use back to the system. Live blocks stay as they are. */
+QXHOST_API void qxhost_trim(QxHost* host);
 
 /* Sets a ceiling for one pool of this host (0: none). Answers 0, or -1 when the pool is not this host's. */
 QXHOST_API int32_t qxhost_set_pool_ceiling(QxHost* host, MemoryPool* pool, uint64_t bytes);

@@ -55,6 +55,9 @@ class Host {
   void set_memory_ceiling(uint64_t bytes) noexcept {
     if (host_) qxhost_set_memory_ceiling(host_, bytes);
   }
+  void trim() noexcept {
+    if (host_) qxhost_trim(host_);
+  }
   [[nodiscard]] bool ceiling_was_met() const noexcept { return host_ && qxhost_ceiling_was_met(host_) != 0; }
 
  private:
