@@ -37,6 +37,20 @@ SM_PASS_INLINE void fetch_row_words(const FactorRows& f, i64 k) {
 // Eight vectors, one to a lane.
 struct Several {
   SM_PASS_INLINE static Lanes& at(double* y, i64 k) { return *reinterpret_cast<Lanes*>(y + k * kLanes); }
+  template <int kRows>
+  SM_PASS_INLINE static void fetch(const FactorRows& f, const Strip<kRows>& s, i64 first, i64 way) {
+    if constexpr (kRows == 1) {
+      Single::fetch_single(s, way * kSingleAhead);
+    } else {
+      if (s.count > SharedTail::kMost) return;
+      Single::fetch_rows(s, way * kFarAhead);
+      fetch_row_words(f, first + way * kRowsAhead);
+    }
+  }
+  template <int kRows>
+  SM_PASS_INLINE static void fetch_column(const Strip<kRows>& s, i64 c) {
+    if constexpr (kRows > 3) __builtin_prefetch(s.row + c % kRows * s.step + c + kAhead);
+  }
 
   template <int kRows>
   SM_PASS_INLINE static void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
@@ -48,7 +62,9 @@ struct Several {
 #pragma GCC unroll 8
       for (int j = i + 1; j < kRows; ++j) w[j] += s.at(i)[j] * w[i];
     }
+    fetch<kRows>(f, s, first, 1);
     for (i64 c = 0; c < s.count; ++c) {
+      fetch_column(s, c);
       Lanes sum = s.at(0)[kRows + c] * w[0];
 #pragma GCC unroll 8
       for (int i = 1; i < kRows; ++i) sum += s.at(i)[kRows + c] * w[i];
@@ -59,20 +75,22 @@ struct Several {
   }
 
   template <int kRows>
-  SM_PASS_INLINE static void backward(const FactorRows&, const Strip<kRows>& s, i64 first, double* y) {
+  SM_PASS_INLINE static void backward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
     Lanes w[kRows];
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) w[i] = Lanes{};
+    fetch<kRows>(f, s, first, -1);
     for (i64 c = 0; c < s.count; ++c) {
+      fetch_column(s, c);
       const Lanes z = at(y, s.column[c]);
 #pragma GCC unroll 8
       for (int i = 0; i < kRows; ++i) w[i] += s.at(i)[kRows + c] * z;
     }
 #pragma GCC unroll 8
     for (int i = kRows - 1; i >= 0; --i) {
-#pragma GCC unroll 8
-      for (int j = i + 1; j < kRows; ++j) w[i] += s.at(i)[j] * w[j];
       w[i] += at(y, first + i);
+#pragma GCC unroll 8
+      for (int j = kRows - 1; j > i; --j) w[i] += s.at(i)[j] * w[j];
       at(y, first + i) = w[i];
     }
   }
