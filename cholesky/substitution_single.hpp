@@ -110,13 +110,13 @@ struct Single {
   SM_PASS_INLINE void forward_narrow(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
     fetch_rows(s, kFarAhead);
     fetch_row_words(f, first + kRowsAhead);
-    double w[kRows];
-    forward_triangle(s, y + first, w);
     const bool shared = tail.is(s.column, s.count);
     if (!shared) {
-      tail.flush(y);
+      tail.flush(y);  // before y is read: these rows may be in that tail
       tail.become(s.column, s.count);
     }
+    double w[kRows];
+    forward_triangle(s, y + first, w);
     for (i64 c = 0; c < s.count; c += kLanes) {
       const i64 lanes = std::min<i64>(kLanes, s.count - c);
       Lanes sum = Access::load(s.at(0) + kRows + c, lanes) * w[0];
