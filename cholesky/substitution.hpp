@@ -1,9 +1,11 @@
 // Passes over a finished sparse factor: U'D forward and U backward, for one vector, or for eight side by side.
 //
-// Both walk blocks of rows with one structure (cholesky/blocks.hpp) in strips of up to eight rows: a column behind the
-// strip is then fetched, and stored, once for all of its rows. The passes are compiled for the widest vectors of a few
+// Both walk strips of up to eight rows with one structure (cholesky/blocks.hpp): a column behind the strip is then
+// fetched, and stored, once for all of its rows. The passes are compiled for the widest vectors of a few
 // processors. They multiply and add without fusing, lane by lane: the bits are the same on all of them.
 #pragma once
+
+#include <algorithm>
 
 #include "frame/core.hpp"
 
@@ -25,6 +27,20 @@ struct FactorRows {
   const i64* columns(i64 k) const { return ju + iju[k]; }
   // Rows k and k + 1 have the same structure but for column k + 1.
   bool continues(i64 k) const { return length(k) > 0 && length(k + 1) == length(k) - 1 && columns(k)[0] == k + 1; }
+  // How many rows from k on, at most kStripRows, have one structure; and how many before `end`. Row by row: a strip's
+  // end must be guessed by the CPU, not waited for.
+  i64 rows_from(i64 k) const {
+    const i64 most = std::min<i64>(kStripRows, n - k);
+    i64 rows = 1;
+    while (rows < most && continues(k + rows - 1)) ++rows;
+    return rows;
+  }
+  i64 rows_to(i64 end) const {
+    const i64 most = std::min<i64>(kStripRows, end);
+    i64 rows = 1;
+    while (rows < most && continues(end - rows - 1)) ++rows;
+    return rows;
+  }
 
   i64 n;
   const i64 *iju, *iu, *ju;

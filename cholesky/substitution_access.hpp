@@ -16,18 +16,4 @@ struct PlainAccess {
     while (c < count && a[c] == b[c]) ++c;
     return c == count;
   }
-  // How many rows from k on, at most kStripRows, have one structure.
-  SM_PASS_INLINE static i64 rows_from(const FactorRows& f, i64 k) {
-    const i64 most = std::min<i64>(kStripRows, f.n - k);
-    i64 rows = 1;
-    while (rows < most && f.continues(k + rows - 1)) ++rows;
-    return rows;
-  }
-  // The same of the rows before `end`.
-  SM_PASS_INLINE static i64 rows_to(const FactorRows& f, i64 end) {
-    const i64 most = std::min<i64>(kStripRows, end);
-    i64 rows = 1;
-    while (rows < most && f.continues(end - rows - 1)) ++rows;
-    return rows;
-  }
 };

@@ -1,7 +1,5 @@
 // The passes of substitution with AVX-512 vectors.
 #include <algorithm>
-#include <bit>
-#include <cstdint>
 
 #include "cholesky/substitution.hpp"
 
@@ -29,32 +27,6 @@ struct Access {
       }
     }
     return true;
-  }
-  SM_PASS_INLINE static __m512i ascending(i64 from) {
-    return _mm512_add_epi64(_mm512_set1_epi64(from), _mm512_setr_epi64(0, 1, 2, 3, 4, 5, 6, 7));
-  }
-  // Lengths of the rows in `lanes` among those from k on.
-  SM_PASS_INLINE static __m512i lengths(const FactorRows& f, __mmask8 lanes, i64 k) {
-    return _mm512_sub_epi64(_mm512_maskz_loadu_epi64(lanes, f.iu + k + 1), _mm512_maskz_loadu_epi64(lanes, f.iu + k));
-  }
-  // How many of row k's columns, at most `most`, are the rows that follow it.
-  SM_PASS_INLINE static int rows_below(const FactorRows& f, i64 k, i64 most) {
-    const __mmask8 lanes = first(most);
-    const __m512i columns = _mm512_maskz_loadu_epi64(lanes, f.columns(k));
-    return std::countr_one(static_cast<unsigned>(_mm512_mask_cmpeq_epi64_mask(lanes, columns, ascending(k + 1))));
-  }
-  SM_PASS_INLINE static i64 rows_from(const FactorRows& f, i64 k) {
-    const i64 most = std::min<i64>(kStripRows, f.n - k);
-    i64 rows = 1;
-    while (rows < most && f.continues(k + rows - 1)) ++rows;
-    return rows;
-  }
-  // The same of the rows before `end`.
-  SM_PASS_INLINE static i64 rows_to(const FactorRows& f, i64 end) {
-    const i64 most = std::min<i64>(kStripRows, end);
-    i64 rows = 1;
-    while (rows < most && f.continues(end - rows - 1)) ++rows;
-    return rows;
   }
 };
 #else

@@ -1,5 +1,6 @@
 // The passes of substitution.hpp, written once. A file that defines SM_PASS_TARGET, the attribute that lets the
-// compiler use wider vectors, includes this in its own namespace.
+// compiler use wider vectors, SM_PASS_INLINE, the same for what is inlined, and Access (substitution_access.hpp)
+// includes this in its own namespace.
 //
 // Deliberately without an include guard.
 
@@ -20,16 +21,32 @@ struct Strip {
   i64 count;
 };
 
-constexpr i64 kAhead = 128;
-constexpr i64 kSubs = 128;
-constexpr i64 kRowsAhead = 64;
-constexpr i64 kSingleAhead = 512;
-constexpr i64 kFarAhead = 512;
+constexpr i64 kNarrowTail = 4 * kLanes;
 
-SM_PASS_INLINE void fetch_row_words(const FactorRows& f, i64 k) {
-  __builtin_prefetch(f.iu + k);
-  __builtin_prefetch(f.iju + k);
-  __builtin_prefetch(f.diag + k);
+// Blocks follow each other without a gap, but the rows of one are several streams, and the next one is over before the
+// CPU has seen that it is one: so what comes is fetched by hand. Distances are in elements, taken from measurements;
+// fetching beyond an array reads nothing.
+constexpr i64 kWideAhead = 128;     // in each row of a wide strip
+constexpr i64 kNarrowAhead = 512;   // values of narrow strips, and of single rows
+constexpr i64 kColumnsAhead = 128;  // their subscripts
+constexpr i64 kRowsAhead = 64;
+
+// Way is 1 going forward and -1 going backward.
+template <int kRows>
+SM_PASS_INLINE void fetch_narrow(const FactorRows& f, const Strip<kRows>& s, i64 first, i64 way) {
+  const double* from = s.at(0) + 1 + way * kNarrowAhead;
+  const double* end = s.at(kRows - 1) + kRows + s.count + way * kNarrowAhead;
+  for (; from < end; from += kLanes) __builtin_prefetch(from);
+  __builtin_prefetch(s.column + way * kColumnsAhead);
+  __builtin_prefetch(s.column + way * kColumnsAhead + kLanes);
+  __builtin_prefetch(f.iu + first + way * kRowsAhead);
+  __builtin_prefetch(f.iju + first + way * kRowsAhead);
+  __builtin_prefetch(f.diag + first + way * kRowsAhead);
+}
+
+SM_PASS_INLINE void fetch_single(const Strip<1>& s, i64 way) {
+  __builtin_prefetch(s.at(0) + 1 + way * kNarrowAhead);
+  __builtin_prefetch(s.column + way * kNarrowAhead);
 }
 
 #include "cholesky/substitution_single.hpp"
@@ -40,16 +57,15 @@ struct Several {
   template <int kRows>
   SM_PASS_INLINE static void fetch(const FactorRows& f, const Strip<kRows>& s, i64 first, i64 way) {
     if constexpr (kRows == 1) {
-      Single::fetch_single(s, way * kSingleAhead);
+      fetch_single(s, way);
     } else {
-      if (s.count > SharedTail::kMost) return;
-      Single::fetch_rows(s, way * kFarAhead);
-      fetch_row_words(f, first + way * kRowsAhead);
+      if (s.count <= kNarrowTail) fetch_narrow(f, s, first, way);
     }
   }
+  // One of the rows at a time.
   template <int kRows>
   SM_PASS_INLINE static void fetch_column(const Strip<kRows>& s, i64 c) {
-    if constexpr (kRows > 3) __builtin_prefetch(s.row + c % kRows * s.step + c + kAhead);
+    if constexpr (kRows > 3) __builtin_prefetch(s.row + c % kRows * s.step + c + kWideAhead);
   }
 
   template <int kRows>
@@ -124,7 +140,7 @@ SM_PASS_TARGET void forward_pass(const FactorRows& given, double* y) {
   const FactorRows f = given;
   Road road;
   for (i64 k = 0; k < f.n;) {
-    const i64 rows = Access::rows_from(f, k);
+    const i64 rows = f.rows_from(k);
     if (rows == 1) {
       road.forward(f, Strip<1>(f, k), k, y);
       ++k;
@@ -139,7 +155,7 @@ SM_PASS_TARGET void backward_pass(const FactorRows& given, double* y) {
   const FactorRows f = given;
   Road road;
   for (i64 k = f.n; k > 0;) {
-    const i64 rows = Access::rows_to(f, k);
+    const i64 rows = f.rows_to(k);
     if (rows == 1) {
       --k;
       road.backward(f, Strip<1>(f, k), k, y);

@@ -25,12 +25,10 @@ SM_PASS_INLINE Lanes sums_of(const Lanes (&v)[kRows]) {
          __builtin_shufflevector(half[0], half[1], 1, 3, 5, 7, 9, 11, 13, 15);
 }
 
-// The tail of the last narrow block, up to kMost columns. Blocks that follow each other often share theirs: what
+// The tail of the last narrow block, up to kNarrowTail columns. Blocks that follow each other often share theirs: what
 // subjects add to the columns that border all of them is then summed here, and added to y once.
 class SharedTail {
  public:
-  static constexpr i64 kMost = 4 * kLanes;
-
   SM_PASS_INLINE bool is(const i64* column, i64 count) const {
     return count == count_ && Access::equal(column, column_, count);
   }
@@ -42,6 +40,7 @@ class SharedTail {
   SM_PASS_INLINE void add(i64 place, const Lanes& sum) {
     lanes_[place / kLanes] = waiting_ ? lanes_[place / kLanes] + sum : sum;
   }
+  // Until it is flushed: its columns are rows to come, the first of which has another tail.
   SM_PASS_INLINE void wait() { waiting_ = true; }
   SM_PASS_INLINE void flush(double* y) {
     if (!waiting_) return;
@@ -59,7 +58,7 @@ class SharedTail {
   const i64* column_ = nullptr;
   i64 count_ = 0;
   bool waiting_ = false;
-  Lanes lanes_[kMost / kLanes];
+  Lanes lanes_[kNarrowTail / kLanes];
 };
 
 struct Single {
@@ -89,27 +88,10 @@ struct Single {
     }
   }
 
-  // What as many rows hold some way off, for narrow ones are over before a line of the cache has come.
-  template <int kRows>
-  SM_PASS_INLINE static void fetch_rows(const Strip<kRows>& s, i64 distance) {
-    const double* from = s.at(0) + 1 + distance;
-    const double* end = s.at(kRows - 1) + kRows + s.count + distance;
-    for (; from < end; from += kLanes) __builtin_prefetch(from);
-    __builtin_prefetch(s.column + (distance < 0 ? -kSubs : kSubs));
-    __builtin_prefetch(s.column + (distance < 0 ? -kSubs + 8 : kSubs + 8));
-  }
-
-  template <int kRows>
-  SM_PASS_INLINE static void fetch_single(const Strip<kRows>& s, i64 distance) {
-    __builtin_prefetch(s.at(0) + 1 + distance);
-    __builtin_prefetch(s.column + distance);
-  }
-
-  // A block of kRows rows whose tail is at most SharedTail::kMost columns.
+  // A strip with at most kNarrowTail columns behind it.
   template <int kRows>
   SM_PASS_INLINE void forward_narrow(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
-    fetch_rows(s, kFarAhead);
-    fetch_row_words(f, first + kRowsAhead);
+    fetch_narrow(f, s, first, 1);
     const bool shared = tail.is(s.column, s.count);
     if (!shared) {
       tail.flush(y);  // before y is read: these rows may be in that tail
@@ -134,8 +116,7 @@ struct Single {
 
   template <int kRows>
   SM_PASS_INLINE void backward_narrow(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
-    fetch_rows(s, -kFarAhead);
-    fetch_row_words(f, first - kRowsAhead);
+    fetch_narrow(f, s, first, -1);
     if (!tail.is(s.column, s.count)) {
       tail.become(s.column, s.count);
       tail.gather(y);
@@ -155,14 +136,14 @@ struct Single {
   template <int kRows>
   SM_PASS_INLINE void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
     if constexpr (kRows > 1) {
-      if (s.count <= SharedTail::kMost) {
+      if (s.count <= kNarrowTail) {
         forward_narrow(f, s, first, y);
         return;
       }
     }
     tail.flush(y);
     if constexpr (kRows == 1) {
-      fetch_single(s, kSingleAhead);
+      fetch_single(s, 1);
     }
     double w[kRows];
     forward_triangle(s, y + first, w);
@@ -173,7 +154,7 @@ struct Single {
 #pragma GCC unroll 8
         for (int i = 1; i < kRows; ++i) sum += *reinterpret_cast<const Lanes*>(s.at(i) + kRows + c) * w[i];
 #pragma GCC unroll 8
-        for (int i = 0; i < kRows; ++i) __builtin_prefetch(s.at(i) + kRows + c + kAhead);
+        for (int i = 0; i < kRows; ++i) __builtin_prefetch(s.at(i) + kRows + c + kWideAhead);
 #pragma GCC unroll 8
         for (int q = 0; q < kLanes; ++q) y[s.column[c + q]] += sum[q];
       }
@@ -190,12 +171,12 @@ struct Single {
   template <int kRows>
   SM_PASS_INLINE void backward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
     if constexpr (kRows > 1) {
-      if (s.count <= SharedTail::kMost) {
+      if (s.count <= kNarrowTail) {
         backward_narrow(f, s, first, y);
         return;
       }
     } else {
-      fetch_single(s, -kSingleAhead);
+      fetch_single(s, -1);
     }
     Lanes sum[kRows];
 #pragma GCC unroll 8
@@ -203,7 +184,7 @@ struct Single {
     i64 c = 0;
     for (; c + kLanes <= s.count; c += kLanes) {
 #pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) __builtin_prefetch(s.at(i) + kRows + c + kAhead);
+      for (int i = 0; i < kRows; ++i) __builtin_prefetch(s.at(i) + kRows + c + kWideAhead);
       Lanes z;
 #pragma GCC unroll 8
       for (int q = 0; q < kLanes; ++q) z[q] = y[s.column[c + q]];

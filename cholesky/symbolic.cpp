@@ -26,8 +26,8 @@ namespace {
 
 constexpr i64 kSearchGain = 3;  // one search of a tail costs as much as flagging about so many of its columns
 
-constexpr i64 kFewExtras = 12;     // sorted by comparing
-constexpr i64 kBitmapGain = 4;     // comparing costs an extra as much as reading about so many words of a bitmap
+constexpr i64 kFewExtras = 12;  // sorted by comparing
+constexpr i64 kBitmapGain = 4;  // comparing costs an extra as much as reading about so many words of a bitmap
 constexpr i64 kBits = 64;
 
 struct ColumnState {
