@@ -147,22 +147,25 @@ struct Single {
     }
     double w[kRows];
     forward_triangle(s, y + first, w);
+    const double* row[kRows];
+#pragma GCC unroll 8
+    for (int i = 0; i < kRows; ++i) row[i] = s.at(i) + kRows;
     i64 c = 0;
     if constexpr (kRows > 1) {
       for (; c + kLanes <= s.count; c += kLanes) {
-        Lanes sum = *reinterpret_cast<const Lanes*>(s.at(0) + kRows + c) * w[0];
+        Lanes sum = *reinterpret_cast<const Lanes*>(row[0] + c) * w[0];
 #pragma GCC unroll 8
-        for (int i = 1; i < kRows; ++i) sum += *reinterpret_cast<const Lanes*>(s.at(i) + kRows + c) * w[i];
+        for (int i = 1; i < kRows; ++i) sum += *reinterpret_cast<const Lanes*>(row[i] + c) * w[i];
 #pragma GCC unroll 8
-        for (int i = 0; i < kRows; ++i) __builtin_prefetch(s.at(i) + kRows + c + kWideAhead);
+        for (int i = 0; i < kRows; ++i) __builtin_prefetch(row[i] + c + kWideAhead);
 #pragma GCC unroll 8
         for (int q = 0; q < kLanes; ++q) y[s.column[c + q]] += sum[q];
       }
     }
     for (; c < s.count; ++c) {
-      double sum = s.at(0)[kRows + c] * w[0];
+      double sum = row[0][c] * w[0];
 #pragma GCC unroll 8
-      for (int i = 1; i < kRows; ++i) sum += s.at(i)[kRows + c] * w[i];
+      for (int i = 1; i < kRows; ++i) sum += row[i][c] * w[i];
       y[s.column[c]] += sum;
     }
     for (int i = 0; i < kRows; ++i) y[first + i] = f.diag[first + i] * w[i];
@@ -181,21 +184,24 @@ struct Single {
     Lanes sum[kRows];
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) sum[i] = Lanes{};
+    const double* row[kRows];
+#pragma GCC unroll 8
+    for (int i = 0; i < kRows; ++i) row[i] = s.at(i) + kRows;
     i64 c = 0;
     for (; c + kLanes <= s.count; c += kLanes) {
 #pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) __builtin_prefetch(s.at(i) + kRows + c + kWideAhead);
+      for (int i = 0; i < kRows; ++i) __builtin_prefetch(row[i] + c + kWideAhead);
       Lanes z;
 #pragma GCC unroll 8
       for (int q = 0; q < kLanes; ++q) z[q] = y[s.column[c + q]];
 #pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) sum[i] += *reinterpret_cast<const Lanes*>(s.at(i) + kRows + c) * z;
+      for (int i = 0; i < kRows; ++i) sum[i] += *reinterpret_cast<const Lanes*>(row[i] + c) * z;
     }
     Lanes sums = sums_of(sum);
     for (; c < s.count; ++c) {
       const double z = y[s.column[c]];
 #pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) sums[i] += s.at(i)[kRows + c] * z;
+      for (int i = 0; i < kRows; ++i) sums[i] += row[i][c] * z;
     }
     backward_triangle(s, sums, y + first);
   }
