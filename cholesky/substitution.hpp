@@ -21,7 +21,13 @@ typedef double Lanes __attribute__((vector_size(kLanes * sizeof(double)), aligne
 
 struct FactorRows {
   explicit FactorRows(const SmMatrix& m)
-      : n(m.rows), iju(m.factor_iju), iu(m.factor_iu), ju(m.factor_ju), values(m.factor_values), diag(m.factor_diag) {}
+      : n(m.rows),
+        iju(m.factor_iju),
+        iu(m.factor_iu),
+        ju(m.factor_ju),
+        values(m.factor_values),
+        diag(m.factor_diag),
+        far(iu[n] > kNear) {}
 
   i64 length(i64 k) const { return iu[k + 1] - iu[k]; }
   const i64* columns(i64 k) const { return ju + iju[k]; }
@@ -45,6 +51,10 @@ struct FactorRows {
   i64 n;
   const i64 *iju, *iu, *ju;
   const double *values, *diag;
+  bool far;  // too much to stay in a cache between solves
+
+ private:
+  static constexpr i64 kNear = i64{1} << 20;
 };
 
 // y is in the order of the factor; with lanes, element k of vector v is y[k * kLanes + v].

@@ -13,7 +13,7 @@ struct Strip {
         step(f.length(first) - 1),
         column(f.columns(first) + kRows - 1),
         count(f.length(first) + 1 - kRows) {}
-  SM_PASS_INLINE const double* at(int i) const { return row + i * step - i * (i - 1) / 2; }
+  SM_PASS_INLINE const double* at(i64 i) const { return row + i * step - i * (i - 1) / 2; }
 
   const double* row;
   i64 step;
@@ -42,6 +42,12 @@ SM_PASS_INLINE void fetch_narrow(const FactorRows& f, const Strip<kRows>& s, i64
   __builtin_prefetch(f.iu + first + way * kRowsAhead);
   __builtin_prefetch(f.iju + first + way * kRowsAhead);
   __builtin_prefetch(f.diag + first + way * kRowsAhead);
+}
+
+template <int kRows>
+SM_PASS_INLINE void fetch_rows(const double* const (&row)[kRows], i64 c) {
+#pragma GCC unroll 8
+  for (int i = 0; i < kRows; ++i) __builtin_prefetch(row[i] + c + kWideAhead);
 }
 
 SM_PASS_INLINE void fetch_single(const Strip<1>& s, i64 way) {

@@ -9,15 +9,17 @@ SM_PASS_INLINE Lanes sums_of(const Lanes (&v)[kRows]) {
   Lanes half[2];
 #pragma GCC unroll 4
   for (int i = 0; i < 4; ++i) {
-    const Lanes& a = v[std::min(2 * i, kRows - 1)];
-    const Lanes& b = v[std::min(2 * i + 1, kRows - 1)];
+    const int pair = 2 * i;
+    const Lanes& a = v[std::min(pair, kRows - 1)];
+    const Lanes& b = v[std::min(pair + 1, kRows - 1)];
     quarter[i] = __builtin_shufflevector(a, b, 0, 1, 2, 3, 8, 9, 10, 11) +
                  __builtin_shufflevector(a, b, 4, 5, 6, 7, 12, 13, 14, 15);
   }
 #pragma GCC unroll 2
   for (int i = 0; i < 2; ++i) {
-    const Lanes& a = quarter[2 * i];
-    const Lanes& b = quarter[2 * i + 1];
+    const int pair = 2 * i;
+    const Lanes& a = quarter[pair];
+    const Lanes& b = quarter[pair + 1];
     half[i] = __builtin_shufflevector(a, b, 0, 1, 4, 5, 8, 9, 12, 13) +
               __builtin_shufflevector(a, b, 2, 3, 6, 7, 10, 11, 14, 15);
   }
@@ -147,6 +149,7 @@ struct Single {
     }
     double w[kRows];
     forward_triangle(s, y + first, w);
+    const bool far = f.far;
     const double* row[kRows];
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) row[i] = s.at(i) + kRows;
@@ -156,8 +159,7 @@ struct Single {
         Lanes sum = *reinterpret_cast<const Lanes*>(row[0] + c) * w[0];
 #pragma GCC unroll 8
         for (int i = 1; i < kRows; ++i) sum += *reinterpret_cast<const Lanes*>(row[i] + c) * w[i];
-#pragma GCC unroll 8
-        for (int i = 0; i < kRows; ++i) __builtin_prefetch(row[i] + c + kWideAhead);
+        if (far) fetch_rows(row, c);
 #pragma GCC unroll 8
         for (int q = 0; q < kLanes; ++q) y[s.column[c + q]] += sum[q];
       }
@@ -184,13 +186,13 @@ struct Single {
     Lanes sum[kRows];
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) sum[i] = Lanes{};
+    const bool far = f.far;
     const double* row[kRows];
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) row[i] = s.at(i) + kRows;
     i64 c = 0;
     for (; c + kLanes <= s.count; c += kLanes) {
-#pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) __builtin_prefetch(row[i] + c + kWideAhead);
+      if (far) fetch_rows(row, c);
       Lanes z;
 #pragma GCC unroll 8
       for (int q = 0; q < kLanes; ++q) z[q] = y[s.column[c + q]];
