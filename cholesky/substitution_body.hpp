@@ -21,7 +21,7 @@ struct Strip {
   i64 count;
 };
 
-constexpr i64 kNarrowTail = 4 * kLanes;
+constexpr i64 kNarrowTail = 32;  // whole vectors
 
 // Blocks follow each other without a gap, but the rows of one are several streams, and the next one is over before the
 // CPU has seen that it is one: so what comes is fetched by hand. Distances are in elements, taken from measurements;
