@@ -37,16 +37,17 @@ void move_row_starts(SmMatrix& m, i64* counts) {
 }
 
 // Rows fill from their end; the diagonal takes the first slot, where the factorization expects it. The diagonals of one
-// row stand together in this walk, so remembering the last row is enough to tell a repeated one.
-void find_targets(SmMatrix& m, i64* ends, i64* target) {
+// row stand together in this walk, so remembering the last row is enough to tell a repeated one. visit(p, where entry p
+// belongs).
+void for_each_target(const SmMatrix& m, i64* ends, const i64* owner, auto&& visit) {
   i64 last_diagonal = -1;
   for (i64 p = m.nnz - 1; p >= 0; --p) {
-    const i64 row = target[p];  // still the owner
+    const i64 row = owner[p];
     if (m.col_index[p] == row && row != last_diagonal) {
-      target[p] = m.row_start[row];
       last_diagonal = row;
+      visit(p, m.row_start[row]);
     } else {
-      target[p] = --ends[row];
+      visit(p, --ends[row]);
     }
   }
 }
@@ -64,20 +65,21 @@ void permute_entries(SmMatrix& m, i64* target) {
 }
 
 // Through copies where the workspace has room for them: along cycles each entry waits for the memory of the one before.
-void move_entries(SmMatrix& m, i64* target) {
+void move_entries(SmMatrix& m, i64* ends, i64* owner) {
   const i64 used = m.rows + m.nnz;
   if (!has_workspace(m, used + 2 * m.nnz)) {
-    permute_entries(m, target);
+    for_each_target(m, ends, owner, [&](i64 p, i64 target) { owner[p] = target; });
+    permute_entries(m, owner);
     return;
   }
   i64* column = m.work + used;
   auto* value = reinterpret_cast<double*>(column + m.nnz);
-  std::copy_n(m.col_index, m.nnz, column);
-  std::copy_n(m.nz_values, m.nnz, value);
-  for (i64 p = 0; p < m.nnz; ++p) {
-    m.col_index[target[p]] = column[p];
-    m.nz_values[target[p]] = value[p];
-  }
+  for_each_target(m, ends, owner, [&](i64 p, i64 target) {
+    column[target] = m.col_index[p];
+    value[target] = m.nz_values[p];
+  });
+  std::copy_n(column, m.nnz, m.col_index);
+  std::copy_n(value, m.nnz, m.nz_values);
 }
 
 Gate may_reorder(const SmMatrix& m) {
@@ -109,11 +111,10 @@ SmStatus reorder(SmMatrix& m) {
   SM_PASS(may_reorder(m));
   give_back(m.pool, m.factor_reserved);  // the places that a refill found in an earlier order
   i64* counts = m.work;
-  i64* target = m.work + m.rows;
-  find_owners(m, counts, target);
+  i64* owner = m.work + m.rows;
+  find_owners(m, counts, owner);
   move_row_starts(m, counts);
-  find_targets(m, counts, target);
-  move_entries(m, target);
+  move_entries(m, counts, owner);
   m.state = SM_STATE_REORDERED;
   return SM_OK;
 }

@@ -35,6 +35,8 @@ class SparseSolve {
   // kLanes vectors in `lanes`, kLanes * n doubles: those of x itself, or others that are free until later.
   void several(const double* b, double* x, double* lanes) const {
     for (i64 k = 0; k < n_; ++k) {
+      const double* ahead = b + perm_[std::min(k + kAhead, n_ - 1)];
+      for (int v = 0; v < kLanes; ++v) __builtin_prefetch(ahead + v * n_);
       for (int v = 0; v < kLanes; ++v) lanes[k * kLanes + v] = b[perm_[k] + v * n_];
     }
     passes_.forward_lanes(rows_, lanes);
@@ -44,11 +46,15 @@ class SparseSolve {
       return;
     }
     for (i64 k = 0; k < n_; ++k) {
+      const double* ahead = x + perm_[std::min(k + kAhead, n_ - 1)];
+      for (int v = 0; v < kLanes; ++v) __builtin_prefetch(ahead + v * n_, 1);
       for (int v = 0; v < kLanes; ++v) x[perm_[k] + v * n_] = lanes[k * kLanes + v];
     }
   }
 
  private:
+  static constexpr i64 kAhead = 16;  // rows whose places in b or x are fetched early
+
   // The last lane goes to the scratch, the others move together, and it takes the room that they left, which is its
   // own; then the next.
   void unpack_in_place(double* x) const {

@@ -1,29 +1,60 @@
 // Passes over a finished sparse factor: U'D forward and U backward, for one vector, or for eight side by side.
 //
-// Both walk blocks of rows with one structure (cholesky/blocks.hpp) in strips of up to eight rows: a column behind the
-// strip is then fetched, and stored, once for all of its rows. The passes are compiled for the widest vectors of a few
+// Both walk strips of up to eight rows with one structure (cholesky/blocks.hpp): a column behind the strip is then
+// fetched, and stored, once for all of its rows. The passes are compiled for the widest vectors of a few
 // processors. They multiply and add without fusing, lane by lane: the bits are the same on all of them.
 #pragma once
 
+#include <algorithm>
+
 #include "frame/core.hpp"
+
+#if defined(__GNUC__)
+#pragma GCC diagnostic ignored "-Wpsabi"  // all that returns vectors is inlined
+#endif
 
 namespace sm {
 
 inline constexpr int kLanes = 8;
+inline constexpr int kStripRows = 8;
+typedef double Lanes __attribute__((vector_size(kLanes * sizeof(double)), aligned(sizeof(double)), may_alias));
 
 struct FactorRows {
   explicit FactorRows(const SmMatrix& m)
-      : n(m.rows), iju(m.factor_iju), iu(m.factor_iu), ju(m.factor_ju), values(m.factor_values), diag(m.factor_diag) {}
+      : n(m.rows),
+        iju(m.factor_iju),
+        iu(m.factor_iu),
+        ju(m.factor_ju),
+        values(m.factor_values),
+        diag(m.factor_diag),
+        far(iu[n] > kNear) {}
 
+  i64 length(i64 k) const { return iu[k + 1] - iu[k]; }
+  const i64* columns(i64 k) const { return ju + iju[k]; }
   // Rows k and k + 1 have the same structure but for column k + 1.
-  bool continues(i64 k) const {
-    const i64 length = iu[k + 1] - iu[k];
-    return k + 1 < n && length > 0 && iu[k + 2] - iu[k + 1] == length - 1 && ju[iju[k]] == k + 1;
+  bool continues(i64 k) const { return length(k) > 0 && length(k + 1) == length(k) - 1 && columns(k)[0] == k + 1; }
+  // How many rows from k on, at most kStripRows, have one structure; and how many before `end`. Row by row: a strip's
+  // end must be guessed by the CPU, not waited for.
+  i64 rows_from(i64 k) const {
+    const i64 most = std::min<i64>(kStripRows, n - k);
+    i64 rows = 1;
+    while (rows < most && continues(k + rows - 1)) ++rows;
+    return rows;
+  }
+  i64 rows_to(i64 end) const {
+    const i64 most = std::min<i64>(kStripRows, end);
+    i64 rows = 1;
+    while (rows < most && continues(end - rows - 1)) ++rows;
+    return rows;
   }
 
   i64 n;
   const i64 *iju, *iu, *ju;
   const double *values, *diag;
+  bool far;  // too much to stay in a cache between solves
+
+ private:
+  static constexpr i64 kNear = i64{1} << 20;
 };
 
 // y is in the order of the factor; with lanes, element k of vector v is y[k * kLanes + v].

@@ -1,104 +1,78 @@
 // The passes of substitution.hpp, written once. A file that defines SM_PASS_TARGET, the attribute that lets the
-// compiler use wider vectors, includes this in its own namespace.
+// compiler use wider vectors, SM_PASS_INLINE, the same for what is inlined, and Access (substitution_access.hpp)
+// includes this in its own namespace.
 //
 // Deliberately without an include guard.
 
-typedef double Lanes __attribute__((vector_size(kLanes * sizeof(double)), aligned(sizeof(double)), may_alias));
-
-#define SM_PASS_INLINE SM_PASS_TARGET __attribute__((always_inline)) inline
-
-// Rows first .. first + kRows - 1 of a block. Column c of a row, counted from the block's own first column on, is at
-// row[i][c], for c > first + i; those behind the strip have the numbers column[0 .. count).
+// Rows first .. first + kRows - 1 of one structure. What row i has in column first + c is at at(i)[c], i < c < kRows;
+// at(i)[kRows + c] is in column[c], c < count.
 template <int kRows>
 struct Strip {
-  const double* row[kRows];
-  i64 inside;  // c of the strip's own first column
-  i64 behind;  // c of column[0]
+  SM_PASS_INLINE Strip(const FactorRows& f, i64 first)
+      : row(f.values + f.iu[first] - 1),
+        step(f.length(first) - 1),
+        column(f.columns(first) + kRows - 1),
+        count(f.length(first) + 1 - kRows) {}
+  SM_PASS_INLINE const double* at(i64 i) const { return row + i * step - i * (i - 1) / 2; }
+
+  const double* row;
+  i64 step;
   const i64* column;
   i64 count;
 };
 
+constexpr i64 kNarrowTail = 32;  // whole vectors
+
+// Blocks follow each other without a gap, but the rows of one are several streams, and the next one is over before the
+// CPU has seen that it is one: so what comes is fetched by hand. Distances are in elements, taken from measurements;
+// fetching beyond an array reads nothing.
+constexpr i64 kWideAhead = 128;     // in each row of a wide strip
+constexpr i64 kNarrowAhead = 512;   // values of narrow strips, and of single rows
+constexpr i64 kColumnsAhead = 128;  // their subscripts
+constexpr i64 kRowsAhead = 64;
+
+// Way is 1 going forward and -1 going backward.
 template <int kRows>
-SM_PASS_INLINE Strip<kRows> strip_of(const FactorRows& f, i64 block, i64 first) {
-  const i64 length = f.iu[block + 1] - f.iu[block];
-  const double* values = f.values + f.iu[block];
-  Strip<kRows> s;
-  for (int i = 0; i < kRows; ++i) {
-    const i64 r = first - block + i;
-    s.row[i] = values + r * length - r * (r - 1) / 2 - r - 1;
-  }
-  s.inside = first - block;
-  s.behind = s.inside + kRows;
-  s.column = f.ju + f.iju[block] + s.behind - 1;
-  s.count = length + 1 - s.behind;
-  return s;
+SM_PASS_INLINE void fetch_narrow(const FactorRows& f, const Strip<kRows>& s, i64 first, i64 way) {
+  const double* from = s.at(0) + 1 + way * kNarrowAhead;
+  const double* end = s.at(kRows - 1) + kRows + s.count + way * kNarrowAhead;
+  for (; from < end; from += kLanes) __builtin_prefetch(from);
+  __builtin_prefetch(s.column + way * kColumnsAhead);
+  __builtin_prefetch(s.column + way * kColumnsAhead + kLanes);
+  __builtin_prefetch(f.iu + first + way * kRowsAhead);
+  __builtin_prefetch(f.iju + first + way * kRowsAhead);
+  __builtin_prefetch(f.diag + first + way * kRowsAhead);
 }
 
-// One vector. Behind the strip eight columns are taken together.
-struct Single {
-  template <int kRows>
-  SM_PASS_INLINE static void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
-    double w[kRows];
-    for (int i = 0; i < kRows; ++i) w[i] = y[first + i];
+template <int kRows>
+SM_PASS_INLINE void fetch_rows(const double* const (&row)[kRows], i64 c) {
 #pragma GCC unroll 8
-    for (int i = 0; i < kRows; ++i) {
-#pragma GCC unroll 8
-      for (int j = i + 1; j < kRows; ++j) w[j] += s.row[i][s.inside + j] * w[i];
-    }
-    i64 c = 0;
-    if constexpr (kRows > 1) {
-      for (; c + kLanes <= s.count; c += kLanes) {
-        Lanes sum = *reinterpret_cast<const Lanes*>(s.row[0] + s.behind + c) * w[0];
-#pragma GCC unroll 8
-        for (int i = 1; i < kRows; ++i) sum += *reinterpret_cast<const Lanes*>(s.row[i] + s.behind + c) * w[i];
-#pragma GCC unroll 8
-        for (int q = 0; q < kLanes; ++q) y[s.column[c + q]] += sum[q];
-      }
-    }
-    for (; c < s.count; ++c) {
-      double sum = s.row[0][s.behind + c] * w[0];
-#pragma GCC unroll 8
-      for (int i = 1; i < kRows; ++i) sum += s.row[i][s.behind + c] * w[i];
-      y[s.column[c]] += sum;
-    }
-    for (int i = 0; i < kRows; ++i) y[first + i] = f.diag[first + i] * w[i];
-  }
+  for (int i = 0; i < kRows; ++i) __builtin_prefetch(row[i] + c + kWideAhead);
+}
 
-  template <int kRows>
-  SM_PASS_INLINE static void backward(const Strip<kRows>& s, i64 first, double* y) {
-    Lanes sum[kRows];
-#pragma GCC unroll 8
-    for (int i = 0; i < kRows; ++i) sum[i] = Lanes{};
-    i64 c = 0;
-    for (; c + kLanes <= s.count; c += kLanes) {
-      Lanes z;
-#pragma GCC unroll 8
-      for (int q = 0; q < kLanes; ++q) z[q] = y[s.column[c + q]];
-#pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) sum[i] += *reinterpret_cast<const Lanes*>(s.row[i] + s.behind + c) * z;
-    }
-    double w[kRows];
-    for (int i = 0; i < kRows; ++i) {
-      const Lanes& t = sum[i];
-      w[i] = ((t[0] + t[4]) + (t[2] + t[6])) + ((t[1] + t[5]) + (t[3] + t[7]));
-    }
-    for (; c < s.count; ++c) {
-      const double z = y[s.column[c]];
-#pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) w[i] += s.row[i][s.behind + c] * z;
-    }
-#pragma GCC unroll 8
-    for (int i = kRows - 1; i >= 0; --i) {
-#pragma GCC unroll 8
-      for (int j = i + 1; j < kRows; ++j) w[i] += s.row[i][s.inside + j] * w[j];
-      y[first + i] = w[i] += y[first + i];
-    }
-  }
-};
+SM_PASS_INLINE void fetch_single(const Strip<1>& s, i64 way) {
+  __builtin_prefetch(s.at(0) + 1 + way * kNarrowAhead);
+  __builtin_prefetch(s.column + way * kNarrowAhead);
+}
+
+#include "cholesky/substitution_single.hpp"
 
 // Eight vectors, one to a lane.
 struct Several {
   SM_PASS_INLINE static Lanes& at(double* y, i64 k) { return *reinterpret_cast<Lanes*>(y + k * kLanes); }
+  template <int kRows>
+  SM_PASS_INLINE static void fetch(const FactorRows& f, const Strip<kRows>& s, i64 first, i64 way) {
+    if constexpr (kRows == 1) {
+      fetch_single(s, way);
+    } else {
+      if (s.count <= kNarrowTail) fetch_narrow(f, s, first, way);
+    }
+  }
+  // One of the rows at a time.
+  template <int kRows>
+  SM_PASS_INLINE static void fetch_column(const Strip<kRows>& s, i64 c) {
+    if constexpr (kRows > 3) __builtin_prefetch(s.row + c % kRows * s.step + c + kWideAhead);
+  }
 
   template <int kRows>
   SM_PASS_INLINE static void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
@@ -108,12 +82,14 @@ struct Several {
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) {
 #pragma GCC unroll 8
-      for (int j = i + 1; j < kRows; ++j) w[j] += s.row[i][s.inside + j] * w[i];
+      for (int j = i + 1; j < kRows; ++j) w[j] += s.at(i)[j] * w[i];
     }
+    fetch<kRows>(f, s, first, 1);
     for (i64 c = 0; c < s.count; ++c) {
-      Lanes sum = s.row[0][s.behind + c] * w[0];
+      fetch_column(s, c);
+      Lanes sum = s.at(0)[kRows + c] * w[0];
 #pragma GCC unroll 8
-      for (int i = 1; i < kRows; ++i) sum += s.row[i][s.behind + c] * w[i];
+      for (int i = 1; i < kRows; ++i) sum += s.at(i)[kRows + c] * w[i];
       at(y, s.column[c]) += sum;
     }
 #pragma GCC unroll 8
@@ -121,80 +97,77 @@ struct Several {
   }
 
   template <int kRows>
-  SM_PASS_INLINE static void backward(const Strip<kRows>& s, i64 first, double* y) {
+  SM_PASS_INLINE static void backward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
     Lanes w[kRows];
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) w[i] = Lanes{};
+    fetch<kRows>(f, s, first, -1);
     for (i64 c = 0; c < s.count; ++c) {
+      fetch_column(s, c);
       const Lanes z = at(y, s.column[c]);
 #pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) w[i] += s.row[i][s.behind + c] * z;
+      for (int i = 0; i < kRows; ++i) w[i] += s.at(i)[kRows + c] * z;
     }
 #pragma GCC unroll 8
     for (int i = kRows - 1; i >= 0; --i) {
-#pragma GCC unroll 8
-      for (int j = i + 1; j < kRows; ++j) w[i] += s.row[i][s.inside + j] * w[j];
       w[i] += at(y, first + i);
+#pragma GCC unroll 8
+      for (int j = kRows - 1; j > i; --j) w[i] += s.at(i)[j] * w[j];
       at(y, first + i) = w[i];
     }
   }
 };
 
-constexpr int kMostRows = 8;
-
-// A strip of `rows` <= kRows rows of a block.
-template <class Road, int kRows = kMostRows>
-SM_PASS_INLINE void forward_strip(const FactorRows& f, i64 block, i64 first, i64 rows, double* y) {
+// A strip of `rows` <= kRows rows.
+template <class Road, int kRows = kStripRows>
+SM_PASS_INLINE i64 forward_strip(Road& road, const FactorRows& f, i64 first, i64 rows, double* y) {
   if constexpr (kRows > 1) {
     if (rows < kRows) {
-      forward_strip<Road, kRows - 1>(f, block, first, rows, y);
-      return;
+      return forward_strip<Road, kRows - 1>(road, f, first, rows, y);
     }
   }
-  Road::forward(f, strip_of<kRows>(f, block, first), first, y);
+  road.forward(f, Strip<kRows>(f, first), first, y);
+  return kRows;
 }
 
-template <class Road, int kRows = kMostRows>
-SM_PASS_INLINE void backward_strip(const FactorRows& f, i64 block, i64 first, i64 rows, double* y) {
+template <class Road, int kRows = kStripRows>
+SM_PASS_INLINE i64 backward_strip(Road& road, const FactorRows& f, i64 end, i64 rows, double* y) {
   if constexpr (kRows > 1) {
     if (rows < kRows) {
-      backward_strip<Road, kRows - 1>(f, block, first, rows, y);
-      return;
+      return backward_strip<Road, kRows - 1>(road, f, end, rows, y);
     }
   }
-  Road::backward(strip_of<kRows>(f, block, first), first, y);
+  road.backward(f, Strip<kRows>(f, end - kRows), end - kRows, y);
+  return kRows;
 }
 
 template <class Road>
-SM_PASS_TARGET void forward_pass(const FactorRows& f, double* y) {
-  for (i64 block = 0; block < f.n;) {
-    i64 end = block + 1;
-    while (f.continues(end - 1)) ++end;
-    if (end == block + 1) {
-      Road::forward(f, strip_of<1>(f, block, block), block, y);
+SM_PASS_TARGET void forward_pass(const FactorRows& given, double* y) {
+  const FactorRows f = given;
+  Road road;
+  for (i64 k = 0; k < f.n;) {
+    const i64 rows = f.rows_from(k);
+    if (rows == 1) {
+      road.forward(f, Strip<1>(f, k), k, y);
+      ++k;
     } else {
-      for (i64 k = block; k < end; k += kMostRows)
-        forward_strip<Road>(f, block, k, std::min<i64>(kMostRows, end - k), y);
+      k += forward_strip(road, f, k, rows, y);
     }
-    block = end;
   }
 }
 
 template <class Road>
-SM_PASS_TARGET void backward_pass(const FactorRows& f, double* y) {
-  for (i64 end = f.n; end > 0;) {
-    i64 block = end - 1;
-    while (block > 0 && f.continues(block - 1)) --block;
-    if (end == block + 1) {
-      Road::backward(strip_of<1>(f, block, block), block, y);
+SM_PASS_TARGET void backward_pass(const FactorRows& given, double* y) {
+  const FactorRows f = given;
+  Road road;
+  for (i64 k = f.n; k > 0;) {
+    const i64 rows = f.rows_to(k);
+    if (rows == 1) {
+      --k;
+      road.backward(f, Strip<1>(f, k), k, y);
     } else {
-      for (i64 k = end; k > block;) {
-        const i64 rows = std::min<i64>(kMostRows, k - block);
-        k -= rows;
-        backward_strip<Road>(f, block, k, rows, y);
-      }
+      k -= backward_strip(road, f, k, rows, y);
     }
-    end = block;
   }
 }
 

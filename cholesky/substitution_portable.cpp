@@ -4,10 +4,15 @@
 #include "cholesky/substitution.hpp"
 
 #define SM_PASS_TARGET
+#define SM_PASS_INLINE __attribute__((always_inline)) inline
 
 namespace sm {
 
 namespace {
+
+#include "cholesky/substitution_access.hpp"
+
+using Access = PlainAccess;
 
 #include "cholesky/substitution_body.hpp"
 

@@ -11,7 +11,9 @@
 // column. The words of iu whose rows are still to come hold the columns collected: behind row k there are as many as
 // columns.
 #include <algorithm>
+#include <bit>
 #include <cmath>
+#include <cstdint>
 
 #include "cholesky/lookahead.hpp"
 #include "cholesky/search.hpp"
@@ -23,6 +25,10 @@ namespace sm {
 namespace {
 
 constexpr i64 kSearchGain = 3;  // one search of a tail costs as much as flagging about so many of its columns
+
+constexpr i64 kFewExtras = 12;  // sorted by comparing
+constexpr i64 kBitmapGain = 4;  // comparing costs an extra as much as reading about so many words of a bitmap
+constexpr i64 kBits = 64;
 
 struct ColumnState {
   i64 block;  // the row with which the column was last stored in ju
@@ -66,6 +72,7 @@ class SymbolicRows {
   void collect_extras(i64 k, i64 others);
   template <class IsIn>
   void collect(i64 k, IsIn is_in);
+  void sort_extras(i64 k);
   bool store_joined(i64 k);
   bool found_in_last_block(i64 k);
   Joined joined() const { return {tail_, tail_ + tail_length_, collected_, collected_ + count_, n_}; }
@@ -118,15 +125,17 @@ i64 SymbolicRows::longest_tail(i64 k) {
   return all - tail_length_;
 }
 
-// Leaves in collected_ what is not in the tail.
+// Leaves in collected_ what is not in the tail. Whether a column is new cannot be foretold, so it is put down in any
+// case and then counted or not; there is always room, since the tail has a column at least.
 template <class IsIn>
 void SymbolicRows::collect(i64 k, IsIn is_in) {
   const i64 own = count_;
   count_ = 0;
   const auto take = [&](i64 c) {
-    if (columns_[c].flag == 2 * k + 1 || is_in(c)) return;
+    const bool known = columns_[c].flag == 2 * k + 1 || is_in(c);
     columns_[c].flag = 2 * k + 1;
-    collected_[count_++] = c;
+    collected_[count_] = c;
+    count_ += known ? 0 : 1;
   };
   for (i64 t = 0; t < own; ++t) take(collected_[t]);
   for (i64 i = jl_[k]; i >= 0; i = jl_[i]) {
@@ -145,6 +154,7 @@ i64 SymbolicRows::block_of_tail() const {
 }
 
 void SymbolicRows::collect_extras(i64 k, i64 others) {
+  if (tail_length_ == 0) return;  // the row has its own entries only, each once
   if ((count_ + others) * kSearchGain < tail_length_) {
     const i64 block = block_of_tail();
     const i64 last = tail_[tail_length_ - 1];
@@ -155,6 +165,30 @@ void SymbolicRows::collect_extras(i64 k, i64 others) {
     for (const i64* c = tail_; c != tail_ + tail_length_; ++c) columns_[*c].flag = 2 * k + 1;
     collect(k, [](i64) { return false; });
   }
+}
+
+// Leaves the extras ascending. Many of them are marked in a bitmap of the columns to come, together with the tail, and
+// the whole row read from there; the tail is then empty. The bitmap takes the last of the words that hold the columns
+// collected: what is written stays behind what is read, even when no column is missing.
+void SymbolicRows::sort_extras(i64 k) {
+  const i64 columns = n_ - k - 1;
+  const i64 words = (columns + kBits - 1) / kBits;
+  if (count_ < kFewExtras || words > kBitmapGain * count_ || count_ + words > columns) {
+    std::sort(collected_, collected_ + count_);
+    return;
+  }
+  auto* bitmap = reinterpret_cast<std::uint64_t*>(collected_ + columns - words);
+  std::fill_n(bitmap, words, 0);
+  const auto mark = [&](i64 c) { bitmap[(c - k - 1) / kBits] |= std::uint64_t{1} << (c - k - 1) % kBits; };
+  std::for_each(collected_, collected_ + count_, mark);
+  std::for_each(tail_, tail_ + tail_length_, mark);
+  i64* next = collected_;
+  for (i64 w = 0; w < words; ++w) {
+    const i64 first = k + 1 + w * kBits;
+    for (std::uint64_t left = bitmap[w]; left != 0; left &= left - 1) *next++ = first + std::countr_zero(left);
+  }
+  count_ = next - collected_;
+  tail_length_ = 0;
 }
 
 // Looks for the row in the last block of subscripts. True when all of it is there; when the block ends first, the new
@@ -203,7 +237,7 @@ SmStatus SymbolicRows::row(i64 k) {
   } else {
     collect_extras(k, longest_tail(k));
     if (count_ > 0) {
-      std::sort(collected_, collected_ + count_);
+      sort_extras(k);
       if (!store_joined(k)) return SM_TOO_LARGE;
     }
     count = tail_length_ + count_;

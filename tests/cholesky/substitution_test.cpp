@@ -1,7 +1,9 @@
 // Solves of one and of many right-hand sides with a sparse factor, with each set of vectors that the CPU has.
 #include "cholesky/substitution.hpp"
 
+#include <algorithm>
 #include <cmath>
+#include <string>
 
 #include "cholesky/cholesky_support.hpp"
 #include "cholesky/tiles.hpp"
@@ -10,6 +12,35 @@ namespace sm::test {
 namespace {
 
 constexpr TileSet kSets[] = {TileSet::avx512, TileSet::avx2, TileSet::portable};
+
+// Each with `width` coefficients of its own, joined to a border of columns: the first and the last two subjects to all
+// of it, the others to every second of them. What a subject adds has this rank.
+struct Subjects {
+  static constexpr std::int64_t kCount = 6;
+  std::int64_t width;
+  std::int64_t border;
+  std::int64_t rank;
+};
+
+Problem normal_equations(Random& random, const Subjects& s) {
+  const std::int64_t first_of_border = Subjects::kCount * s.width;
+  const std::int64_t n = first_of_border + s.border;
+  std::vector<std::vector<double>> a(at(n), std::vector<double>(at(n)));
+  for (std::int64_t subject = 0; subject < Subjects::kCount; ++subject) {
+    Indices column;
+    for (std::int64_t i = 0; i < s.width; ++i) column.push_back(subject * s.width + i);
+    const std::int64_t step = subject < 2 || subject >= 4 ? 1 : 2;
+    for (std::int64_t c = 0; c < s.border; c += step) column.push_back(first_of_border + c);
+    for (std::int64_t record = 0; record < s.rank; ++record) {
+      std::vector<double> z = random.vector(static_cast<std::int64_t>(column.size()));
+      if (record < s.width) z[at(record)] += 40.0;  // mostly about that coefficient: no pivot is small
+      for (std::size_t i = 0; i < column.size(); ++i)
+        for (std::size_t j = 0; j < column.size(); ++j) a[at(column[i])][at(column[j])] += z[i] * z[j];
+    }
+  }
+  for (std::int64_t c = first_of_border; c < n; ++c) a[at(c)][at(c)] += 3.0;
+  return problem_of(a);
+}
 
 class SubstitutionTest : public ModuleTest {
  protected:
@@ -44,10 +75,15 @@ class SubstitutionTest : public ModuleTest {
     }
     return x;
   }
-  void check(const Problem& problem, Random& random, std::int64_t count, bool definite) {
+  void check(const Problem& problem, Random& random, std::int64_t count, bool definite,
+             const Indices* order = nullptr) {
     if (problem.n == 0) return;
     SmMatrix* m = new_sparse(session(), problem);
+    if (order) {
+      ASSERT_EQ(qxsmorder(m, order->data()), SM_OK);
+    }
     ASSERT_EQ(fn().qxsmfact(m, 0), SM_OK);
+    rank_ = m->rank;
     const std::vector<double> b = random.vector(problem.n * count);
     const std::vector<double> want = by_loops(m, b);
     std::vector<double> first;
@@ -63,6 +99,15 @@ class SubstitutionTest : public ModuleTest {
     }
     ASSERT_EQ(fn().qxsmDestroyMatrix(instance(), &m), SM_OK);
   }
+  // The same for subjects in natural order.
+  void check_subjects(Random& random, const Subjects& subjects, std::int64_t count) {
+    const Problem problem = normal_equations(random, subjects);
+    const Indices order = natural_order(problem.n);
+    check(problem, random, count, subjects.rank >= subjects.width, &order);
+    const std::int64_t dropped = std::max<std::int64_t>(0, subjects.width - subjects.rank);
+    EXPECT_EQ(rank_, problem.n - dropped * Subjects::kCount);
+  }
+  std::int64_t rank_ = 0;  // of the matrix checked last
 };
 INSTANTIATE_BOTH_HOSTS(SubstitutionTest);
 
@@ -88,6 +133,31 @@ TEST_P(SubstitutionTest, leaves_dropped_pivots_out) {
     Random random(seed);
     check(cross_product(random, 2 + random.below(20), random.below(8), random.below(4)).problem, random, 11, false);
   }
+}
+
+TEST_P(SubstitutionTest, solves_narrow_blocks_with_tails_of_every_length) {
+  Random random(5);
+  for (std::int64_t width = 1; width <= 10; ++width) {
+    for (std::int64_t border = 0; border <= 35; ++border) {
+      SCOPED_TRACE(std::to_string(width) + " rows, " + std::to_string(border) + " columns behind them");
+      check_subjects(random, {width, border, width}, 1);
+    }
+  }
+}
+
+TEST_P(SubstitutionTest, solves_narrow_blocks_with_dropped_pivots) {
+  Random random(7);
+  for (std::int64_t width = 2; width <= 9; ++width) {
+    for (const std::int64_t border : {0, 1, 7, 8, 10, 17, 32, 33}) {
+      SCOPED_TRACE(std::to_string(width) + " rows, " + std::to_string(border) + " columns behind them");
+      check_subjects(random, {width, border, 1 + random.below(width - 1)}, 10);
+    }
+  }
+}
+
+TEST_P(SubstitutionTest, solves_1_to_33_right_hand_sides) {
+  Random random(9);
+  for (std::int64_t count = 1; count <= 33; ++count) check_subjects(random, {6, 10, 6}, count);
 }
 
 }  // namespace

@@ -85,6 +85,25 @@ TEST_P(SymbolicTest, finds_the_true_fill_where_long_rows_take_over_from_many) {
   }
 }
 
+// Row 2 joins the even columns with the odd ones: up to and beyond every whole number of words of 64 columns, some of
+// the last ones missing or not.
+TEST_P(SymbolicTest, finds_a_row_that_joins_two_halves_of_the_columns) {
+  for (std::int64_t n = 20; n < 290; n += n % 64 < 8 || n % 64 > 60 ? 1 : 5) {
+    for (std::int64_t missing = 0; missing < 3; ++missing) {
+      Graph graph{n, {{0, 2}, {1, 2}}};
+      for (std::int64_t j = 3; j < n - missing; ++j) graph.edges.emplace_back(j % 2, j);
+      const Indices order = natural_order(n);
+      SmMatrix* m = reordered_matrix(graph, &order);
+      ASSERT_EQ(qxsmsymbfact(m), SM_OK) << n;
+      expect_well_formed(m);
+      EXPECT_EQ(stored_structure(m), true_fill(graph, order)) << n;
+      EXPECT_EQ(words(m->factor_ju, m->factor_iju[n - 1] + 1), compressed_subscripts(graph, order)) << n;
+      destroy(m);
+      if (HasFailure()) FAIL() << n << " columns, without the last " << missing;
+    }
+  }
+}
+
 TEST_P(SymbolicTest, finds_the_true_fill_of_every_graph_of_up_to_five_vertices) {
   for (std::int64_t n = 1; n <= 5; ++n) {
     const Graph all = clique(n);
