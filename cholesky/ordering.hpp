@@ -10,7 +10,9 @@ namespace sm {
 // The edges of a matrix's graph: entries above the diagonal, a repeated one counted once.
 struct EdgeCount {
   i64 edges = 0;
-  bool repeated = false;
+  i64 longest = 0;   // row
+  i64 highest = 0;   // number of neighbours
+  bool tidy = true;  // every row ascends, so that none is repeated
 };
 
 // Leaves in degree[i] the number of neighbours of row i. Both arrays have a word for each row.

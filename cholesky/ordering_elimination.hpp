@@ -5,11 +5,19 @@
 
 namespace sm {
 
+// Without an instruction that older processors lack, and without a call.
+inline unsigned count_bits(std::uint64_t bits) {
+  bits -= bits >> 1 & 0x5555555555555555U;
+  bits = (bits & 0x3333333333333333U) + (bits >> 2 & 0x3333333333333333U);
+  bits = (bits + (bits >> 4)) & 0x0F0F0F0F0F0F0F0FU;
+  return static_cast<unsigned>(bits * 0x0101010101010101U >> 56);
+}
+
 template <class Index>
 void OrderingGraph<Index>::restart_stamps() {
   for (Index v = 0; v < n_; ++v) {
-    if (vertex(v).mark != kGone) {
-      vertex(v).mark = 0;
+    if (mark_[v] != kGone) {
+      mark_[v] = 0;
     } else {
       element(v).met = element(v).claimed = 0;
     }
@@ -41,27 +49,31 @@ Index OrderingGraph<Index>::take_minimum() {
 template <class Index>
 Index OrderingGraph<Index>::count_degree(Index v, Index enough) {
   if (stamp_ >= kGone - 2) restart_stamps();
-  walk_elements(v, [](Element&) {});
-  const Vertex& mine = vertex(v);
-  const Index* list = elements_of(v);
+  Vertex& mine = vertex(v);
+  walk_elements(mine, [](Element&) {});
+  const Index* list = elements_of(mine);
   const Index newest = list[mine.cells - 1];
   const Element& first = element(newest);
   if (marked_ != newest) {
     next_stamp();
-    for (Index b = 0; b < first.size; ++b) vertex(arena_[first.begin + b]).mark = stamp_;
+    for (Index b = 0; b < first.size; ++b) mark_[arena_[first.begin + b]] = stamp_;
     marked_ = newest;
     marked_stamp_ = stamp_;
   }
   next_stamp();
+  const Index stamp = stamp_;
+  const Index marked = marked_stamp_;
   Index degree = first.size + mine.vertices;
   for (Index k = mine.cells - 1; k-- > 0 && degree <= enough;) {
     const Element& e = element(list[k]);
     const Index* boundary = arena_ + e.begin;
-    for (Index b = 0; b < e.size; ++b) {
-      Index& mark = vertex(boundary[b]).mark;
-      if (mark == stamp_ || mark == marked_stamp_) continue;
-      mark = stamp_;
-      ++degree;
+    const Index size = e.size;
+    for (Index b = 0; b < size; ++b) {
+      Index& mark = mark_[boundary[b]];
+      const Index seen = mark;
+      const bool fresh = seen != stamp && seen != marked;
+      degree += fresh;
+      mark = fresh ? stamp : seen;
     }
   }
   return degree;
@@ -87,144 +99,214 @@ void OrderingGraph<Index>::reserve(Index more) {
   top_ = to;
 }
 
-// The uneliminated neighbours of the pivot: what the elements that it absorbs bound, the newest element first, then
-// what is left of its own neighbours. Contained elements lead to nothing new.
+// What the elements that the pivot absorbs bound, the newest element first. Contained elements lead to nothing new.
+template <class Index>
+Index* OrderingGraph<Index>::add_elements(const Vertex& pivot, Index* end) {
+  const Index* list = elements_of(pivot);
+  const Index stamp = stamp_;
+  for (Index k = pivot.cells; k-- > 0;) {
+    Element& e = element(list[k]);
+    const Index size = e.size;
+    const Index* from = arena_ + e.begin;
+    for (Index b = 0; b < size; ++b) {
+      const Index v = from[b];
+      Vertex& other = vertex(v);
+      --other.elements;
+      __builtin_prefetch(elements_of(other));
+      const Index seen = mark_[v];
+      *end = v;
+      end += seen < stamp;
+      mark_[v] = std::max(seen, stamp);
+    }
+    if (size != 0) absorb(e);
+  }
+  const Index* const room_end = list + pivot.room;
+  for (const Index* cell = room_end - pivot.contained; cell != room_end; ++cell) {
+    Element& e = element(*cell);
+    if (e.size == 0) continue;
+    for (Index b = 0; b < e.size; ++b) --vertex(arena_[e.begin + b]).elements;
+    absorb(e);
+  }
+  return end;
+}
+
+// What is left of the pivot's own neighbours: hubs have their place among the others, which descend.
+template <class Index>
+Index* OrderingGraph<Index>::add_neighbours(Vertex& pivot, Index* end) {
+  const Index* neighbour = slots_ + pivot.start;
+  const Index* const list_end = elements_of(pivot);
+  std::uint64_t hubs = pivot.hubs;
+  for (Index left = pivot.vertices; left > 0;) {
+    Index v = neighbour != list_end ? *neighbour : 0;
+    bool from_list = true;
+    if (hubs != 0) {
+      const int highest = 63 - std::countl_zero(hubs);
+      const Index hub = hubs_[highest];
+      if (neighbour == list_end || hub > v) {
+        v = hub;
+        hubs ^= std::uint64_t{1} << highest;
+        from_list = false;
+      }
+    }
+    neighbour += from_list;
+    if (mark_[v] >= stamp_) continue;  // eliminated, or covered by an element of the pivot
+    mark_[v] = stamp_;
+    --vertex(v).vertices;
+    --left;
+    *end++ = v;
+  }
+  return end;
+}
+
+// The neighbours of a hub know of it, but not it of them.
+template <class Index>
+Index* OrderingGraph<Index>::add_hub_neighbours(const Vertex& pivot, Index* end) {
+  const std::uint64_t bit = hub_bit(pivot);
+  Index left = pivot.vertices;
+  for (Index v = n_; left > 0;) {
+    if (mark_[--v] >= stamp_ || (vertex(v).hubs & bit) == 0) continue;
+    mark_[v] = stamp_;
+    --vertex(v).vertices;
+    --left;
+    *end++ = v;
+  }
+  return end;
+}
+
+// The uneliminated neighbours of the pivot.
 template <class Index>
 Index* OrderingGraph<Index>::form_element(Index pivot, Index& size) {
   Vertex& mine = vertex(pivot);
   reserve(2 * mine.degree);  // the purge sets the prototypes aside behind the boundary
   next_stamp();
   Index* const boundary = arena_ + top_ + 1;
-  Index* end = boundary;
-  const Index* list = elements_of(pivot);
-  for (Index k = mine.cells; k-- > 0;) {
-    Element& e = element(list[k]);
-    const Index* from = arena_ + e.begin;
-    for (Index b = 0; b < e.size; ++b) {
-      Vertex& other = vertex(from[b]);
-      --other.elements;
-      if (other.mark >= stamp_) continue;
-      other.mark = stamp_;
-      __builtin_prefetch(&places_[from[b]]);
-      *end++ = from[b];
-    }
-    if (e.size != 0) absorb(e);
-  }
-  const Index* const room_end = elements_of(pivot + 1);
-  for (const Index* cell = room_end - places_[pivot].contained; cell != room_end; ++cell) {
-    Element& e = element(*cell);
-    if (e.size == 0) continue;
-    for (Index b = 0; b < e.size; ++b) --vertex(arena_[e.begin + b]).elements;
-    absorb(e);
-  }
-  const Index* neighbour = neighbours_ + places_[pivot].start;
-  for (Index left = mine.vertices; left > 0; ++neighbour) {
-    Vertex& other = vertex(*neighbour);
-    if (other.mark >= stamp_) continue;  // eliminated, or covered by an element of the pivot
-    other.mark = stamp_;
-    --other.vertices;
-    --left;
-    *end++ = *neighbour;
-  }
+  Index* end = add_elements(mine, boundary);
+  if (mine.vertices > 0) end = is_hub(mine) ? add_hub_neighbours(mine, end) : add_neighbours(mine, end);
   marked_ = pivot;
   marked_stamp_ = stamp_;
   size = static_cast<Index>(end - boundary);
   return boundary;
 }
 
-// The new element covers the edges inside its boundary. Also finds the hubs on it.
+// Finds the hubs of a boundary, and those of its vertices whose lists of elements are not walked.
 template <class Index>
-void OrderingGraph<Index>::cover_edges(const Index* boundary, Index size) {
+void OrderingGraph<Index>::find_passed(const Index* boundary, Index size) {
   its_hubs_ = passed_hubs_ = 0;
   passed_others_ = 0;
   walked_ = std::max(size / 2, kWalked);
   for (Index b = 0; b < size; ++b) {
-    const Index v = boundary[b];
-    Vertex& mine = vertex(v);
-    const std::uint64_t bit = hub_bit(v);
-    __builtin_prefetch(elements_of(v));
+    const Vertex& mine = vertex(boundary[b]);
+    if (mine.room <= kWalked) continue;
+    const std::uint64_t bit = hub_bit(mine);
     its_hubs_ |= bit;
-    if (!is_walked(mine)) {
-      passed_hubs_ |= bit;
-      passed_others_ += bit == 0;
-    }
+    if (is_walked(mine)) continue;
+    passed_hubs_ |= bit;
+    passed_others_ += bit == 0;
+  }
+}
+
+// Takes from hubs the edges to so many vertices.
+template <class Index>
+void OrderingGraph<Index>::cover_hubs(std::uint64_t bits, Index times) {
+  for (; bits != 0; bits &= bits - 1) vertex(hubs_[std::countr_zero(bits)]).vertices -= times;
+}
+
+// The new element covers the edges inside its boundary.
+template <class Index>
+void OrderingGraph<Index>::cover_edges(const Index* boundary, Index size) {
+  std::uint64_t last = 0;  // hubs that the previous vertices had in common
+  Index times = 0;
+  for (Index b = 0; b < size; ++b) {
+    Vertex& mine = vertex(boundary[b]);
     if (mine.vertices == 0) continue;
-    Index* own = own_ + places_[v].own_start;
-    Index kept = 0;
-    for (Index k = 0; k < places_[v].owned; ++k) {
-      Vertex& other = vertex(own[k]);
-      if (other.mark == stamp_) {
-        --mine.vertices;
-        --other.vertices;
-      } else if (other.mark != kGone) {
-        own[kept++] = own[k];
+    const std::uint64_t covered = mine.hubs & its_hubs_;
+    if (covered != 0) {
+      mine.hubs ^= covered;
+      mine.vertices -= count_bits(covered);
+      if (!is_hub(mine)) {
+        if (covered != last) {
+          cover_hubs(last, times);
+          last = covered;
+          times = 0;
+        }
+        ++times;
       }
     }
-    places_[v].owned = kept;
+    Index* own = slots_ + mine.own;
+    Index kept = 0;
+    for (Index k = 0; k < mine.owned; ++k) {
+      const Index w = own[k];
+      const Index mark = mark_[w];
+      if (mark == stamp_) {
+        --mine.vertices;
+        --vertex(w).vertices;
+      } else if (mark != kGone) {
+        own[kept++] = w;
+      }
+    }
+    mine.owned = kept;
   }
+  cover_hubs(last, times);
 }
 
-// Visits the elements on the list of a vertex that are neither absorbed nor contained, and takes the others off.
+// Visits the elements on the list of a vertex, takes off the absorbed ones and sets apart the contained ones.
 template <class Index>
 template <class Visit>
-void OrderingGraph<Index>::walk_elements(Index v, Visit&& visit) {
-  const Index cells = vertex(v).cells;
+void OrderingGraph<Index>::walk_elements(Vertex& v, Visit&& visit) {
+  const Index cells = v.cells;
   Index* list = elements_of(v);
   Index kept = 0;
+  bool any_contained = false;
   for (Index k = 0; k < cells; ++k) {
-    Element& e = element(list[k]);
-    if (e.size == 0 || e.contained) continue;
-    if (kept != k) std::swap(list[kept], list[k]);
-    ++kept;
+    const Index name = list[k];
+    Element& e = element(name);
+    list[kept] = name;
+    kept += e.size != 0;
+    any_contained |= e.size != e.live;
     visit(e);
   }
-  if (kept != cells) set_contained_apart(v, kept);
+  v.cells = kept;
+  if (any_contained) set_contained_apart(v);
 }
 
-// Behind the first `kept` cells: contained elements go to the end of the room, from the right so that none is lost.
+// Contained elements go to the end of the room, from the right so that none is lost.
 template <class Index>
-void OrderingGraph<Index>::set_contained_apart(Index v, Index kept) {
-  Vertex& mine = vertex(v);
+void OrderingGraph<Index>::set_contained_apart(Vertex& v) {
   Index* list = elements_of(v);
-  const Index room = element_room(v);
-  Index& contained = places_[v].contained;
-  for (Index k = mine.cells; k-- > kept;) {
-    if (element(list[k]).size != 0) list[room - ++contained] = list[k];
+  Index kept = 0;
+  for (Index k = 0; k < v.cells; ++k) {
+    if (element(list[k]).live != 0) std::swap(list[kept++], list[k]);
   }
-  mine.cells = kept;
+  for (Index k = v.cells; k-- > kept;) list[v.room - ++v.contained] = list[k];
+  v.cells = kept;
 }
 
 // The only element of a vertex whose list has been walked.
 template <class Index>
-Index OrderingGraph<Index>::single_element(Index v) {
+Index OrderingGraph<Index>::single_element(Vertex& v) {
   const Index* list = elements_of(v);
-  if (vertex(v).cells == 1) return list[0];
-  const Index room = element_room(v);
-  Index& contained = places_[v].contained;
-  while (element(list[room - contained]).size == 0) --contained;
-  return list[room - contained];
+  if (v.cells == 1) return list[0];
+  while (element(list[v.room - v.contained]).size == 0) --v.contained;
+  return list[v.room - v.contained];
 }
 
 template <class Index>
-void OrderingGraph<Index>::make_room(Index v) {
+void OrderingGraph<Index>::make_room(Vertex& v) {
   walk_elements(v, [](Element&) {});
   Index* list = elements_of(v);
-  const Index room = element_room(v);
-  Index& contained = places_[v].contained;
   Index kept = 0;
-  for (Index k = 1; k <= contained; ++k) {
-    const Index e = list[room - k];
-    if (element(e).size != 0) list[room - ++kept] = e;
+  for (Index k = 1; k <= v.contained; ++k) {
+    const Index e = list[v.room - k];
+    if (element(e).size != 0) list[v.room - ++kept] = e;
   }
-  contained = kept;
+  v.contained = kept;
 }
 
 template <class Index>
-void OrderingGraph<Index>::push_element(Index v, Index e) {
-  Vertex& mine = vertex(v);
-  if (mine.cells + places_[v].contained == element_room(v)) make_room(v);
-  elements_of(v)[mine.cells++] = e;
-  ++mine.elements;
+void OrderingGraph<Index>::push_element(Vertex& v, Index e) {
+  if (v.cells + v.contained == v.room) make_room(v);
+  elements_of(v)[v.cells++] = e;
+  ++v.elements;
 }
 
 // Eliminates the vertices that nothing but the new element touches. Of those that it leaves with the same single
@@ -234,23 +316,21 @@ typename OrderingGraph<Index>::Element OrderingGraph<Index>::purge(Index pivot, 
   Index* const prototypes = boundary + size;
   Index count = 0;
   Index kept = 0;
-  const auto meet = [this](Element& e) {
-    if (e.met != stamp_) {
-      e.met = stamp_;
-      e.outside = e.size;
-      if (passed_hubs_ != 0) {
-        const auto its = static_cast<std::uint64_t>(inv_perm_[&reinterpret_cast<Node&>(e) - graph_]);
-        e.outside -= static_cast<Index>(std::popcount(its & passed_hubs_));
-      }
-    }
-    --e.outside;
+  const Index stamp = stamp_;
+  const std::uint64_t passed = passed_hubs_;
+  const auto meet = [stamp, passed](Element& e) {
+    Index outside = e.met == stamp ? e.outside : e.size;
+    if (passed != 0 && e.met != stamp) outside -= count_bits(e.hubs & passed);
+    e.outside = outside - 1;
+    e.met = stamp;
   };
   for (Index b = 0; b < size; ++b) {
     const Index v = boundary[b];
     Vertex& mine = vertex(v);
     if (b + 2 < size) {
-      const Index* ahead = elements_of(boundary[b + 2]);
-      const Index cells = std::min<Index>(vertex(boundary[b + 2]).cells, 4);
+      const Vertex& next = vertex(boundary[b + 2]);
+      const Index* ahead = elements_of(next);
+      const Index cells = std::min<Index>(next.cells, 4);
       for (Index k = 0; k < cells; ++k) __builtin_prefetch(&graph_[ahead[k]]);
     }
     if (lists_.holds(v)) lists_.remove(v);
@@ -260,22 +340,22 @@ typename OrderingGraph<Index>::Element OrderingGraph<Index>::purge(Index pivot, 
     }
     bool claims = false;
     if (is_walked(mine)) {
-      walk_elements(v, meet);
+      walk_elements(mine, meet);
       if (mine.elements == 1 && mine.vertices == 0) {
-        Element& single = element(single_element(v));
-        claims = single.claimed != stamp_;
-        single.claimed = stamp_;
+        Element& single = element(single_element(mine));
+        claims = single.claimed != stamp;
+        single.claimed = stamp;
       }
     }
-    push_element(v, pivot);
-    if (claims) {
-      prototypes[count++] = v;
-    } else {
-      boundary[kept++] = v;
-    }
+    push_element(mine, pivot);
+    prototypes[count] = v;
+    count += claims;
+    boundary[kept] = v;
+    kept += !claims;
   }
   std::copy_n(prototypes, count, boundary + kept);
-  return {kGone, kept + count, static_cast<Index>(boundary - arena_), count, 0, 0, 0, 0};
+  const Index left = kept + count;
+  return {left, left, static_cast<Index>(boundary - arena_), count, 0, 0, 0, its_hubs_};
 }
 
 template <class Index>
@@ -286,17 +366,18 @@ void OrderingGraph<Index>::update_degree(Index v, const Element& made) {
     return;
   }
   const bool prototype = mine.elements == 2 && mine.vertices == 0;
-  const Index* list = elements_of(v);
+  const Index* list = elements_of(mine);
+  const Index stamp = stamp_;
   Index most = 0;
   Index sum = 0;
   for (Index k = 0; k + 1 < mine.cells; ++k) {
     Element& e = element(list[k]);
-    if (e.met != stamp_) {  // a list that has become short since
+    if (e.met != stamp) {  // a list that has become short since
       sum += e.size;
       continue;
     }
-    if (e.claimed == stamp_ && !prototype) return;  // outmatched
-    if (e.outside == 0) e.contained = 1;
+    if (e.claimed == stamp && !prototype) return;  // outmatched
+    e.live = e.outside == 0 ? 0 : e.live;
     most = std::max(most, e.outside);
     sum += e.outside;
   }
@@ -330,10 +411,10 @@ void OrderingGraph<Index>::eliminate_all() {
     number(pivot);
     Index size = 0;
     Index* boundary = form_element(pivot, size);
+    find_passed(boundary, size);
     cover_edges(boundary, size);
     const Element made = purge(pivot, boundary, size);
     element(pivot) = made;
-    inv_perm_[pivot] = static_cast<i64>(its_hubs_);
     if (made.size == 0) continue;
     arena_[top_] = pivot;
     top_ += made.size + 1;
@@ -343,7 +424,6 @@ void OrderingGraph<Index>::eliminate_all() {
       update_degrees(boundary, made, ordered_ - before);
     }
   }
-  for (Index k = 0; k < n_; ++k) inv_perm_[perm_[k]] = static_cast<i64>(k);
 }
 
 }  // namespace sm

@@ -44,64 +44,63 @@
 #include <utility>
 
 #include "cholesky/degree_lists.hpp"
+#include "cholesky/ordering.hpp"
 #include "frame/core.hpp"
 
 namespace sm {
 
+// Vertices and elements fill a line of the cache each, when the index is narrow: a visit brings in one.
 template <class Index>
 struct GraphVertex {
-  Index mark;                    // the stamp of the last visit; kGone once eliminated
-  Index vertices;                // neighbours that no element covers
-  Index elements;                // elements that it lies in, but for absorbed ones
-  Index cells;                   // of its list of elements
+  Index vertices;  // neighbours that no element covers
+  Index elements;  // elements that it lies in, but for absorbed ones
+  Index cells;     // of its list of elements
+  Index contained;  // elements at the end of the room for its elements that are contained in newer ones
   Index child, sibling, before;  // degree lists
-  Index degree;                  // 1 + neighbours, or less while only a bound is known
+  Index degree;  // 1 + neighbours, or less while only a bound is known
+  Index start;   // of its neighbours but for hubs, up to `list`; of a hub its number
+  Index own;     // where the edges that it owns start
+  Index owned;   // how many of them are left
+  Index list;    // where the list of its elements starts
+  Index room;    // for that list
+  i64 time;      // when its degree was due
+  std::uint64_t hubs;  // bits of the neighbours that are hubs
 };
 
 template <class Index>
 struct GraphElement {
-  Index mark;        // kGone
   Index size;        // vertices on the boundary; 0: absorbed
+  Index live;        // the same; 0 also when it is contained in a newer one
   Index begin;       // of the boundary, in the arena
   Index prototypes;  // how many of them end the boundary
   Index outside;     // boundary vertices that are not on that of the element `met` (more if hubs were passed over)
   Index met;         // stamp of the elimination that counts `outside`
   Index claimed;     // stamp of the elimination in which a prototype claimed it
-  Index contained;   // 1: in the boundary of a newer one
+  std::uint64_t hubs;  // bits of the hubs on the boundary
 };
 
 template <class Index>
-union GraphNode {
+union alignas(64) GraphNode {
   GraphVertex<Index> vertex;
   GraphElement<Index> element;
-};
-
-// Where a vertex has its lists.
-template <class Index>
-struct GraphPlaces {
-  Index start;      // of its neighbours; that of its elements follows from it
-  Index own_start;  // of the edges that it owns
-  Index owned;      // how many of them are left
-  Index contained;  // elements at the end of the room for its elements that are contained in newer ones
 };
 
 template <class Index>
 class OrderingGraph {
  public:
-  // Bytes of memory for that many vertices and edges; aligned to a node.
-  static std::uint64_t bytes(i64 vertices, i64 edges);
+  // Bytes of memory that are enough for the edges, wherever they start, and those that are of use.
+  static std::uint64_t bytes(i64 vertices, const EdgeCount& count, i64 slack = 0);
 
   // perm holds the number of neighbours of every row.
-  OrderingGraph(i64 vertices, i64 edges, void* memory, i64* perm, i64* inv_perm);
+  OrderingGraph(i64 vertices, const EdgeCount& count, void* memory, std::uint64_t bytes, i64* perm, i64* inv_perm);
 
-  void enter(const SmMatrix& m, bool repeated);
+  void enter(const SmMatrix& m);
   void eliminate_all();
 
  private:
   using Node = GraphNode<Index>;
   using Vertex = GraphVertex<Index>;
   using Element = GraphElement<Index>;
-  using Places = GraphPlaces<Index>;
   static constexpr Index kGone = static_cast<Index>(-1);
   // Longer lists of elements are not walked at each elimination beside them, unless the boundary is twice as long.
   static constexpr Index kWalked = 32;
@@ -109,14 +108,18 @@ class OrderingGraph {
 
   Vertex& vertex(Index v) const { return graph_[v].vertex; }
   Element& element(Index e) const { return graph_[e].element; }
-  Index* elements_of(Index v) const { return elements_ + places_[v].start + places_[v].start / 2 + v; }
-  Index element_room(Index v) const { return static_cast<Index>(elements_of(v + 1) - elements_of(v)); }
+  Index* elements_of(const Vertex& v) const { return slots_ + v.list; }
   bool is_walked(const Vertex& v) const { return v.cells <= walked_ || v.elements <= walked_; }
+  static Index room_for(Index degree) { return degree + degree / 2 + 1; }
+  bool is_hub(const Vertex& v) const { return v.room > hub_room_; }
+  std::uint64_t hub_bit(const Vertex& v) const { return is_hub(v) ? std::uint64_t{1} << v.start : 0; }
 
-  void enter_edges(const SmMatrix& m, bool repeated);
-  void own_edges();
   void find_hubs();
-  std::uint64_t hub_bit(Index v) const;
+  Index lay_out();
+  void enter_row(const SmMatrix& m, Index i);
+  void enter_hub(const SmMatrix& m, Index i);
+  void enter_untidy(const SmMatrix& m);
+  void own_edges(Index end);
   void next_stamp() {
     if (++stamp_ == kGone) restart_stamps();
   }
@@ -124,23 +127,28 @@ class OrderingGraph {
   Index take_minimum();
   Index count_degree(Index v, Index enough);
   void number(Index v) {
-    vertex(v).mark = kGone;
+    mark_[v] = kGone;
     perm_[ordered_++] = static_cast<i64>(v);
   }
   Index* form_element(Index pivot, Index& size);
+  Index* add_elements(const Vertex& pivot, Index* end);
+  Index* add_neighbours(Vertex& pivot, Index* end);
+  Index* add_hub_neighbours(const Vertex& pivot, Index* end);
   void absorb(Element& e) {
     arena_[e.begin - 1] = n_ + e.size;
-    e.size = 0;
+    e.size = e.live = 0;
   }
   void reserve(Index more);
+  void find_passed(const Index* boundary, Index size);
   void cover_edges(const Index* boundary, Index size);
+  void cover_hubs(std::uint64_t bits, Index times);
   Element purge(Index pivot, Index* boundary, Index size);
   template <class Visit>
-  void walk_elements(Index v, Visit&& visit);
-  void set_contained_apart(Index v, Index kept);
-  Index single_element(Index v);
-  void make_room(Index v);
-  void push_element(Index v, Index e);
+  void walk_elements(Vertex& v, Visit&& visit);
+  void set_contained_apart(Vertex& v);
+  Index single_element(Vertex& v);
+  void make_room(Vertex& v);
+  void push_element(Vertex& v, Index e);
   void update_degrees(const Index* boundary, const Element& made, Index eliminated);
   void update_degree(Index v, const Element& made);
 
@@ -152,29 +160,27 @@ class OrderingGraph {
   void finish(Index all);
   void absorb_elements(Index pivot, Index all, Stack& gone, Stack& single);
   void sort_singles(Stack& singles, const Stack& fresh, i64& place);
-  Index other_element(Index v, Index all) const;
+  Index other_element(const Vertex& v, Index all) const;
 
   Index n_;
-  Index edges_;
-  Node* graph_;
-  Index* head_;
-  Places* places_;
-  Index* neighbours_;  // in the order of entry, the latest first
-  Index* own_;         // neighbours of higher degree
-  Index* elements_;
+  EdgeCount count_;
+  Node* graph_;   // one more than vertices, for the degree lists
+  Index* slots_;  // of every vertex its neighbours, the latest first, and the room for its elements; then owned edges
   Index* arena_;  // boundaries, each behind the number of its element, or n + its length when that is absorbed
   Index arena_size_;
   Index top_ = 0;
   i64* perm_;
-  i64* inv_perm_;  // until the end: of a vertex its time in the degree lists, of an element the hubs on its boundary
+  // In the memory of the answer inv_perm, until the end:
+  Index* mark_;  // of a vertex the stamp of the last visit; kGone once eliminated
+  Index* head_;  // of the degree lists; of a wide index elsewhere
   DegreeLists<Index, Node> lists_;
   Index ordered_ = 0;
   Index stamp_ = kGone - 1000;  // so that no ordering of some size goes without the restart
   Index marked_ = kGone;        // the element whose whole boundary bears the mark marked_stamp_
   Index marked_stamp_ = 0;
-  Index hub_degree_ = 0;
+  Index hub_room_ = kGone;  // the most that is no hub's
   Index hub_count_ = 0;
-  Index hubs_[kHubs];
+  Index hubs_[kHubs];  // ascending
   // While an element is formed:
   Index walked_ = 0;  // the longest list that is walked
   std::uint64_t its_hubs_ = 0;
@@ -182,105 +188,8 @@ class OrderingGraph {
   Index passed_others_ = 0;        // vertices of the boundary whose elements are not walked, but for these
 };
 
-template <class Index>
-std::uint64_t OrderingGraph<Index>::bytes(i64 vertices, i64 edges) {
-  const auto n = static_cast<std::uint64_t>(vertices);
-  const auto e = static_cast<std::uint64_t>(edges);
-  return sizeof(Index) * (8 * n + (n + 1) + 4 * (n + 1) + 2 * e + e + (3 * e + n) + (3 * e + 2 * n));
-}
-
-template <class Index>
-OrderingGraph<Index>::OrderingGraph(i64 vertices, i64 edges, void* memory, i64* perm, i64* inv_perm)
-    : n_(static_cast<Index>(vertices)),
-      edges_(static_cast<Index>(edges)),
-      graph_(static_cast<Node*>(memory)),
-      head_(reinterpret_cast<Index*>(graph_ + n_)),
-      places_(reinterpret_cast<Places*>(head_ + n_ + 1)),
-      neighbours_(reinterpret_cast<Index*>(places_ + n_ + 1)),
-      own_(neighbours_ + 2 * edges_),
-      elements_(own_ + edges_),
-      arena_(elements_ + 3 * edges_ + n_),
-      arena_size_(3 * edges_ + 2 * n_),
-      perm_(perm),
-      inv_perm_(inv_perm),
-      lists_(graph_, head_, inv_perm, n_) {}
-
-template <class Index>
-void OrderingGraph<Index>::enter(const SmMatrix& m, bool repeated) {
-  Index start = 0;
-  for (Index v = 0; v < n_; ++v) {
-    places_[v] = {start, 0, 0, 0};
-    const Index degree = static_cast<Index>(perm_[v]);
-    start += degree;
-    // While the edges are entered, mark is the row that met v last and cells where its next neighbour goes.
-    vertex(v) = {kGone, degree, 0, start, 0, 0, lists_.kOutside, 0};
-  }
-  places_[n_] = {start, 0, 0, 0};
-  enter_edges(m, repeated);
-  own_edges();
-  find_hubs();
-  for (Index v = 0; v < n_; ++v) {
-    vertex(v).mark = 0;
-    vertex(v).cells = 0;
-    lists_.insert_newest(v, vertex(v).vertices + 1, Known::exact);
-  }
-}
-
-template <class Index>
-void OrderingGraph<Index>::enter_edges(const SmMatrix& m, bool repeated) {
-  for (Index i = 0; i < n_; ++i) {
-    for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
-      if (m.col_index[p] <= static_cast<i64>(i)) continue;
-      const Index j = static_cast<Index>(m.col_index[p]);
-      Vertex& other = vertex(j);
-      if (repeated) {
-        if (other.mark == i) continue;
-        other.mark = i;
-      }
-      neighbours_[--vertex(i).cells] = j;
-      neighbours_[--other.cells] = i;
-    }
-  }
-}
-
-// An edge belongs to its end of lower degree: a vertex owns few, however many it has.
-template <class Index>
-void OrderingGraph<Index>::own_edges() {
-  Index end = 0;
-  for (Index v = 0; v < n_; ++v) {
-    Places& place = places_[v];
-    place.own_start = end;
-    const Index degree = vertex(v).vertices;
-    for (Index k = place.start; k < places_[v + 1].start; ++k) {
-      const Index w = neighbours_[k];
-      const Index other = vertex(w).vertices;
-      if (other > degree || (other == degree && w > v)) own_[end++] = w;
-    }
-    place.owned = end - place.own_start;
-  }
-}
-
-// At most 64 vertices of the highest degrees, one bit each: which of them an element has on its boundary is kept.
-template <class Index>
-void OrderingGraph<Index>::find_hubs() {
-  for (hub_degree_ = kWalked;; hub_degree_ *= 2) {
-    hub_count_ = 0;
-    for (Index v = 0; v < n_ && hub_count_ <= kHubs; ++v) {
-      if (vertex(v).vertices <= hub_degree_) continue;
-      if (hub_count_ < kHubs) hubs_[hub_count_] = v;
-      ++hub_count_;
-    }
-    if (hub_count_ <= kHubs) return;
-  }
-}
-
-template <class Index>
-std::uint64_t OrderingGraph<Index>::hub_bit(Index v) const {
-  if (places_[v + 1].start - places_[v].start <= hub_degree_) return 0;
-  return std::uint64_t{1} << (std::lower_bound(hubs_, hubs_ + hub_count_, v) - hubs_);
-}
-
 }  // namespace sm
 
 #include "cholesky/ordering_elimination.hpp"
+#include "cholesky/ordering_entry.hpp"
 #include "cholesky/ordering_finish.hpp"
