@@ -14,28 +14,28 @@ namespace sm {
 // What is known of a degree: itself, or a bound from below.
 enum class Known : i64 { exact = 0, bound = 1 };
 
-// Node has the members child, sibling, before, degree and time, reached as graph[v].vertex. There is one more node than
+// Node has the members child, sibling, before and degree, reached as graph[v].vertex. There is one more node than
 // vertices: it ends the links, so that they can be set without asking whether they lead anywhere.
 template <class Index, class Node>
 class DegreeLists {
  public:
   static constexpr Index kOutside = static_cast<Index>(-1);  // `before` of a vertex that is in no list
 
-  // head: n places. Degrees are 1 to n.
-  DegreeLists(Node* graph, Index* head, Index n) : graph_(graph), head_(head), none_(n) {}
+  // head: n places; time: n words. Degrees are 1 to n.
+  DegreeLists(Node* graph, Index* head, i64* time, Index n) : graph_(graph), head_(head), time_(time), none_(n) {}
 
   void clear() {
     for (Index d = 0; d < none_; ++d) head_[d] = none_;
     at(none_).child = at(none_).sibling = none_;
   }
   bool holds(Index v) const { return at(v).before != kOutside; }
-  Known known(Index v) const { return static_cast<Known>(at(v).time & 1); }
+  Known known(Index v) const { return static_cast<Known>(time_[v] & 1); }
 
   void insert_newest(Index v, Index degree, Known known) {
     auto& entry = at(v);
     Index& head = head_[degree - 1];
     at(head).before = v;
-    entry.time = clock_ | static_cast<i64>(known);
+    time_[v] = clock_ | static_cast<i64>(known);
     clock_ += 2;
     entry.degree = degree;
     entry.child = head;
@@ -48,7 +48,7 @@ class DegreeLists {
   // A vertex that has left the lists comes back with its degree, at the time that it had.
   void insert_late(Index v, Index degree, Known known) {
     auto& entry = at(v);
-    entry.time = (entry.time & ~i64{1}) | static_cast<i64>(known);
+    time_[v] = (time_[v] & ~i64{1}) | static_cast<i64>(known);
     entry.degree = degree;
     entry.child = entry.sibling = entry.before = none_;
     Index& head = head_[degree - 1];
@@ -86,7 +86,7 @@ class DegreeLists {
 
   // Two roots become one: the older goes below the newer.
   Index meld(Index a, Index b) const {
-    if (at(a).time < at(b).time) {
+    if (time_[a] < time_[b]) {
       const Index newer = b;
       b = a;
       a = newer;
@@ -130,6 +130,7 @@ class DegreeLists {
 
   Node* graph_;
   Index* head_;  // of the list of each degree, from 1 on
+  i64* time_;
   Index none_;
   i64 clock_ = 0;
   Index least_ = 1;

@@ -120,8 +120,8 @@ Index* OrderingGraph<Index>::add_elements(const Vertex& pivot, Index* end) {
     }
     if (size != 0) absorb(e);
   }
-  const Index* const room_end = list + pivot.room;
-  for (const Index* cell = room_end - pivot.contained; cell != room_end; ++cell) {
+  const Index* const room_end = list + room_of(pivot);
+  for (const Index* cell = room_end - contained_of(pivot); cell != room_end; ++cell) {
     Element& e = element(*cell);
     if (e.size == 0) continue;
     for (Index b = 0; b < e.size; ++b) --vertex(arena_[e.begin + b]).elements;
@@ -132,11 +132,12 @@ Index* OrderingGraph<Index>::add_elements(const Vertex& pivot, Index* end) {
 
 // What is left of the pivot's own neighbours: hubs have their place among the others, which descend.
 template <class Index>
-Index* OrderingGraph<Index>::add_neighbours(Vertex& pivot, Index* end) {
-  const Index* neighbour = slots_ + pivot.start;
-  const Index* const list_end = elements_of(pivot);
-  std::uint64_t hubs = pivot.hubs;
-  for (Index left = pivot.vertices; left > 0;) {
+Index* OrderingGraph<Index>::add_neighbours(Index pivot, Index* end) {
+  const Vertex& mine = vertex(pivot);
+  const Index* neighbour = slots_ + edges_[pivot].start;
+  const Index* const list_end = &room_of(mine);
+  std::uint64_t hubs = hubs_of_ != nullptr ? hubs_of_[pivot] : 0;
+  for (Index left = mine.vertices; left > 0;) {
     Index v = neighbour != list_end ? *neighbour : 0;
     bool from_list = true;
     if (hubs != 0) {
@@ -160,11 +161,11 @@ Index* OrderingGraph<Index>::add_neighbours(Vertex& pivot, Index* end) {
 
 // The neighbours of a hub know of it, but not it of them.
 template <class Index>
-Index* OrderingGraph<Index>::add_hub_neighbours(const Vertex& pivot, Index* end) {
+Index* OrderingGraph<Index>::add_hub_neighbours(Index pivot, Index* end) {
   const std::uint64_t bit = hub_bit(pivot);
-  Index left = pivot.vertices;
+  Index left = vertex(pivot).vertices;
   for (Index v = n_; left > 0;) {
-    if (mark_[--v] >= stamp_ || (vertex(v).hubs & bit) == 0) continue;
+    if (mark_[--v] >= stamp_ || (hubs_of_[v] & bit) == 0) continue;
     mark_[v] = stamp_;
     --vertex(v).vertices;
     --left;
@@ -176,12 +177,12 @@ Index* OrderingGraph<Index>::add_hub_neighbours(const Vertex& pivot, Index* end)
 // The uneliminated neighbours of the pivot.
 template <class Index>
 Index* OrderingGraph<Index>::form_element(Index pivot, Index& size) {
-  Vertex& mine = vertex(pivot);
+  const Vertex& mine = vertex(pivot);
   reserve(2 * mine.degree);  // the purge sets the prototypes aside behind the boundary
   next_stamp();
   Index* const boundary = arena_ + top_ + 1;
   Index* end = add_elements(mine, boundary);
-  if (mine.vertices > 0) end = is_hub(mine) ? add_hub_neighbours(mine, end) : add_neighbours(mine, end);
+  if (mine.vertices > 0) end = is_hub(mine) ? add_hub_neighbours(pivot, end) : add_neighbours(pivot, end);
   marked_ = pivot;
   marked_stamp_ = stamp_;
   size = static_cast<Index>(end - boundary);
@@ -194,12 +195,12 @@ void OrderingGraph<Index>::find_passed(const Index* boundary, Index size) {
   its_hubs_ = passed_hubs_ = 0;
   passed_others_ = 0;
   walked_ = std::max(size / 2, kWalked);
+  if (count_.highest <= static_cast<i64>(kWalked)) return;
   for (Index b = 0; b < size; ++b) {
-    const Vertex& mine = vertex(boundary[b]);
-    if (mine.room <= kWalked) continue;
-    const std::uint64_t bit = hub_bit(mine);
+    const Index v = boundary[b];
+    const std::uint64_t bit = hub_bit(v);
     its_hubs_ |= bit;
-    if (is_walked(mine)) continue;
+    if (is_walked(vertex(v))) continue;
     passed_hubs_ |= bit;
     passed_others_ += bit == 0;
   }
@@ -217,11 +218,12 @@ void OrderingGraph<Index>::cover_edges(const Index* boundary, Index size) {
   std::uint64_t last = 0;  // hubs that the previous vertices had in common
   Index times = 0;
   for (Index b = 0; b < size; ++b) {
-    Vertex& mine = vertex(boundary[b]);
+    const Index v = boundary[b];
+    Vertex& mine = vertex(v);
     if (mine.vertices == 0) continue;
-    const std::uint64_t covered = mine.hubs & its_hubs_;
+    const std::uint64_t covered = its_hubs_ != 0 ? its_hubs_ & hubs_of_[v] : 0;
     if (covered != 0) {
-      mine.hubs ^= covered;
+      hubs_of_[v] ^= covered;
       mine.vertices -= count_bits(covered);
       if (!is_hub(mine)) {
         if (covered != last) {
@@ -232,9 +234,10 @@ void OrderingGraph<Index>::cover_edges(const Index* boundary, Index size) {
         ++times;
       }
     }
-    Index* own = slots_ + mine.own;
+    Edges& edges = edges_[v];
+    Index* own = slots_ + edges.own;
     Index kept = 0;
-    for (Index k = 0; k < mine.owned; ++k) {
+    for (Index k = 0; k < edges.owned; ++k) {
       const Index w = own[k];
       const Index mark = mark_[w];
       if (mark == stamp_) {
@@ -244,7 +247,7 @@ void OrderingGraph<Index>::cover_edges(const Index* boundary, Index size) {
         own[kept++] = w;
       }
     }
-    mine.owned = kept;
+    edges.owned = kept;
   }
   cover_hubs(last, times);
 }
@@ -273,11 +276,13 @@ void OrderingGraph<Index>::walk_elements(Vertex& v, Visit&& visit) {
 template <class Index>
 void OrderingGraph<Index>::set_contained_apart(Vertex& v) {
   Index* list = elements_of(v);
+  const Index room = room_of(v);
+  Index& contained = contained_of(v);
   Index kept = 0;
   for (Index k = 0; k < v.cells; ++k) {
     if (element(list[k]).live != 0) std::swap(list[kept++], list[k]);
   }
-  for (Index k = v.cells; k-- > kept;) list[v.room - ++v.contained] = list[k];
+  for (Index k = v.cells; k-- > kept;) list[room - ++contained] = list[k];
   v.cells = kept;
 }
 
@@ -286,25 +291,29 @@ template <class Index>
 Index OrderingGraph<Index>::single_element(Vertex& v) {
   const Index* list = elements_of(v);
   if (v.cells == 1) return list[0];
-  while (element(list[v.room - v.contained]).size == 0) --v.contained;
-  return list[v.room - v.contained];
+  const Index room = room_of(v);
+  Index& contained = contained_of(v);
+  while (element(list[room - contained]).size == 0) --contained;
+  return list[room - contained];
 }
 
 template <class Index>
 void OrderingGraph<Index>::make_room(Vertex& v) {
   walk_elements(v, [](Element&) {});
   Index* list = elements_of(v);
+  const Index room = room_of(v);
+  Index& contained = contained_of(v);
   Index kept = 0;
-  for (Index k = 1; k <= v.contained; ++k) {
-    const Index e = list[v.room - k];
-    if (element(e).size != 0) list[v.room - ++kept] = e;
+  for (Index k = 1; k <= contained; ++k) {
+    const Index e = list[room - k];
+    if (element(e).size != 0) list[room - ++kept] = e;
   }
-  v.contained = kept;
+  contained = kept;
 }
 
 template <class Index>
 void OrderingGraph<Index>::push_element(Vertex& v, Index e) {
-  if (v.cells + v.contained == v.room) make_room(v);
+  if (v.cells + contained_of(v) == room_of(v)) make_room(v);
   elements_of(v)[v.cells++] = e;
   ++v.elements;
 }
@@ -355,7 +364,8 @@ typename OrderingGraph<Index>::Element OrderingGraph<Index>::purge(Index pivot, 
   }
   std::copy_n(prototypes, count, boundary + kept);
   const Index left = kept + count;
-  return {left, left, static_cast<Index>(boundary - arena_), count, 0, 0, 0, its_hubs_};
+  prototypes_ = count;
+  return {left, left, static_cast<Index>(boundary - arena_), 0, 0, 0, its_hubs_};
 }
 
 template <class Index>
@@ -392,7 +402,7 @@ void OrderingGraph<Index>::update_degree(Index v, const Element& made) {
 // taken before it.
 template <class Index>
 void OrderingGraph<Index>::update_degrees(const Index* boundary, const Element& made, Index eliminated) {
-  const Index ordinary = made.size - made.prototypes;
+  const Index ordinary = made.size - prototypes_;
   for (Index b = 0; b < made.size; ++b) {
     const Index v = boundary[b];
     Vertex& mine = vertex(v);

@@ -21,7 +21,7 @@ Index OrderingGraph<Index>::other_element(const Vertex& v, Index all) const {
   for (Index k = 0; k < v.cells; ++k) {
     if (list[k] != all && element(list[k]).size != 0) return list[k];
   }
-  const Index* cell = list + v.room - v.contained;
+  const Index* cell = list + room_of(v) - contained_of(v);
   while (element(*cell).size == 0) ++cell;
   return *cell;
 }
@@ -45,7 +45,7 @@ void OrderingGraph<Index>::absorb_elements(Index pivot, Index all, Stack& gone, 
   const Vertex& mine = vertex(pivot);
   const Index* list = elements_of(mine);
   for (Index k = 0; k < mine.cells; ++k) take(list[k]);
-  for (Index k = 1; k <= mine.contained; ++k) take(list[mine.room - k]);
+  for (Index k = 1; k <= contained_of(mine); ++k) take(list[room_of(mine) - k]);
 }
 
 // Adds the new single vertices, takes off those that have gone, and moves the prototypes to the end.
@@ -61,7 +61,7 @@ void OrderingGraph<Index>::sort_singles(Stack& singles, const Stack& fresh, i64&
   for (Index s = 0; s < singles.count; ++s) {
     const Index v = singles.items[s];
     if (mark_[v] == kGone) continue;
-    for (; k < fresh.count && vertex(fresh.items[k]).time < vertex(v).time; ++k) append(fresh.items[k]);
+    for (; k < fresh.count && time_[fresh.items[k]] < time_[v]; ++k) append(fresh.items[k]);
     append(v);
   }
   for (; k < fresh.count; ++k) append(fresh.items[k]);
@@ -83,7 +83,7 @@ void OrderingGraph<Index>::sort_singles(Stack& singles, const Stack& fresh, i64&
   }
   *end = n_;
   for (Index v = first; v != n_; v = vertex(v).sibling) {
-    vertex(v).time = place++;
+    time_[v] = place++;
     singles.push(v);
   }
 }
@@ -93,13 +93,13 @@ void OrderingGraph<Index>::finish(Index all) {
   Index left = element(all).size;
   reserve(2 * left);
   const Index* boundary = arena_ + element(all).begin;
-  const auto earlier = [this](Index a, Index b) { return vertex(a).time < vertex(b).time; };
+  const auto earlier = [this](Index a, Index b) { return time_[a] < time_[b]; };
   const auto keep_single = [&](Index v) { vertex(v).child = other_element(vertex(v), all); };
   Stack singles{head_, 0};
   i64 place = 0;
   for (Index b = 0; b < left; ++b) {
     const Index v = boundary[b];
-    vertex(v).time = place++;
+    time_[v] = place++;
     if (vertex(v).elements != 2) continue;
     keep_single(v);
     singles.push(v);

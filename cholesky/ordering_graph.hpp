@@ -49,40 +49,39 @@
 
 namespace sm {
 
-// Vertices and elements fill a line of the cache each, when the index is narrow: a visit brings in one.
 template <class Index>
 struct GraphVertex {
-  Index vertices;  // neighbours that no element covers
-  Index elements;  // elements that it lies in, but for absorbed ones
-  Index cells;     // of its list of elements
-  Index contained;  // elements at the end of the room for its elements that are contained in newer ones
+  Index vertices;                // neighbours that no element covers
+  Index elements;                // elements that it lies in, but for absorbed ones
+  Index cells;                   // of its list of elements
+  Index list;                    // where that list starts
   Index child, sibling, before;  // degree lists
-  Index degree;  // 1 + neighbours, or less while only a bound is known
-  Index start;   // of its neighbours but for hubs, up to `list`; of a hub its number
-  Index own;     // where the edges that it owns start
-  Index owned;   // how many of them are left
-  Index list;    // where the list of its elements starts
-  Index room;    // for that list
-  i64 time;      // when its degree was due
-  std::uint64_t hubs;  // bits of the neighbours that are hubs
+  Index degree;                  // 1 + neighbours, or less while only a bound is known
 };
 
 template <class Index>
 struct GraphElement {
-  Index size;        // vertices on the boundary; 0: absorbed
-  Index live;        // the same; 0 also when it is contained in a newer one
-  Index begin;       // of the boundary, in the arena
-  Index prototypes;  // how many of them end the boundary
-  Index outside;     // boundary vertices that are not on that of the element `met` (more if hubs were passed over)
-  Index met;         // stamp of the elimination that counts `outside`
-  Index claimed;     // stamp of the elimination in which a prototype claimed it
+  Index size;          // vertices on the boundary; 0: absorbed
+  Index live;          // the same; 0 also when it is contained in a newer one
+  Index begin;         // of the boundary, in the arena
+  Index outside;       // boundary vertices that are not on that of the element `met` (more if hubs were passed over)
+  Index met;           // stamp of the elimination that counts `outside`
+  Index claimed;       // stamp of the elimination in which a prototype claimed it
   std::uint64_t hubs;  // bits of the hubs on the boundary
 };
 
 template <class Index>
-union alignas(64) GraphNode {
+union GraphNode {
   GraphVertex<Index> vertex;
   GraphElement<Index> element;
+};
+
+// What is seldom asked of a vertex.
+template <class Index>
+struct GraphEdges {
+  Index start;  // of its neighbours but for hubs, up to the room of its elements; of a hub its number
+  Index own;    // where the edges that it owns start
+  Index owned;  // how many of them are left
 };
 
 template <class Index>
@@ -101,6 +100,7 @@ class OrderingGraph {
   using Node = GraphNode<Index>;
   using Vertex = GraphVertex<Index>;
   using Element = GraphElement<Index>;
+  using Edges = GraphEdges<Index>;
   static constexpr Index kGone = static_cast<Index>(-1);
   // Longer lists of elements are not walked at each elimination beside them, unless the boundary is twice as long.
   static constexpr Index kWalked = 32;
@@ -109,10 +109,12 @@ class OrderingGraph {
   Vertex& vertex(Index v) const { return graph_[v].vertex; }
   Element& element(Index e) const { return graph_[e].element; }
   Index* elements_of(const Vertex& v) const { return slots_ + v.list; }
+  Index& room_of(const Vertex& v) const { return slots_[v.list - 2]; }
+  Index& contained_of(const Vertex& v) const { return slots_[v.list - 1]; }
   bool is_walked(const Vertex& v) const { return v.cells <= walked_ || v.elements <= walked_; }
   static Index room_for(Index degree) { return degree + degree / 2 + 1; }
-  bool is_hub(const Vertex& v) const { return v.room > hub_room_; }
-  std::uint64_t hub_bit(const Vertex& v) const { return is_hub(v) ? std::uint64_t{1} << v.start : 0; }
+  bool is_hub(const Vertex& v) const { return v.list >= hub_lists_; }
+  std::uint64_t hub_bit(Index v) const { return is_hub(vertex(v)) ? std::uint64_t{1} << edges_[v].start : 0; }
 
   void find_hubs();
   Index lay_out();
@@ -132,8 +134,8 @@ class OrderingGraph {
   }
   Index* form_element(Index pivot, Index& size);
   Index* add_elements(const Vertex& pivot, Index* end);
-  Index* add_neighbours(Vertex& pivot, Index* end);
-  Index* add_hub_neighbours(const Vertex& pivot, Index* end);
+  Index* add_neighbours(Index pivot, Index* end);
+  Index* add_hub_neighbours(Index pivot, Index* end);
   void absorb(Element& e) {
     arena_[e.begin - 1] = n_ + e.size;
     e.size = e.live = 0;
@@ -165,6 +167,9 @@ class OrderingGraph {
   Index n_;
   EdgeCount count_;
   Node* graph_;   // one more than vertices, for the degree lists
+  i64* time_;     // when the degree of a vertex was due
+  std::uint64_t* hubs_of_;  // bits of the neighbours that are hubs; null without any
+  Edges* edges_;
   Index* slots_;  // of every vertex its neighbours, the latest first, and the room for its elements; then owned edges
   Index* arena_;  // boundaries, each behind the number of its element, or n + its length when that is absorbed
   Index arena_size_;
@@ -178,13 +183,14 @@ class OrderingGraph {
   Index stamp_ = kGone - 1000;  // so that no ordering of some size goes without the restart
   Index marked_ = kGone;        // the element whose whole boundary bears the mark marked_stamp_
   Index marked_stamp_ = 0;
-  Index hub_room_ = kGone;  // the most that is no hub's
+  Index hub_lists_ = kGone;  // where those of hubs start
   Index hub_count_ = 0;
   Index hubs_[kHubs];  // ascending
   // While an element is formed:
   Index walked_ = 0;  // the longest list that is walked
   std::uint64_t its_hubs_ = 0;
   std::uint64_t passed_hubs_ = 0;  // of them, those whose elements are not walked
+  Index prototypes_ = 0;
   Index passed_others_ = 0;        // vertices of the boundary whose elements are not walked, but for these
 };
 
