@@ -29,15 +29,12 @@ EdgeCount count_tidy_edges(const SmMatrix& m, i64* degree) {
     }
     degree[i] += entries;
     count.edges += entries;
-    count.longest = std::max(count.longest, entries);
-    count.highest = std::max(count.highest, degree[i]);
   }
   return count;
 }
 
-// As many as the entries, or fewer.
-EdgeCount count_distinct_edges(const SmMatrix& m, EdgeCount count, i64* degree, i64* met) {
-  count.edges = 0;
+i64 count_distinct_edges(const SmMatrix& m, i64* degree, i64* met) {
+  i64 edges = 0;
   std::fill_n(degree, m.rows, 0);
   std::fill_n(met, m.rows, -1);
   for (i64 i = 0; i < m.rows; ++i) {
@@ -47,17 +44,23 @@ EdgeCount count_distinct_edges(const SmMatrix& m, EdgeCount count, i64* degree, 
       met[j] = i;
       ++degree[i];
       ++degree[j];
-      ++count.edges;
+      ++edges;
     }
   }
-  return count;
+  return edges;
 }
 
 }  // namespace
 
 EdgeCount count_edges(const SmMatrix& m, i64* degree, i64* met) {
-  const EdgeCount count = count_tidy_edges(m, degree);
-  return count.tidy ? count : count_distinct_edges(m, count, degree, met);
+  EdgeCount count = count_tidy_edges(m, degree);
+  if (!count.tidy) count.edges = count_distinct_edges(m, degree, met);
+  for (i64 i = 0; i < m.rows; ++i) {
+    if (degree[i] <= kShort) continue;
+    ++count.long_rows;
+    count.long_entries += degree[i];
+  }
+  return count;
 }
 
 namespace {

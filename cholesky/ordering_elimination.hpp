@@ -120,9 +120,9 @@ Index* OrderingGraph<Index>::add_elements(const Vertex& pivot, Index* end) {
     }
     if (size != 0) absorb(e);
   }
-  const Index* const room_end = list + room_of(pivot);
-  for (const Index* cell = room_end - contained_of(pivot); cell != room_end; ++cell) {
-    Element& e = element(*cell);
+  const Lists& lists = lists_of(pivot);
+  for (Index k = lists.tail; k > lists.listed; --k) {
+    Element& e = element(list[lists.room - k]);
     if (e.size == 0) continue;
     for (Index b = 0; b < e.size; ++b) --vertex(arena_[e.begin + b]).elements;
     absorb(e);
@@ -134,8 +134,9 @@ Index* OrderingGraph<Index>::add_elements(const Vertex& pivot, Index* end) {
 template <class Index>
 Index* OrderingGraph<Index>::add_neighbours(Index pivot, Index* end) {
   const Vertex& mine = vertex(pivot);
-  const Index* neighbour = slots_ + edges_[pivot].start;
-  const Index* const list_end = &room_of(mine);
+  const Lists& lists = lists_of(mine);
+  const Index* const list_end = is_long(mine) ? slots_ + mine.list - kLongHead : elements_of(mine) + lists.room;
+  const Index* neighbour = is_long(mine) ? slots_ + lists.start : list_end - lists.listed;
   std::uint64_t hubs = hubs_of_ != nullptr ? hubs_of_[pivot] : 0;
   for (Index left = mine.vertices; left > 0;) {
     Index v = neighbour != list_end ? *neighbour : 0;
@@ -195,7 +196,7 @@ void OrderingGraph<Index>::find_passed(const Index* boundary, Index size) {
   its_hubs_ = passed_hubs_ = 0;
   passed_others_ = 0;
   walked_ = std::max(size / 2, kWalked);
-  if (count_.highest <= static_cast<i64>(kWalked)) return;
+  if (count_.long_rows == 0) return;
   for (Index b = 0; b < size; ++b) {
     const Index v = boundary[b];
     const std::uint64_t bit = hub_bit(v);
@@ -210,6 +211,47 @@ void OrderingGraph<Index>::find_passed(const Index* boundary, Index size) {
 template <class Index>
 void OrderingGraph<Index>::cover_hubs(std::uint64_t bits, Index times) {
   for (; bits != 0; bits &= bits - 1) vertex(hubs_[std::countr_zero(bits)]).vertices -= times;
+}
+
+// Of two long vertices.
+template <class Index>
+void OrderingGraph<Index>::cover_own(Vertex& v) {
+  Lists& lists = lists_of(v);
+  Index* own = slots_ + lists.own;
+  Index kept = 0;
+  for (Index k = 0; k < lists.owned; ++k) {
+    const Index w = own[k];
+    if (mark_[w] == stamp_) {
+      --v.vertices;
+      --vertex(w).vertices;
+    } else if (mark_[w] != kGone) {
+      own[kept++] = w;
+    }
+  }
+  lists.owned = kept;
+}
+
+// Of a short vertex. Those to other short ones are covered from both ends.
+template <class Index>
+void OrderingGraph<Index>::cover_list(Vertex& v) {
+  Lists& lists = lists_of(v);
+  Index* const end = elements_of(v) + lists.room;
+  const Index listed = lists.listed;
+  Index kept = 0;
+  Index covered = 0;
+  for (Index k = 1; k <= listed; ++k) {
+    const Index w = *(end - k);
+    const Index mark = mark_[w];
+    *(end - kept - 1) = w;
+    kept += mark != stamp_ && mark != kGone;
+    covered += mark == stamp_;
+    if (count_.long_rows > 0 && mark == stamp_ && is_long(vertex(w))) --vertex(w).vertices;
+  }
+  v.vertices -= covered;
+  lists.listed = kept;
+  const Index contained = lists.tail - listed;
+  for (Index k = 1; k <= contained; ++k) *(end - kept - k) = *(end - listed - k);
+  lists.tail = kept + contained;
 }
 
 // The new element covers the edges inside its boundary.
@@ -234,20 +276,7 @@ void OrderingGraph<Index>::cover_edges(const Index* boundary, Index size) {
         ++times;
       }
     }
-    Edges& edges = edges_[v];
-    Index* own = slots_ + edges.own;
-    Index kept = 0;
-    for (Index k = 0; k < edges.owned; ++k) {
-      const Index w = own[k];
-      const Index mark = mark_[w];
-      if (mark == stamp_) {
-        --mine.vertices;
-        --vertex(w).vertices;
-      } else if (mark != kGone) {
-        own[kept++] = w;
-      }
-    }
-    edges.owned = kept;
+    is_long(mine) ? cover_own(mine) : cover_list(mine);
   }
   cover_hubs(last, times);
 }
@@ -276,13 +305,12 @@ void OrderingGraph<Index>::walk_elements(Vertex& v, Visit&& visit) {
 template <class Index>
 void OrderingGraph<Index>::set_contained_apart(Vertex& v) {
   Index* list = elements_of(v);
-  const Index room = room_of(v);
-  Index& contained = contained_of(v);
+  Lists& lists = lists_of(v);
   Index kept = 0;
   for (Index k = 0; k < v.cells; ++k) {
     if (element(list[k]).live != 0) std::swap(list[kept++], list[k]);
   }
-  for (Index k = v.cells; k-- > kept;) list[room - ++contained] = list[k];
+  for (Index k = v.cells; k-- > kept;) list[lists.room - ++lists.tail] = list[k];
   v.cells = kept;
 }
 
@@ -291,29 +319,30 @@ template <class Index>
 Index OrderingGraph<Index>::single_element(Vertex& v) {
   const Index* list = elements_of(v);
   if (v.cells == 1) return list[0];
-  const Index room = room_of(v);
-  Index& contained = contained_of(v);
-  while (element(list[room - contained]).size == 0) --contained;
-  return list[room - contained];
+  Lists& lists = lists_of(v);
+  while (element(list[lists.room - lists.tail]).size == 0) --lists.tail;
+  return list[lists.room - lists.tail];
 }
 
 template <class Index>
 void OrderingGraph<Index>::make_room(Vertex& v) {
   walk_elements(v, [](Element&) {});
   Index* list = elements_of(v);
-  const Index room = room_of(v);
-  Index& contained = contained_of(v);
-  Index kept = 0;
-  for (Index k = 1; k <= contained; ++k) {
-    const Index e = list[room - k];
-    if (element(e).size != 0) list[room - ++kept] = e;
+  Lists& lists = lists_of(v);
+  const Index contained = lists.listed + 1;
+  if (v.vertices == 0) lists.listed = 0;
+  Index kept = lists.listed;
+  for (Index k = contained; k <= lists.tail; ++k) {
+    const Index e = list[lists.room - k];
+    if (element(e).size != 0) list[lists.room - ++kept] = e;
   }
-  contained = kept;
+  lists.tail = kept;
 }
 
 template <class Index>
 void OrderingGraph<Index>::push_element(Vertex& v, Index e) {
-  if (v.cells + contained_of(v) == room_of(v)) make_room(v);
+  const Lists& lists = lists_of(v);
+  if (v.cells + lists.tail == lists.room) make_room(v);
   elements_of(v)[v.cells++] = e;
   ++v.elements;
 }

@@ -5,20 +5,23 @@
 
 namespace sm {
 
-// Rows of more edges would leave a vertex too many of its own: then each edge belongs to its end of lower degree.
-inline constexpr i64 kLongRow = 32;
-
 template <class Index>
 std::uint64_t OrderingGraph<Index>::bytes(i64 vertices, const EdgeCount& count, i64 slack) {
   const auto n = static_cast<std::uint64_t>(vertices);
   const auto e = static_cast<std::uint64_t>(count.edges);
   const std::uint64_t heads = sizeof(Index) == 4 ? 0 : n;
-  const std::uint64_t own = count.longest > kLongRow ? e : 0;
-  const std::uint64_t lists = 2 * e + 3 * e + 3 * n;
   const std::uint64_t arena = 2 * e + 2 * n + static_cast<std::uint64_t>(slack) * e;
-  const std::uint64_t words = count.highest > kLongRow ? 2 * n : n;
-  return sizeof(Node) * (n + 1) + sizeof(i64) * words + sizeof(Edges) * n +
-         sizeof(Index) * (heads + own + lists + arena);
+  const std::uint64_t words = count.long_rows > 0 ? 2 * n : n;
+  return sizeof(Node) * (n + 1) + sizeof(i64) * words +
+         sizeof(Index) * (heads + static_cast<std::uint64_t>(slots(vertices, count)) + arena);
+}
+
+// A long vertex has 3/2 cells for each neighbour, so that making room by dropping the absorbed elements is paid for by
+// what came before; each edge between two of them has an owner.
+template <class Index>
+i64 OrderingGraph<Index>::slots(i64 vertices, const EdgeCount& count) {
+  const i64 for_long = 4 * count.long_rows + count.long_entries + count.long_entries / 2;
+  return 2 * count.edges + 3 * vertices + for_long + count.long_entries / 2;
 }
 
 template <class Index>
@@ -29,15 +32,13 @@ OrderingGraph<Index>::OrderingGraph(i64 vertices, const EdgeCount& count, void* 
       graph_(static_cast<Node*>(memory)),
       time_(reinterpret_cast<i64*>(graph_ + n_ + 1)),
       hubs_of_(reinterpret_cast<std::uint64_t*>(time_ + n_)),
-      edges_(reinterpret_cast<Edges*>(hubs_of_ + (count.highest > kLongRow ? n_ : 0))),
-      slots_(reinterpret_cast<Index*>(edges_ + n_)),
+      slots_(reinterpret_cast<Index*>(hubs_of_ + (count.long_rows > 0 ? n_ : 0))),
       perm_(perm),
       mark_(reinterpret_cast<Index*>(inv_perm)),
       head_(sizeof(Index) == 4 ? mark_ + n_ : slots_),
       lists_(graph_, head_, time_, n_) {
   if (sizeof(Index) != 4) slots_ += n_;
-  const i64 own = count.longest > kLongRow ? count.edges : 0;
-  arena_ = slots_ + 5 * count.edges + 3 * vertices + own;
+  arena_ = slots_ + slots(vertices, count);
   const auto end = reinterpret_cast<std::uintptr_t>(memory) + bytes;
   arena_size_ = static_cast<Index>((end - reinterpret_cast<std::uintptr_t>(arena_)) / sizeof(Index));
 }
@@ -45,9 +46,9 @@ OrderingGraph<Index>::OrderingGraph(i64 vertices, const EdgeCount& count, void* 
 // At most 64 vertices of the highest degrees. Their edges need rows in order.
 template <class Index>
 void OrderingGraph<Index>::find_hubs() {
-  if (!count_.tidy || count_.highest <= static_cast<i64>(kWalked)) return;
+  if (!count_.tidy || count_.long_rows == 0) return;
   hub_count_ = kHubs + 1;
-  for (i64 degree = kWalked; hub_count_ > kHubs; degree *= 2) {
+  for (i64 degree = kShort; hub_count_ > kHubs; degree *= 2) {
     hub_count_ = 0;
     for (Index v = 0; v < n_ && hub_count_ <= kHubs; ++v) {
       if (perm_[v] <= degree) continue;
@@ -57,43 +58,65 @@ void OrderingGraph<Index>::find_hubs() {
   }
 }
 
-// Gives every vertex its room, hubs behind the others. Until its row is entered, mark is where its next neighbour goes,
-// kGone for a hub.
+// Gives every vertex its slots: first the short ones, then the long ones, then hubs. Until its row is entered, mark is
+// where its next neighbour goes, kGone for a hub.
 template <class Index>
 Index OrderingGraph<Index>::lay_out() {
   Index end = 0;
-  Index hub = 0;
-  const auto set_vertex = [&](Index v) {
-    const Index degree = static_cast<Index>(perm_[v]);
-    slots_[end] = degree + degree / 2 + 1;
-    slots_[end + 1] = 0;
-    vertex(v) = {degree, 0, 0, end + 2, n_, n_, lists_.kOutside, degree + 1};
-    end += 2 + slots_[end];
+  const auto set = [&](Index v, Index head, Index room) {
+    end += head;
+    vertex(v) = {static_cast<Index>(perm_[v]), 0, 0, end, n_, n_, lists_.kOutside, 0};
+    Lists& lists = lists_of(vertex(v));
+    lists.room = room;
+    lists.tail = lists.listed = 0;
+    end += room;
   };
   for (Index v = 0; v < n_; ++v) {
+    if (perm_[v] > kShort) continue;
+    set(v, kShortHead, static_cast<Index>(perm_[v]));
+    mark_[v] = end;
+  }
+  long_lists_ = end;
+  const auto set_long = [&](Index v) {
+    const Index degree = static_cast<Index>(perm_[v]);
+    set(v, kLongHead, degree + degree / 2 + 1);
+    lists_of(vertex(v)).owned = 0;
+  };
+  for (Index v = 0, hub = 0; count_.long_rows > 0 && v < n_; ++v) {
+    if (perm_[v] <= kShort) continue;
+    mark_[v] = kGone;
     if (hub < hub_count_ && hubs_[hub] == v) {
-      mark_[v] = kGone;
       ++hub;
       continue;
     }
     end += static_cast<Index>(perm_[v]);
     mark_[v] = end;
-    set_vertex(v);
+    set_long(v);
   }
   if (hub_count_ > 0) hub_lists_ = end;
-  for (hub = 0; hub < hub_count_; ++hub) {
-    set_vertex(hubs_[hub]);
-    edges_[hubs_[hub]] = {hub, end, 0};
+  for (Index hub = 0; hub < hub_count_; ++hub) {
+    set_long(hubs_[hub]);
+    lists_of(vertex(hubs_[hub])).start = hub;
   }
   return end;
 }
 
-// The neighbours before i are there already. Those behind it head its list: as long as no row is long, their edges are
-// its own.
+// Its neighbours are all there.
+template <class Index>
+void OrderingGraph<Index>::close_list(Index v) {
+  const Vertex& mine = vertex(v);
+  Lists& lists = lists_of(mine);
+  if (is_long(mine)) {
+    lists.start = mark_[v];
+  } else {
+    lists.tail = lists.listed = mine.list + lists.room - mark_[v];
+  }
+}
+
+// The neighbours before i are there already.
 template <class Index>
 void OrderingGraph<Index>::enter_row(const SmMatrix& m, Index i) {
   Index place = mark_[i];
-  const Index before = place;
   std::uint64_t hubs = 0;
   for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
     if (m.col_index[p] <= static_cast<i64>(i)) continue;
@@ -105,7 +128,8 @@ void OrderingGraph<Index>::enter_row(const SmMatrix& m, Index i) {
     slots_[--place] = j;
     slots_[--mark_[j]] = i;
   }
-  edges_[i] = {place, place, before - place};
+  mark_[i] = place;
+  close_list(i);
   if (hubs != 0) hubs_of_[i] |= hubs;
 }
 
@@ -124,7 +148,6 @@ void OrderingGraph<Index>::enter_hub(const SmMatrix& m, Index i) {
 template <class Index>
 void OrderingGraph<Index>::enter_untidy(const SmMatrix& m) {
   for (Index i = 0; i < n_; ++i) {
-    const Index before = mark_[i];
     for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
       if (m.col_index[p] <= static_cast<i64>(i)) continue;
       const Index j = static_cast<Index>(m.col_index[p]);
@@ -133,23 +156,25 @@ void OrderingGraph<Index>::enter_untidy(const SmMatrix& m) {
       slots_[--mark_[i]] = j;
       slots_[--mark_[j]] = i;
     }
-    edges_[i] = {mark_[i], mark_[i], before - mark_[i]};
+    close_list(i);
   }
 }
 
-// Where rows are long, an edge belongs to its end of lower degree: a vertex owns few, however many it has.
+// An edge between long vertices belongs to its end of lower degree: a vertex owns few, however many it has.
 template <class Index>
 void OrderingGraph<Index>::own_edges(Index end) {
   for (Index v = 0; v < n_; ++v) {
     const Vertex& mine = vertex(v);
-    if (is_hub(mine)) continue;
-    edges_[v].own = end;
-    for (Index k = edges_[v].start; k + 2 < mine.list; ++k) {
+    if (!is_long(mine) || is_hub(mine)) continue;
+    Lists& lists = lists_of(mine);
+    lists.own = end;
+    for (Index k = lists.start; k + kLongHead < mine.list; ++k) {
       const Index w = slots_[k];
-      const Index other = vertex(w).vertices;
-      if (other > mine.vertices || (other == mine.vertices && w > v)) slots_[end++] = w;
+      const Vertex& other = vertex(w);
+      if (!is_long(other)) continue;
+      if (other.vertices > mine.vertices || (other.vertices == mine.vertices && w > v)) slots_[end++] = w;
     }
-    edges_[v].owned = end - edges_[v].own;
+    lists.owned = end - lists.own;
   }
 }
 
@@ -162,13 +187,9 @@ void OrderingGraph<Index>::enter(const SmMatrix& m) {
     std::fill_n(hubs_of_, n_, 0);
   }
   const Index end = lay_out();
-  Index longest = 0;
   if (!count_.tidy) enter_untidy(m);
-  for (Index i = 0; i < n_; ++i) {
-    if (count_.tidy) is_hub(vertex(i)) ? enter_hub(m, i) : enter_row(m, i);
-    longest = std::max(longest, edges_[i].owned);
-  }
-  if (longest > kLongRow) own_edges(end);
+  for (Index i = 0; count_.tidy && i < n_; ++i) is_hub(vertex(i)) ? enter_hub(m, i) : enter_row(m, i);
+  if (count_.long_rows > static_cast<i64>(hub_count_)) own_edges(end);
   lists_.clear();
   for (Index v = 0; v < n_; ++v) {
     mark_[v] = 0;

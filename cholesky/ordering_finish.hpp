@@ -21,7 +21,7 @@ Index OrderingGraph<Index>::other_element(const Vertex& v, Index all) const {
   for (Index k = 0; k < v.cells; ++k) {
     if (list[k] != all && element(list[k]).size != 0) return list[k];
   }
-  const Index* cell = list + room_of(v) - contained_of(v);
+  const Index* cell = list + lists_of(v).room - lists_of(v).tail;
   while (element(*cell).size == 0) ++cell;
   return *cell;
 }
@@ -45,7 +45,8 @@ void OrderingGraph<Index>::absorb_elements(Index pivot, Index all, Stack& gone, 
   const Vertex& mine = vertex(pivot);
   const Index* list = elements_of(mine);
   for (Index k = 0; k < mine.cells; ++k) take(list[k]);
-  for (Index k = 1; k <= contained_of(mine); ++k) take(list[room_of(mine) - k]);
+  const Lists& lists = lists_of(mine);
+  for (Index k = lists.listed + 1; k <= lists.tail; ++k) take(list[lists.room - k]);
 }
 
 // Adds the new single vertices, takes off those that have gone, and moves the prototypes to the end.

@@ -76,12 +76,15 @@ union GraphNode {
   GraphElement<Index> element;
 };
 
-// What is seldom asked of a vertex.
+// What comes in the slots before the cells of a vertex; a short one has but the last three.
 template <class Index>
-struct GraphEdges {
-  Index start;  // of its neighbours but for hubs, up to the room of its elements; of a hub its number
-  Index own;    // where the edges that it owns start
-  Index owned;  // how many of them are left
+struct GraphLists {
+  Index start;   // of the neighbours of a long vertex; of a hub its number
+  Index own;     // where the edges that a long vertex owns start
+  Index owned;   // how many of them are left
+  Index room;    // cells
+  Index tail;    // cells at the end that are taken: before the neighbours the elements that are contained in newer ones
+  Index listed;  // neighbours at the end, in their order: of a short vertex those that no element covers, but for hubs
 };
 
 template <class Index>
@@ -100,7 +103,9 @@ class OrderingGraph {
   using Node = GraphNode<Index>;
   using Vertex = GraphVertex<Index>;
   using Element = GraphElement<Index>;
-  using Edges = GraphEdges<Index>;
+  using Lists = GraphLists<Index>;
+  static constexpr Index kShortHead = 3;
+  static constexpr Index kLongHead = 6;
   static constexpr Index kGone = static_cast<Index>(-1);
   // Longer lists of elements are not walked at each elimination beside them, unless the boundary is twice as long.
   static constexpr Index kWalked = 32;
@@ -109,15 +114,16 @@ class OrderingGraph {
   Vertex& vertex(Index v) const { return graph_[v].vertex; }
   Element& element(Index e) const { return graph_[e].element; }
   Index* elements_of(const Vertex& v) const { return slots_ + v.list; }
-  Index& room_of(const Vertex& v) const { return slots_[v.list - 2]; }
-  Index& contained_of(const Vertex& v) const { return slots_[v.list - 1]; }
+  Lists& lists_of(const Vertex& v) const { return reinterpret_cast<Lists*>(slots_ + v.list)[-1]; }
   bool is_walked(const Vertex& v) const { return v.cells <= walked_ || v.elements <= walked_; }
-  static Index room_for(Index degree) { return degree + degree / 2 + 1; }
+  bool is_long(const Vertex& v) const { return v.list >= long_lists_; }
   bool is_hub(const Vertex& v) const { return v.list >= hub_lists_; }
-  std::uint64_t hub_bit(Index v) const { return is_hub(vertex(v)) ? std::uint64_t{1} << edges_[v].start : 0; }
+  std::uint64_t hub_bit(Index v) const { return is_hub(vertex(v)) ? std::uint64_t{1} << lists_of(vertex(v)).start : 0; }
 
   void find_hubs();
+  static i64 slots(i64 vertices, const EdgeCount& count);
   Index lay_out();
+  void close_list(Index v);
   void enter_row(const SmMatrix& m, Index i);
   void enter_hub(const SmMatrix& m, Index i);
   void enter_untidy(const SmMatrix& m);
@@ -143,6 +149,8 @@ class OrderingGraph {
   void reserve(Index more);
   void find_passed(const Index* boundary, Index size);
   void cover_edges(const Index* boundary, Index size);
+  void cover_own(Vertex& v);
+  void cover_list(Vertex& v);
   void cover_hubs(std::uint64_t bits, Index times);
   Element purge(Index pivot, Index* boundary, Index size);
   template <class Visit>
@@ -169,8 +177,7 @@ class OrderingGraph {
   Node* graph_;   // one more than vertices, for the degree lists
   i64* time_;     // when the degree of a vertex was due
   std::uint64_t* hubs_of_;  // bits of the neighbours that are hubs; null without any
-  Edges* edges_;
-  Index* slots_;  // of every vertex its neighbours, the latest first, and the room for its elements; then owned edges
+  Index* slots_;  // of every vertex its neighbours, the latest first, and its elements; then owned edges
   Index* arena_;  // boundaries, each behind the number of its element, or n + its length when that is absorbed
   Index arena_size_;
   Index top_ = 0;
@@ -183,7 +190,8 @@ class OrderingGraph {
   Index stamp_ = kGone - 1000;  // so that no ordering of some size goes without the restart
   Index marked_ = kGone;        // the element whose whole boundary bears the mark marked_stamp_
   Index marked_stamp_ = 0;
-  Index hub_lists_ = kGone;  // where those of hubs start
+  Index long_lists_ = 0;     // where the slots of long vertices start
+  Index hub_lists_ = kGone;  // and of hubs
   Index hub_count_ = 0;
   Index hubs_[kHubs];  // ascending
   // While an element is formed:
