@@ -113,10 +113,9 @@ Index* OrderingGraph<Index>::add_elements(const Vertex& pivot, Index* end) {
       Vertex& other = vertex(v);
       --other.elements;
       __builtin_prefetch(elements_of(other));
-      const Index seen = mark_[v];
-      *end = v;
-      end += seen < stamp;
-      mark_[v] = std::max(seen, stamp);
+      if (mark_[v] >= stamp) continue;
+      *end++ = v;
+      mark_[v] = stamp;
     }
     if (size != 0) absorb(e);
   }
@@ -237,15 +236,19 @@ void OrderingGraph<Index>::cover_list(Vertex& v) {
   Lists& lists = lists_of(v);
   Index* const end = elements_of(v) + lists.room;
   const Index listed = lists.listed;
+  const Index stamp = stamp_;
+  const bool beside_long = count_.long_rows > 0;
   Index kept = 0;
   Index covered = 0;
   for (Index k = 1; k <= listed; ++k) {
     const Index w = *(end - k);
     const Index mark = mark_[w];
-    *(end - kept - 1) = w;
-    kept += mark != stamp_ && mark != kGone;
-    covered += mark == stamp_;
-    if (count_.long_rows > 0 && mark == stamp_ && is_long(vertex(w))) --vertex(w).vertices;
+    if (mark == stamp) {
+      ++covered;
+      if (beside_long && is_long(vertex(w))) --vertex(w).vertices;
+    } else if (mark != kGone) {
+      *(end - ++kept) = w;
+    }
   }
   v.vertices -= covered;
   lists.listed = kept;
@@ -284,7 +287,7 @@ void OrderingGraph<Index>::cover_edges(const Index* boundary, Index size) {
 // Visits the elements on the list of a vertex, takes off the absorbed ones and sets apart the contained ones.
 template <class Index>
 template <class Visit>
-void OrderingGraph<Index>::walk_elements(Vertex& v, Visit&& visit) {
+[[gnu::always_inline]] inline void OrderingGraph<Index>::walk_elements(Vertex& v, Visit&& visit) {
   const Index cells = v.cells;
   Index* list = elements_of(v);
   Index kept = 0;
@@ -292,9 +295,9 @@ void OrderingGraph<Index>::walk_elements(Vertex& v, Visit&& visit) {
   for (Index k = 0; k < cells; ++k) {
     const Index name = list[k];
     Element& e = element(name);
-    list[kept] = name;
-    kept += e.size != 0;
-    any_contained |= e.size != e.live;
+    if (e.size == 0) continue;
+    list[kept++] = name;
+    any_contained |= e.live == 0;
     visit(e);
   }
   v.cells = kept;
@@ -303,7 +306,7 @@ void OrderingGraph<Index>::walk_elements(Vertex& v, Visit&& visit) {
 
 // Contained elements go to the end of the room, from the right so that none is lost.
 template <class Index>
-void OrderingGraph<Index>::set_contained_apart(Vertex& v) {
+[[gnu::noinline]] void OrderingGraph<Index>::set_contained_apart(Vertex& v) {
   Index* list = elements_of(v);
   Lists& lists = lists_of(v);
   Index kept = 0;
@@ -325,7 +328,7 @@ Index OrderingGraph<Index>::single_element(Vertex& v) {
 }
 
 template <class Index>
-void OrderingGraph<Index>::make_room(Vertex& v) {
+[[gnu::noinline]] void OrderingGraph<Index>::make_room(Vertex& v) {
   walk_elements(v, [](Element&) {});
   Index* list = elements_of(v);
   Lists& lists = lists_of(v);

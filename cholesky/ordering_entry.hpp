@@ -137,10 +137,15 @@ template <class Index>
 void OrderingGraph<Index>::enter_hub(const SmMatrix& m, Index i) {
   const std::uint64_t bit = hub_bit(i);
   for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
-    if (m.col_index[p] <= static_cast<i64>(i)) continue;
-    const Index j = static_cast<Index>(m.col_index[p]);
-    hubs_of_[j] |= bit;
-    if (mark_[j] == kGone) hubs_of_[i] |= hub_bit(j);
+    if (m.col_index[p] > static_cast<i64>(i)) hubs_of_[m.col_index[p]] |= bit;
+  }
+}
+
+// Of two hubs only the second has learnt of the first.
+template <class Index>
+void OrderingGraph<Index>::join_hubs() {
+  for (Index k = 0; k < hub_count_; ++k) {
+    for (Index j = 0; j < k; ++j) hubs_of_[hubs_[j]] |= (hubs_of_[hubs_[k]] >> j & 1) << k;
   }
 }
 
@@ -189,6 +194,7 @@ void OrderingGraph<Index>::enter(const SmMatrix& m) {
   const Index end = lay_out();
   if (!count_.tidy) enter_untidy(m);
   for (Index i = 0; count_.tidy && i < n_; ++i) is_hub(vertex(i)) ? enter_hub(m, i) : enter_row(m, i);
+  join_hubs();
   if (count_.long_rows > static_cast<i64>(hub_count_)) own_edges(end);
   lists_.clear();
   for (Index v = 0; v < n_; ++v) {

@@ -126,6 +126,7 @@ class OrderingGraph {
   void close_list(Index v);
   void enter_row(const SmMatrix& m, Index i);
   void enter_hub(const SmMatrix& m, Index i);
+  void join_hubs();
   void enter_untidy(const SmMatrix& m);
   void own_edges(Index end);
   void next_stamp() {
