@@ -10,19 +10,22 @@
 // - Ties of the least degree go to the vertex whose degree was due last.
 //
 // What is walked less, and why nothing changes:
-// - Neighbours are never unlinked. An uneliminated one is covered exactly if an element of the pivot leads to it, and
-//   elements come first, so its mark tells. How many are left is counted: an edge is looked for from its end of lower
-//   degree when both ends lie in a new boundary (an orientation that leaves any vertex few edges of its own: Chiba and
-//   Nishizeki, "Arboricity and subgraph listing algorithms", SIAM J. Comput. 14 (1985) 210-223).
+// - An uneliminated neighbour is covered exactly if an element of the pivot leads to it, and elements come first, so its
+//   mark tells. Covered neighbours are dropped when both ends of the edge lie in a new boundary, where each end looks
+//   through what it has left; but a long vertex (more than 32 neighbours) never looks: its short neighbours count for
+//   it, and an edge between two long ones is looked for from its end of lower degree (an orientation that leaves any
+//   vertex few edges of its own: Chiba and Nishizeki, "Arboricity and subgraph listing algorithms", SIAM J. Comput. 14
+//   (1985) 210-223).
+// - The hubs, up to 64 vertices of the highest degrees, are on no list: each vertex and each element has a bit for each
+//   of them. Where the rows of the matrix ascend, lists descend, which says where among the others a hub belongs.
 // - Absorbed elements stay on the lists, marked, until a list is walked for another reason or full. How many elements
 //   of a vertex are left is counted while their boundaries are read, for the last time, into the new one.
 // - The two counts tell what the plain road reads off a list: a vertex without any is interior, one with a single
 //   element and nothing else is a prototype or a duplicate. So the list of a vertex in very many elements need not be
 //   walked at all. Other lists are, to count for each of their elements how much of its boundary is outside the new one
 //   (Amestoy, Davis, Duff, "An approximate minimum degree ordering algorithm", SIAM J. Matrix Anal. Appl. 17 (1996)
-//   886-905). Of the hubs, up to 64 vertices of the highest degrees, every element knows which are on its boundary, so
-//   that those passed over are counted all the same. With k other vertices passed over the number may be too large by
-//   k.
+//   886-905). Every element knows which hubs are on its boundary, so that those passed over are counted all the same.
+//   With k other vertices passed over the number may be too large by k.
 // - An element whose boundary is contained in that of a newer one leads to nothing that the newer one does not lead to
 //   before. It still counts as one, but is set apart from the list.
 // - Degrees are bounded: from above by the sum of these numbers, from below by their maximum and by the former bound
@@ -32,11 +35,13 @@
 //   the prototype, which touches it: whether it is in the lists makes no difference.
 // - Once an element bounds all that is left, only the order of its boundary matters (ordering_finish.hpp).
 //
-// Everything is in one block: a node for each vertex (and the element that it becomes), both directions of the edges,
-// 3/2 cells for each neighbour of a vertex for its elements, so that making room by dropping the absorbed ones is paid
-// by what came before, and an arena for the boundaries. Elements and vertices never take more than the slots of the
-// edges that they replace, so boundaries fill at most one number an edge, with their headers two; three, and two a
-// vertex for the boundary that is being made, keep the packing of the arena rare.
+// Everything is in one block, as small as can be, because what a visit costs is the lines of the cache that it brings in:
+// - a node for each vertex (and the element that it becomes);
+// - slots for its neighbours. Elements and vertices never take more than the slots of the edges that they replace, so a
+//   short vertex has its elements at the beginning of the same slots. A long one has 3/2 cells for each neighbour
+//   beside them, so that making room by dropping the absorbed ones is paid by what came before;
+// - an arena for the boundaries, which fill at most one number an edge for the same reason, with their headers two;
+//   three, and two a vertex for the boundary that is being made, keep the packing of the arena rare.
 #pragma once
 
 #include <algorithm>
@@ -48,6 +53,14 @@
 #include "frame/core.hpp"
 
 namespace sm {
+
+// Without an instruction that older processors lack, and without a call.
+inline unsigned count_bits(std::uint64_t bits) {
+  bits -= bits >> 1 & 0x5555555555555555U;
+  bits = (bits & 0x3333333333333333U) + (bits >> 2 & 0x3333333333333333U);
+  bits = (bits + (bits >> 4)) & 0x0F0F0F0F0F0F0F0FU;
+  return static_cast<unsigned>(bits * 0x0101010101010101U >> 56);
+}
 
 template <class Index>
 struct GraphVertex {
@@ -90,10 +103,10 @@ struct GraphLists {
 template <class Index>
 class OrderingGraph {
  public:
-  // Bytes of memory that are enough for the edges, wherever they start, and those that are of use.
+  // Bytes of memory that are enough, or with so many more numbers an edge for the boundaries.
   static std::uint64_t bytes(i64 vertices, const EdgeCount& count, i64 slack = 0);
 
-  // perm holds the number of neighbours of every row.
+  // perm holds the number of neighbours of every row, inv_perm is work memory.
   OrderingGraph(i64 vertices, const EdgeCount& count, void* memory, std::uint64_t bytes, i64* perm, i64* inv_perm);
 
   void enter(const SmMatrix& m);
@@ -175,10 +188,10 @@ class OrderingGraph {
 
   Index n_;
   EdgeCount count_;
-  Node* graph_;   // one more than vertices, for the degree lists
-  i64* time_;     // when the degree of a vertex was due
+  Node* graph_;             // one more than vertices, for the degree lists
+  i64* time_;               // when the degree of a vertex was due
   std::uint64_t* hubs_of_;  // bits of the neighbours that are hubs; null without any
-  Index* slots_;  // of every vertex its neighbours, the latest first, and its elements; then owned edges
+  Index* slots_;            // of every vertex its neighbours, the latest first, and its elements; then owned edges
   Index* arena_;  // boundaries, each behind the number of its element, or n + its length when that is absorbed
   Index arena_size_;
   Index top_ = 0;
@@ -200,11 +213,12 @@ class OrderingGraph {
   std::uint64_t its_hubs_ = 0;
   std::uint64_t passed_hubs_ = 0;  // of them, those whose elements are not walked
   Index prototypes_ = 0;
-  Index passed_others_ = 0;        // vertices of the boundary whose elements are not walked, but for these
+  Index passed_others_ = 0;  // vertices of the boundary whose elements are not walked, but for these
 };
 
 }  // namespace sm
 
+#include "cholesky/ordering_degrees.hpp"
 #include "cholesky/ordering_elimination.hpp"
 #include "cholesky/ordering_entry.hpp"
 #include "cholesky/ordering_finish.hpp"
