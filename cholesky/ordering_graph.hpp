@@ -129,8 +129,8 @@ class OrderingGraph {
   Index* elements_of(const Vertex& v) const { return slots_ + v.list; }
   Lists& lists_of(const Vertex& v) const { return reinterpret_cast<Lists*>(slots_ + v.list)[-1]; }
   bool is_walked(const Vertex& v) const { return v.cells <= walked_ || v.elements <= walked_; }
-  bool is_long(const Vertex& v) const { return v.list >= long_lists_; }
-  bool is_hub(const Vertex& v) const { return v.list >= hub_lists_; }
+  bool is_long(const Vertex& v) const { return v.list > long_lists_; }
+  bool is_hub(const Vertex& v) const { return v.list > hub_lists_; }
   std::uint64_t hub_bit(Index v) const { return is_hub(vertex(v)) ? std::uint64_t{1} << lists_of(vertex(v)).start : 0; }
 
   void find_hubs();
@@ -204,7 +204,7 @@ class OrderingGraph {
   Index stamp_ = kGone - 1000;  // so that no ordering of some size goes without the restart
   Index marked_ = kGone;        // the element whose whole boundary bears the mark marked_stamp_
   Index marked_stamp_ = 0;
-  Index long_lists_ = 0;     // where the slots of long vertices start
+  Index long_lists_ = 0;     // where the slots of long vertices start: their lists are further on
   Index hub_lists_ = kGone;  // and of hubs
   Index hub_count_ = 0;
   Index hubs_[kHubs];  // ascending
