@@ -80,7 +80,7 @@ Index OrderingGraph<Index>::lay_out() {
   const auto set_long = [&](Index v) {
     const Index degree = static_cast<Index>(perm_[v]);
     set(v, kLongHead, degree + degree / 2 + 1);
-    lists_of(vertex(v)).owned = 0;
+    lists_of(vertex(v)).own = lists_of(vertex(v)).owned = 0;
   };
   for (Index v = 0, hub = 0; count_.long_rows > 0 && v < n_; ++v) {
     if (perm_[v] <= kShort) continue;
