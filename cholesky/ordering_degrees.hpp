@@ -13,20 +13,27 @@ template <class Visit>
   const Index cells = v.cells;
   Index* list = elements_of(v);
   Index kept = 0;
-  bool any_contained = false;
+  bool crowded = false;
   for (Index k = 0; k < cells; ++k) {
     const Index name = list[k];
     Element& e = element(name);
     if (e.size == 0) continue;
+    if (e.live == 0) {
+      Lists& lists = lists_of(v);
+      if (cells + lists.tail < lists.room) {
+        list[lists.room - ++lists.tail] = name;
+        continue;
+      }
+      crowded = true;
+    }
     list[kept++] = name;
-    any_contained |= e.live == 0;
     visit(e);
   }
   v.cells = kept;
-  if (any_contained) set_contained_apart(v);
+  if (crowded) set_contained_apart(v);
 }
 
-// Contained elements go to the end of the room, from the right so that none is lost.
+// Contained elements go to the end of the room where it is full, from the right so that none is lost.
 template <class Index>
 [[gnu::noinline]] void OrderingGraph<Index>::set_contained_apart(Vertex& v) {
   Index* list = elements_of(v);
