@@ -14,72 +14,71 @@ namespace sm {
 // What is known of a degree: itself, or a bound from below.
 enum class Known : i64 { exact = 0, bound = 1 };
 
-// Node has the members child, sibling, before and degree, reached as graph[v].vertex.
+// Node has the members child, sibling, before and degree, reached as graph[v].vertex. There is one more node than
+// vertices: it ends the links, so that they can be set without asking whether they lead anywhere.
 template <class Index, class Node>
 class DegreeLists {
  public:
-  static constexpr Index kNone = static_cast<Index>(-1);
-  static constexpr Index kOutside = static_cast<Index>(-2);  // `before` of a vertex that is in no list
+  static constexpr Index kOutside = static_cast<Index>(-1);  // `before` of a vertex that is in no list
 
-  // head: n + 1 places, cleared here; time: n words.
-  DegreeLists(Node* graph, Index* head, i64* time, Index n) : graph_(graph), head_(head), time_(time) {
-    for (Index d = 0; d <= n; ++d) head_[d] = kNone;
+  // head: n places; time: n words. Degrees are 1 to n.
+  DegreeLists(Node* graph, Index* head, i64* time, Index n) : graph_(graph), head_(head), time_(time), none_(n) {}
+
+  void clear() {
+    for (Index d = 0; d < none_; ++d) head_[d] = none_;
+    at(none_).child = at(none_).sibling = none_;
   }
-
   bool holds(Index v) const { return at(v).before != kOutside; }
   Known known(Index v) const { return static_cast<Known>(time_[v] & 1); }
 
   void insert_newest(Index v, Index degree, Known known) {
+    auto& entry = at(v);
+    Index& head = head_[degree - 1];
+    at(head).before = v;
     time_[v] = clock_ | static_cast<i64>(known);
     clock_ += 2;
-    Index& head = head_[degree];
-    auto& entry = at(v);
     entry.degree = degree;
     entry.child = head;
-    entry.sibling = kNone;
-    entry.before = kNone;
-    if (head != kNone) at(head).before = v;
+    entry.sibling = none_;
+    entry.before = none_;
     head = v;
-    if (degree < least_) least_ = degree;
+    least_ = degree < least_ ? degree : least_;
   }
 
   // A vertex that has left the lists comes back with its degree, at the time that it had.
   void insert_late(Index v, Index degree, Known known) {
-    time_[v] = (time_[v] & ~i64{1}) | static_cast<i64>(known);
     auto& entry = at(v);
+    time_[v] = (time_[v] & ~i64{1}) | static_cast<i64>(known);
     entry.degree = degree;
-    entry.child = entry.sibling = entry.before = kNone;
-    Index& head = head_[degree];
-    head = head == kNone ? v : meld(head, v);
+    entry.child = entry.sibling = entry.before = none_;
+    Index& head = head_[degree - 1];
+    head = head == none_ ? v : meld(head, v);
     if (degree < least_) least_ = degree;
   }
 
   void remove(Index v) {
     auto& entry = at(v);
     Index heir = entry.child;
-    if (heir != kNone && at(heir).sibling != kNone) heir = meld_all(heir);
-    if (heir != kNone) {
-      at(heir).sibling = entry.sibling;
-      if (entry.sibling != kNone) at(entry.sibling).before = heir;
-    } else {
-      heir = entry.sibling;
+    if (at(heir).sibling != none_) heir = meld_all(heir);
+    if (entry.sibling != none_) {
+      at(entry.sibling).before = heir == none_ ? entry.before : heir;
+      if (heir == none_) {
+        heir = entry.sibling;
+      } else {
+        at(heir).sibling = entry.sibling;
+      }
     }
     const Index before = entry.before;
     entry.before = kOutside;
-    if (heir != kNone) at(heir).before = before;
-    if (before == kNone) {
-      head_[entry.degree] = heir;
-    } else if (at(before).child == v) {
-      at(before).child = heir;
-    } else {
-      at(before).sibling = heir;
-    }
+    at(heir).before = before;
+    Index* const link = before == none_ ? &head_[entry.degree - 1] : &at(before).child;
+    *(*link == v ? link : &at(before).sibling) = heir;
   }
 
   // The newest vertex of the least degree. There must be one.
   Index first() {
-    while (head_[least_] == kNone) ++least_;
-    return head_[least_];
+    while (head_[least_ - 1] == none_) ++least_;
+    return head_[least_ - 1];
   }
 
  private:
@@ -95,19 +94,19 @@ class DegreeLists {
     auto& root = at(a);
     auto& below = at(b);
     below.sibling = root.child;
-    if (root.child != kNone) at(root.child).before = b;
+    at(root.child).before = b;
     below.before = a;
     root.child = b;
-    root.sibling = kNone;
+    root.sibling = none_;
     return a;
   }
 
   // One root of a row of siblings, whose links it answers unset: pairs from the left, then all pairs from the right.
   Index meld_all(Index first) const {
-    Index pairs = kNone;
-    while (first != kNone) {
+    Index pairs = none_;
+    while (first != none_) {
       const Index second = at(first).sibling;
-      if (second == kNone) {
+      if (second == none_) {
         at(first).sibling = pairs;
         pairs = first;
         break;
@@ -120,8 +119,8 @@ class DegreeLists {
     }
     Index all = pairs;
     Index rest = at(all).sibling;
-    at(all).sibling = kNone;
-    while (rest != kNone) {
+    at(all).sibling = none_;
+    while (rest != none_) {
       const Index next = at(rest).sibling;
       all = meld(all, rest);
       rest = next;
@@ -130,10 +129,11 @@ class DegreeLists {
   }
 
   Node* graph_;
-  Index* head_;
+  Index* head_;  // of the list of each degree, from 1 on
   i64* time_;
+  Index none_;
   i64 clock_ = 0;
-  Index least_ = 0;
+  Index least_ = 1;
 };
 
 }  // namespace sm

@@ -11,23 +11,54 @@
 
 namespace sm {
 
-EdgeCount count_edges(const SmMatrix& m, i64* degree, i64* met) {
+namespace {
+
+EdgeCount count_tidy_edges(const SmMatrix& m, i64* degree) {
   EdgeCount count;
+  std::fill_n(degree, m.rows, 0);
+  for (i64 i = 0; i < m.rows; ++i) {
+    i64 before = i;
+    i64 entries = 0;
+    for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
+      const i64 j = m.col_index[p];
+      if (j <= i) continue;
+      count.tidy &= j > before;
+      before = j;
+      ++degree[j];
+      ++entries;
+    }
+    degree[i] += entries;
+    count.edges += entries;
+  }
+  return count;
+}
+
+i64 count_distinct_edges(const SmMatrix& m, i64* degree, i64* met) {
+  i64 edges = 0;
   std::fill_n(degree, m.rows, 0);
   std::fill_n(met, m.rows, -1);
   for (i64 i = 0; i < m.rows; ++i) {
     for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
       const i64 j = m.col_index[p];
-      if (j <= i) continue;
-      if (met[j] == i) {
-        count.repeated = true;
-        continue;
-      }
+      if (j <= i || met[j] == i) continue;
       met[j] = i;
       ++degree[i];
       ++degree[j];
-      ++count.edges;
+      ++edges;
     }
+  }
+  return edges;
+}
+
+}  // namespace
+
+EdgeCount count_edges(const SmMatrix& m, i64* degree, i64* met) {
+  EdgeCount count = count_tidy_edges(m, degree);
+  if (!count.tidy) count.edges = count_distinct_edges(m, degree, met);
+  for (i64 i = 0; i < m.rows; ++i) {
+    if (degree[i] <= kShort) continue;
+    ++count.long_rows;
+    count.long_entries += degree[i];
   }
   return count;
 }
@@ -81,31 +112,40 @@ SmStatus take_workspace(SmMatrix& m, i64 edges) {
 
 namespace {
 
+// The boundaries make use of one more number an edge than they need.
+constexpr i64 kSlack = 1;
+
 // False when neither the workspace nor the pool has the memory.
 template <class Index>
-bool order_graph(SmMatrix& m, EdgeCount count, i64* perm, i64* inv_perm) {
-  const std::uint64_t bytes = OrderingGraph<Index>::bytes(m.rows, count.edges);
+bool order_graph(SmMatrix& m, const EdgeCount& count, i64* perm, i64* inv_perm) {
+  using Graph = OrderingGraph<Index>;
+  const std::uint64_t least = Graph::bytes(m.rows, count);
+  std::uint64_t bytes = Graph::bytes(m.rows, count, kSlack);
+  const std::uint64_t work = static_cast<std::uint64_t>(m.work_capacity) * sizeof(i64);
   Scratch<std::byte> scratch;
   void* memory = m.work;
-  if (bytes > static_cast<std::uint64_t>(m.work_capacity) * sizeof(i64)) {
+  if (least <= work) {
+    bytes = std::min(bytes, work);
+  } else {
     if (scratch.take(m.pool, static_cast<i64>(bytes)) != SM_OK) return false;
     memory = scratch.data();
   }
-  OrderingGraph<Index> graph(m.rows, count.edges, memory, perm, inv_perm);
-  graph.enter(m, count.repeated);
+  Graph graph(m.rows, count, memory, bytes, perm, inv_perm);
+  graph.enter(m);
   graph.eliminate_all();
+  for (i64 k = 0; k < m.rows; ++k) inv_perm[perm[k]] = k;
   return true;
 }
 
 // An index counts vertices, slots, and twice the vertices.
-bool fits_narrow(i64 rows, i64 edges) {
-  return OrderingGraph<std::uint32_t>::bytes(rows, edges) / sizeof(std::uint32_t) < UINT32_MAX;
+bool fits_narrow(i64 rows, const EdgeCount& count) {
+  return OrderingGraph<std::uint32_t>::bytes(rows, count, kSlack) / sizeof(std::uint32_t) < UINT32_MAX;
 }
 
 SmStatus order_in_workspace(SmMatrix& m, Road road, i64* perm, i64* inv_perm) {
   const EdgeCount count = count_edges(m, perm, inv_perm);
   SM_TRY(take_workspace(m, count.edges));
-  if (road == Road::best) road = fits_narrow(m.rows, count.edges) ? Road::narrow : Road::wide;
+  if (road == Road::best) road = fits_narrow(m.rows, count) ? Road::narrow : Road::wide;
   if (road == Road::narrow && order_graph<std::uint32_t>(m, count, perm, inv_perm)) return SM_OK;
   if (road == Road::wide && order_graph<std::uint64_t>(m, count, perm, inv_perm)) return SM_OK;
   return order_plainly(m, m.work, half_of_workspace(m), perm, inv_perm) ? SM_OK : SM_NO_MEMORY;

@@ -7,10 +7,15 @@
 
 namespace sm {
 
+// Vertices of more neighbours are long.
+inline constexpr i64 kShort = 32;
+
 // The edges of a matrix's graph: entries above the diagonal, a repeated one counted once.
 struct EdgeCount {
   i64 edges = 0;
-  bool repeated = false;
+  bool tidy = true;      // every row ascends, so that none is repeated
+  i64 long_rows = 0;     // long vertices
+  i64 long_entries = 0;  // their neighbours, summed
 };
 
 // Leaves in degree[i] the number of neighbours of row i. Both arrays have a word for each row.

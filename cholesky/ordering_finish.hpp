@@ -16,12 +16,12 @@ namespace sm {
 
 // The one element, but for `all`, of a vertex that has two.
 template <class Index>
-Index OrderingGraph<Index>::other_element(Index v, Index all) const {
+Index OrderingGraph<Index>::other_element(const Vertex& v, Index all) const {
   const Index* list = elements_of(v);
-  for (Index k = 0; k < vertex(v).cells; ++k) {
+  for (Index k = 0; k < v.cells; ++k) {
     if (list[k] != all && element(list[k]).size != 0) return list[k];
   }
-  const Index* cell = elements_of(v + 1) - places_[v].contained;
+  const Index* cell = list + lists_of(v).room - lists_of(v).tail;
   while (element(*cell).size == 0) ++cell;
   return *cell;
 }
@@ -42,41 +42,50 @@ void OrderingGraph<Index>::absorb_elements(Index pivot, Index all, Stack& gone, 
     }
     e.size = 0;
   };
-  const Index* list = elements_of(pivot);
-  for (Index k = 0; k < vertex(pivot).cells; ++k) take(list[k]);
-  const Index room = element_room(pivot);
-  for (Index k = 1; k <= places_[pivot].contained; ++k) take(list[room - k]);
+  const Vertex& mine = vertex(pivot);
+  const Index* list = elements_of(mine);
+  for (Index k = 0; k < mine.cells; ++k) take(list[k]);
+  const Lists& lists = lists_of(mine);
+  for (Index k = lists.listed + 1; k <= lists.tail; ++k) take(list[lists.room - k]);
 }
 
 // Adds the new single vertices, takes off those that have gone, and moves the prototypes to the end.
 template <class Index>
 void OrderingGraph<Index>::sort_singles(Stack& singles, const Stack& fresh, i64& place) {
-  i64* const places = inv_perm_;
-  Stack all{neighbours_, 0};
+  Index first = n_;
+  Index* end = &first;
+  const auto append = [&](Index v) {
+    *end = v;
+    end = &vertex(v).sibling;
+  };
   Index k = 0;
   for (Index s = 0; s < singles.count; ++s) {
     const Index v = singles.items[s];
-    if (vertex(v).mark == kGone) continue;
-    for (; k < fresh.count && places[fresh.items[k]] < places[v]; ++k) all.push(fresh.items[k]);
-    all.push(v);
+    if (mark_[v] == kGone) continue;
+    for (; k < fresh.count && time_[fresh.items[k]] < time_[v]; ++k) append(fresh.items[k]);
+    append(v);
   }
-  for (; k < fresh.count; ++k) all.push(fresh.items[k]);
+  for (; k < fresh.count; ++k) append(fresh.items[k]);
+  *end = n_;
   next_stamp();
   singles.count = 0;
-  Stack prototypes{neighbours_, 0};  // behind where `all` is read
-  for (Index s = 0; s < all.count; ++s) {
-    const Index v = all.items[s];
+  Index rest = first;
+  end = &first;
+  while (rest != n_) {
+    const Index v = rest;
+    rest = vertex(v).sibling;
     Element& single = element(vertex(v).child);
     if (single.claimed == stamp_) {
       singles.push(v);
     } else {
       single.claimed = stamp_;
-      prototypes.push(v);
+      append(v);
     }
   }
-  for (Index s = 0; s < prototypes.count; ++s) {
-    places[prototypes.items[s]] = place++;
-    singles.push(prototypes.items[s]);
+  *end = n_;
+  for (Index v = first; v != n_; v = vertex(v).sibling) {
+    time_[v] = place++;
+    singles.push(v);
   }
 }
 
@@ -85,20 +94,19 @@ void OrderingGraph<Index>::finish(Index all) {
   Index left = element(all).size;
   reserve(2 * left);
   const Index* boundary = arena_ + element(all).begin;
-  i64* const places = inv_perm_;
-  const auto earlier = [places](Index a, Index b) { return places[a] < places[b]; };
-  const auto keep_single = [&](Index v) { vertex(v).child = other_element(v, all); };
+  const auto earlier = [this](Index a, Index b) { return time_[a] < time_[b]; };
+  const auto keep_single = [&](Index v) { vertex(v).child = other_element(vertex(v), all); };
   Stack singles{head_, 0};
   i64 place = 0;
   for (Index b = 0; b < left; ++b) {
     const Index v = boundary[b];
-    places[v] = place++;
+    time_[v] = place++;
     if (vertex(v).elements != 2) continue;
     keep_single(v);
     singles.push(v);
   }
   while (ordered_ < n_) {
-    while (singles.count == 0 && vertex(boundary[left - 1]).mark == kGone) --left;
+    while (singles.count == 0 && mark_[boundary[left - 1]] == kGone) --left;
     const Index pivot = singles.count > 0 ? singles.items[--singles.count] : boundary[--left];
     number(pivot);
     Stack gone{arena_ + top_, 0};
@@ -107,7 +115,7 @@ void OrderingGraph<Index>::finish(Index all) {
     std::sort(gone.items, gone.items + gone.count, earlier);
     for (Index k = 0; k < gone.count; ++k) number(gone.items[k]);
     Index* const end =
-        std::remove_if(fresh.items, fresh.items + fresh.count, [this](Index v) { return vertex(v).mark == kGone; });
+        std::remove_if(fresh.items, fresh.items + fresh.count, [this](Index v) { return mark_[v] == kGone; });
     fresh.count = static_cast<Index>(end - fresh.items);
     std::sort(fresh.items, end, earlier);
     std::for_each(fresh.items, end, keep_single);

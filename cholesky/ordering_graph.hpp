@@ -10,19 +10,22 @@
 // - Ties of the least degree go to the vertex whose degree was due last.
 //
 // What is walked less, and why nothing changes:
-// - Neighbours are never unlinked. An uneliminated one is covered exactly if an element of the pivot leads to it, and
-//   elements come first, so its mark tells. How many are left is counted: an edge is looked for from its end of lower
-//   degree when both ends lie in a new boundary (an orientation that leaves any vertex few edges of its own: Chiba and
-//   Nishizeki, "Arboricity and subgraph listing algorithms", SIAM J. Comput. 14 (1985) 210-223).
+// - An uneliminated neighbour is covered exactly if an element of the pivot leads to it, and elements come first, so its
+//   mark tells. Covered neighbours are dropped when both ends of the edge lie in a new boundary, where each end looks
+//   through what it has left; but a long vertex (more than 32 neighbours) never looks: its short neighbours count for
+//   it, and an edge between two long ones is looked for from its end of lower degree (an orientation that leaves any
+//   vertex few edges of its own: Chiba and Nishizeki, "Arboricity and subgraph listing algorithms", SIAM J. Comput. 14
+//   (1985) 210-223).
+// - The hubs, up to 64 vertices of the highest degrees, are on no list: each vertex and each element has a bit for each
+//   of them. Where the rows of the matrix ascend, lists descend, which says where among the others a hub belongs.
 // - Absorbed elements stay on the lists, marked, until a list is walked for another reason or full. How many elements
 //   of a vertex are left is counted while their boundaries are read, for the last time, into the new one.
 // - The two counts tell what the plain road reads off a list: a vertex without any is interior, one with a single
 //   element and nothing else is a prototype or a duplicate. So the list of a vertex in very many elements need not be
 //   walked at all. Other lists are, to count for each of their elements how much of its boundary is outside the new one
 //   (Amestoy, Davis, Duff, "An approximate minimum degree ordering algorithm", SIAM J. Matrix Anal. Appl. 17 (1996)
-//   886-905). Of the hubs, up to 64 vertices of the highest degrees, every element knows which are on its boundary, so
-//   that those passed over are counted all the same. With k other vertices passed over the number may be too large by
-//   k.
+//   886-905). Every element knows which hubs are on its boundary, so that those passed over are counted all the same.
+//   With k other vertices passed over the number may be too large by k.
 // - An element whose boundary is contained in that of a newer one leads to nothing that the newer one does not lead to
 //   before. It still counts as one, but is set apart from the list.
 // - Degrees are bounded: from above by the sum of these numbers, from below by their maximum and by the former bound
@@ -32,11 +35,13 @@
 //   the prototype, which touches it: whether it is in the lists makes no difference.
 // - Once an element bounds all that is left, only the order of its boundary matters (ordering_finish.hpp).
 //
-// Everything is in one block: a node for each vertex (and the element that it becomes), both directions of the edges,
-// 3/2 cells for each neighbour of a vertex for its elements, so that making room by dropping the absorbed ones is paid
-// by what came before, and an arena for the boundaries. Elements and vertices never take more than the slots of the
-// edges that they replace, so boundaries fill at most one number an edge, with their headers two; three, and two a
-// vertex for the boundary that is being made, keep the packing of the arena rare.
+// Everything is in one block, as small as can be, because what a visit costs is the lines of the cache that it brings in:
+// - a node for each vertex (and the element that it becomes);
+// - slots for its neighbours. Elements and vertices never take more than the slots of the edges that they replace, so a
+//   short vertex has its elements at the beginning of the same slots. A long one has 3/2 cells for each neighbour
+//   beside them, so that making room by dropping the absorbed ones is paid by what came before;
+// - an arena for the boundaries, which fill at most one number an edge for the same reason, with their headers two;
+//   three, and two a vertex for the boundary that is being made, keep the packing of the arena rare.
 #pragma once
 
 #include <algorithm>
@@ -44,30 +49,38 @@
 #include <utility>
 
 #include "cholesky/degree_lists.hpp"
+#include "cholesky/ordering.hpp"
 #include "frame/core.hpp"
 
 namespace sm {
 
+// Without an instruction that older processors lack, and without a call.
+inline unsigned count_bits(std::uint64_t bits) {
+  bits -= bits >> 1 & 0x5555555555555555U;
+  bits = (bits & 0x3333333333333333U) + (bits >> 2 & 0x3333333333333333U);
+  bits = (bits + (bits >> 4)) & 0x0F0F0F0F0F0F0F0FU;
+  return static_cast<unsigned>(bits * 0x0101010101010101U >> 56);
+}
+
 template <class Index>
 struct GraphVertex {
-  Index mark;                    // the stamp of the last visit; kGone once eliminated
   Index vertices;                // neighbours that no element covers
   Index elements;                // elements that it lies in, but for absorbed ones
   Index cells;                   // of its list of elements
+  Index list;                    // where that list starts
   Index child, sibling, before;  // degree lists
   Index degree;                  // 1 + neighbours, or less while only a bound is known
 };
 
 template <class Index>
 struct GraphElement {
-  Index mark;        // kGone
-  Index size;        // vertices on the boundary; 0: absorbed
-  Index begin;       // of the boundary, in the arena
-  Index prototypes;  // how many of them end the boundary
-  Index outside;     // boundary vertices that are not on that of the element `met` (more if hubs were passed over)
-  Index met;         // stamp of the elimination that counts `outside`
-  Index claimed;     // stamp of the elimination in which a prototype claimed it
-  Index contained;   // 1: in the boundary of a newer one
+  Index size;          // vertices on the boundary; 0: absorbed
+  Index live;          // the same; 0 also when it is contained in a newer one
+  Index begin;         // of the boundary, in the arena
+  Index outside;       // boundary vertices that are not on that of the element `met` (more if hubs were passed over)
+  Index met;           // stamp of the elimination that counts `outside`
+  Index claimed;       // stamp of the elimination in which a prototype claimed it
+  std::uint64_t hubs;  // bits of the hubs on the boundary
 };
 
 template <class Index>
@@ -76,32 +89,36 @@ union GraphNode {
   GraphElement<Index> element;
 };
 
-// Where a vertex has its lists.
+// What comes in the slots before the cells of a vertex; a short one has but the last three.
 template <class Index>
-struct GraphPlaces {
-  Index start;      // of its neighbours; that of its elements follows from it
-  Index own_start;  // of the edges that it owns
-  Index owned;      // how many of them are left
-  Index contained;  // elements at the end of the room for its elements that are contained in newer ones
+struct GraphLists {
+  Index start;   // of the neighbours of a long vertex; of a hub its number
+  Index own;     // where the edges that a long vertex owns start
+  Index owned;   // how many of them are left
+  Index room;    // cells
+  Index tail;    // cells at the end that are taken: before the neighbours the elements that are contained in newer ones
+  Index listed;  // neighbours at the end, in their order: of a short vertex those that no element covers, but for hubs
 };
 
 template <class Index>
 class OrderingGraph {
  public:
-  // Bytes of memory for that many vertices and edges; aligned to a node.
-  static std::uint64_t bytes(i64 vertices, i64 edges);
+  // Bytes of memory that are enough, or with so many more numbers an edge for the boundaries.
+  static std::uint64_t bytes(i64 vertices, const EdgeCount& count, i64 slack = 0);
 
-  // perm holds the number of neighbours of every row.
-  OrderingGraph(i64 vertices, i64 edges, void* memory, i64* perm, i64* inv_perm);
+  // perm holds the number of neighbours of every row, inv_perm is work memory.
+  OrderingGraph(i64 vertices, const EdgeCount& count, void* memory, std::uint64_t bytes, i64* perm, i64* inv_perm);
 
-  void enter(const SmMatrix& m, bool repeated);
+  void enter(const SmMatrix& m);
   void eliminate_all();
 
  private:
   using Node = GraphNode<Index>;
   using Vertex = GraphVertex<Index>;
   using Element = GraphElement<Index>;
-  using Places = GraphPlaces<Index>;
+  using Lists = GraphLists<Index>;
+  static constexpr Index kShortHead = 3;
+  static constexpr Index kLongHead = 6;
   static constexpr Index kGone = static_cast<Index>(-1);
   // Longer lists of elements are not walked at each elimination beside them, unless the boundary is twice as long.
   static constexpr Index kWalked = 32;
@@ -109,14 +126,22 @@ class OrderingGraph {
 
   Vertex& vertex(Index v) const { return graph_[v].vertex; }
   Element& element(Index e) const { return graph_[e].element; }
-  Index* elements_of(Index v) const { return elements_ + places_[v].start + places_[v].start / 2 + v; }
-  Index element_room(Index v) const { return static_cast<Index>(elements_of(v + 1) - elements_of(v)); }
+  Index* elements_of(const Vertex& v) const { return slots_ + v.list; }
+  Lists& lists_of(const Vertex& v) const { return reinterpret_cast<Lists*>(slots_ + v.list)[-1]; }
   bool is_walked(const Vertex& v) const { return v.cells <= walked_ || v.elements <= walked_; }
+  bool is_long(const Vertex& v) const { return v.list > long_lists_; }
+  bool is_hub(const Vertex& v) const { return v.list > hub_lists_; }
+  std::uint64_t hub_bit(Index v) const { return is_hub(vertex(v)) ? std::uint64_t{1} << lists_of(vertex(v)).start : 0; }
 
-  void enter_edges(const SmMatrix& m, bool repeated);
-  void own_edges();
   void find_hubs();
-  std::uint64_t hub_bit(Index v) const;
+  static i64 slots(i64 vertices, const EdgeCount& count);
+  Index lay_out();
+  void close_list(Index v);
+  void enter_row(const SmMatrix& m, Index i);
+  void enter_hub(const SmMatrix& m, Index i);
+  void join_hubs();
+  void enter_untidy(const SmMatrix& m);
+  void own_edges(Index end);
   void next_stamp() {
     if (++stamp_ == kGone) restart_stamps();
   }
@@ -124,23 +149,30 @@ class OrderingGraph {
   Index take_minimum();
   Index count_degree(Index v, Index enough);
   void number(Index v) {
-    vertex(v).mark = kGone;
+    mark_[v] = kGone;
     perm_[ordered_++] = static_cast<i64>(v);
   }
   Index* form_element(Index pivot, Index& size);
+  Index* add_elements(const Vertex& pivot, Index* end);
+  Index* add_neighbours(Index pivot, Index* end);
+  Index* add_hub_neighbours(Index pivot, Index* end);
   void absorb(Element& e) {
     arena_[e.begin - 1] = n_ + e.size;
-    e.size = 0;
+    e.size = e.live = 0;
   }
   void reserve(Index more);
+  void find_passed(const Index* boundary, Index size);
   void cover_edges(const Index* boundary, Index size);
+  void cover_own(Vertex& v);
+  void cover_list(Vertex& v);
+  void cover_hubs(std::uint64_t bits, Index times);
   Element purge(Index pivot, Index* boundary, Index size);
   template <class Visit>
-  void walk_elements(Index v, Visit&& visit);
-  void set_contained_apart(Index v, Index kept);
-  Index single_element(Index v);
-  void make_room(Index v);
-  void push_element(Index v, Index e);
+  void walk_elements(Vertex& v, Visit&& visit);
+  void set_contained_apart(Vertex& v);
+  Index single_element(Vertex& v);
+  void make_room(Vertex& v);
+  void push_element(Vertex& v, Index e);
   void update_degrees(const Index* boundary, const Element& made, Index eliminated);
   void update_degree(Index v, const Element& made);
 
@@ -152,135 +184,41 @@ class OrderingGraph {
   void finish(Index all);
   void absorb_elements(Index pivot, Index all, Stack& gone, Stack& single);
   void sort_singles(Stack& singles, const Stack& fresh, i64& place);
-  Index other_element(Index v, Index all) const;
+  Index other_element(const Vertex& v, Index all) const;
 
   Index n_;
-  Index edges_;
-  Node* graph_;
-  Index* head_;
-  Places* places_;
-  Index* neighbours_;  // in the order of entry, the latest first
-  Index* own_;         // neighbours of higher degree
-  Index* elements_;
+  EdgeCount count_;
+  Node* graph_;             // one more than vertices, for the degree lists
+  i64* time_;               // when the degree of a vertex was due
+  std::uint64_t* hubs_of_;  // bits of the neighbours that are hubs; null without any
+  Index* slots_;            // of every vertex its neighbours, the latest first, and its elements; then owned edges
   Index* arena_;  // boundaries, each behind the number of its element, or n + its length when that is absorbed
   Index arena_size_;
   Index top_ = 0;
   i64* perm_;
-  i64* inv_perm_;  // until the end: of a vertex its time in the degree lists, of an element the hubs on its boundary
+  // In the memory of the answer inv_perm, until the end:
+  Index* mark_;  // of a vertex the stamp of the last visit; kGone once eliminated
+  Index* head_;  // of the degree lists; of a wide index elsewhere
   DegreeLists<Index, Node> lists_;
   Index ordered_ = 0;
   Index stamp_ = kGone - 1000;  // so that no ordering of some size goes without the restart
   Index marked_ = kGone;        // the element whose whole boundary bears the mark marked_stamp_
   Index marked_stamp_ = 0;
-  Index hub_degree_ = 0;
+  Index long_lists_ = 0;     // where the slots of long vertices start: their lists are further on
+  Index hub_lists_ = kGone;  // and of hubs
   Index hub_count_ = 0;
-  Index hubs_[kHubs];
+  Index hubs_[kHubs];  // ascending
   // While an element is formed:
   Index walked_ = 0;  // the longest list that is walked
   std::uint64_t its_hubs_ = 0;
   std::uint64_t passed_hubs_ = 0;  // of them, those whose elements are not walked
-  Index passed_others_ = 0;        // vertices of the boundary whose elements are not walked, but for these
+  Index prototypes_ = 0;
+  Index passed_others_ = 0;  // vertices of the boundary whose elements are not walked, but for these
 };
-
-template <class Index>
-std::uint64_t OrderingGraph<Index>::bytes(i64 vertices, i64 edges) {
-  const auto n = static_cast<std::uint64_t>(vertices);
-  const auto e = static_cast<std::uint64_t>(edges);
-  return sizeof(Index) * (8 * n + (n + 1) + 4 * (n + 1) + 2 * e + e + (3 * e + n) + (3 * e + 2 * n));
-}
-
-template <class Index>
-OrderingGraph<Index>::OrderingGraph(i64 vertices, i64 edges, void* memory, i64* perm, i64* inv_perm)
-    : n_(static_cast<Index>(vertices)),
-      edges_(static_cast<Index>(edges)),
-      graph_(static_cast<Node*>(memory)),
-      head_(reinterpret_cast<Index*>(graph_ + n_)),
-      places_(reinterpret_cast<Places*>(head_ + n_ + 1)),
-      neighbours_(reinterpret_cast<Index*>(places_ + n_ + 1)),
-      own_(neighbours_ + 2 * edges_),
-      elements_(own_ + edges_),
-      arena_(elements_ + 3 * edges_ + n_),
-      arena_size_(3 * edges_ + 2 * n_),
-      perm_(perm),
-      inv_perm_(inv_perm),
-      lists_(graph_, head_, inv_perm, n_) {}
-
-template <class Index>
-void OrderingGraph<Index>::enter(const SmMatrix& m, bool repeated) {
-  Index start = 0;
-  for (Index v = 0; v < n_; ++v) {
-    places_[v] = {start, 0, 0, 0};
-    const Index degree = static_cast<Index>(perm_[v]);
-    start += degree;
-    // While the edges are entered, mark is the row that met v last and cells where its next neighbour goes.
-    vertex(v) = {kGone, degree, 0, start, 0, 0, lists_.kOutside, 0};
-  }
-  places_[n_] = {start, 0, 0, 0};
-  enter_edges(m, repeated);
-  own_edges();
-  find_hubs();
-  for (Index v = 0; v < n_; ++v) {
-    vertex(v).mark = 0;
-    vertex(v).cells = 0;
-    lists_.insert_newest(v, vertex(v).vertices + 1, Known::exact);
-  }
-}
-
-template <class Index>
-void OrderingGraph<Index>::enter_edges(const SmMatrix& m, bool repeated) {
-  for (Index i = 0; i < n_; ++i) {
-    for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
-      if (m.col_index[p] <= static_cast<i64>(i)) continue;
-      const Index j = static_cast<Index>(m.col_index[p]);
-      Vertex& other = vertex(j);
-      if (repeated) {
-        if (other.mark == i) continue;
-        other.mark = i;
-      }
-      neighbours_[--vertex(i).cells] = j;
-      neighbours_[--other.cells] = i;
-    }
-  }
-}
-
-// An edge belongs to its end of lower degree: a vertex owns few, however many it has.
-template <class Index>
-void OrderingGraph<Index>::own_edges() {
-  Index end = 0;
-  for (Index v = 0; v < n_; ++v) {
-    Places& place = places_[v];
-    place.own_start = end;
-    const Index degree = vertex(v).vertices;
-    for (Index k = place.start; k < places_[v + 1].start; ++k) {
-      const Index w = neighbours_[k];
-      const Index other = vertex(w).vertices;
-      if (other > degree || (other == degree && w > v)) own_[end++] = w;
-    }
-    place.owned = end - place.own_start;
-  }
-}
-
-// At most 64 vertices of the highest degrees, one bit each: which of them an element has on its boundary is kept.
-template <class Index>
-void OrderingGraph<Index>::find_hubs() {
-  for (hub_degree_ = kWalked;; hub_degree_ *= 2) {
-    hub_count_ = 0;
-    for (Index v = 0; v < n_ && hub_count_ <= kHubs; ++v) {
-      if (vertex(v).vertices <= hub_degree_) continue;
-      if (hub_count_ < kHubs) hubs_[hub_count_] = v;
-      ++hub_count_;
-    }
-    if (hub_count_ <= kHubs) return;
-  }
-}
-
-template <class Index>
-std::uint64_t OrderingGraph<Index>::hub_bit(Index v) const {
-  if (places_[v + 1].start - places_[v].start <= hub_degree_) return 0;
-  return std::uint64_t{1} << (std::lower_bound(hubs_, hubs_ + hub_count_, v) - hubs_);
-}
 
 }  // namespace sm
 
+#include "cholesky/ordering_degrees.hpp"
 #include "cholesky/ordering_elimination.hpp"
+#include "cholesky/ordering_entry.hpp"
 #include "cholesky/ordering_finish.hpp"

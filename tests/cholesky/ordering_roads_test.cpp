@@ -135,7 +135,7 @@ TEST_P(OrderingRoadsTest, rows_that_are_not_tidy_get_one_order) {
 // The narrow index needs no more than the workspace; the wide one asks the pool and gives back.
 TEST_P(OrderingRoadsTest, a_road_that_cannot_have_its_memory_leaves_the_order_to_the_plain_one) {
   Random random(2);
-  const Graph graph = with_hubs(random, grid(9, 9), 4, 50);
+  const Graph graph = with_hubs(random, path(81), 1, 50);
   SmMatrix* m = closed(graph);
   const Answer plain = order_again(m, Road::plain);
   const std::int64_t blocks = host().live_blocks();
