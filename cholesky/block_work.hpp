@@ -9,7 +9,7 @@ namespace sm {
 inline constexpr i64 kPanelColumns = 240;  // a multiple of every tile
 static_assert(kMostBlockRows <= kPanelColumns, "the rows that a block updates are columns of the first panel");
 
-// Work memory of fixed size, on the stack: 395 kB.
+// Work memory of fixed size, on the stack: 396 kB.
 struct Panels {
   alignas(64) double source[kMostBlockRows * kPanelColumns];
   alignas(64) double coefficient[kMostBlockRows * kMostBlockRows];

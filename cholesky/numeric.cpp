@@ -1,5 +1,5 @@
-// Numeric factorization of a symmetric sparse matrix: the values of U and D. This file has the checks, the pivots and
-// the results; numeric_blocked.cpp does the work, numeric_rows.cpp is the plain road.
+// Numeric factorization of a symmetric sparse matrix: the values of U and D. This file has the checks and the results,
+// numeric.hpp the pivots; numeric_blocked.cpp does the work, numeric_rows.cpp is the plain road.
 #include "cholesky/numeric.hpp"
 
 #include "store/checks.hpp"

@@ -73,7 +73,7 @@ class Pivots {
   double product_ = 1.0;  // of pivots whose logarithm log_sum_ lacks
 };
 
-// Both answer 0, or 103 with the rows before the bad pivot done.
+// Both answer 0, or 103: the values are then of no use.
 [[nodiscard]] SmStatus factor_in_blocks(const NumericArrays& a, Pivots& pivots);
 [[nodiscard]] SmStatus factor_by_rows(const NumericArrays& a, Pivots& pivots);
 

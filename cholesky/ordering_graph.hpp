@@ -10,7 +10,7 @@
 // - Ties of the least degree go to the vertex whose degree was due last.
 //
 // What is walked less, and why nothing changes:
-// - An uneliminated neighbour is covered exactly if an element of the pivot leads to it, and elements come first, so its
+// - An uneliminated neighbour is covered exactly if an element of the pivot leads to it; elements come first, so its
 //   mark tells. Covered neighbours are dropped when both ends of the edge lie in a new boundary, where each end looks
 //   through what it has left; but a long vertex (more than 32 neighbours) never looks: its short neighbours count for
 //   it, and an edge between two long ones is looked for from its end of lower degree (an orientation that leaves any
@@ -35,7 +35,7 @@
 //   the prototype, which touches it: whether it is in the lists makes no difference.
 // - Once an element bounds all that is left, only the order of its boundary matters (ordering_finish.hpp).
 //
-// Everything is in one block, as small as can be, because what a visit costs is the lines of the cache that it brings in:
+// Everything is in one block, as small as can be, as what a visit costs is the lines of the cache that it brings in:
 // - a node for each vertex (and the element that it becomes);
 // - slots for its neighbours. Elements and vertices never take more than the slots of the edges that they replace, so a
 //   short vertex has its elements at the beginning of the same slots. A long one has 3/2 cells for each neighbour

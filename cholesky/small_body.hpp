@@ -23,7 +23,9 @@ struct SmallRows {
   }
 };
 
-// Row kRow += sum over the rows above of factor[q] * row q.
+// Row kRow += sum over the rows above of factor[q] * row q. Lanes up to the diagonal, which nobody reads, are words in
+// front of the row: of rows above, and in front of the first value of all the last pivot, as `values` lies behind
+// `diag` in the workspace.
 template <int kRow>
 SM_TILE_INLINE void add_rows_above(SmallRows& s, const double* factor) {
   using V = typename X::Vector;

@@ -1,4 +1,5 @@
-// The kernel of the selected inversion for blocks of few rows with short tails, after tiles_body.hpp and small_body.hpp.
+// The kernel of the selected inversion for blocks of few rows with short tails, after tiles_body.hpp and
+// small_body.hpp.
 //
 // With V for -U of the block, V = [N T] on its own columns and on the tail, and Z on the tail at hand:
 //   Y = T Z on the tail,   S = D^- + T Y';   the block's rows of the inverse are N~ Y on the tail, N~ S N~' on its own

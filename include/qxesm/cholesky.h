@@ -34,7 +34,7 @@ QXESM_API SmStatus qxsmreorder(SmMatrix* matrix);
 QXESM_API SmStatus qxsmsymbfact(SmMatrix* matrix);
 
 /* Values of U and D in the room that qxsmsymbfact left; state 5; rank, log_det, definite. Allocates nothing, and takes
- * 400 kB of stack. Uses the widest vector instructions of the CPU, chosen when the module is loaded: the last bits
+ * 420 kB of stack. Uses the widest vector instructions of the CPU, chosen when the module is loaded: the last bits
  * depend on them.
  * Answers: 0 with nothing done (empty); 0 (state 5); 1; 113; 0 (state above 5); 102 (state other than 4, or not
  * symmetric sparse); 101 (the room is too small); 103 (definite 0, the state stays 4); 0. */
@@ -100,8 +100,8 @@ QXESM_API SmStatus qxsmsoldirect(SmMatrix* matrix, const double* b, double* x, i
  * stands.
  * Answers: 0 with nothing done (empty); 1; 113; 111; then, with x cleared: 124 (general); qxsmfact's; 101 (packed: n
  * doubles of work); 0. Cost of a sparse matrix: that of factoring its values, up to three times, with as many doubles
- * as U has and up to 13 MB more while it runs; where that memory cannot be had, n partial back substitutions without
- * any. Uses the record's factor_scratch. */
+ * as U has, n more and up to 13.1 MB while it runs; where that memory cannot be had, n partial back substitutions
+ * without any. Uses the record's factor_scratch. */
 QXESM_API SmStatus qxsminvdiag(SmMatrix* matrix, double* x);
 
 /* values <- the elements of A^- where A has stored entries, factoring when needed: prediction error variances and

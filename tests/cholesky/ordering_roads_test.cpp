@@ -110,6 +110,33 @@ TEST_P(OrderingRoadsTest, every_graph_of_up_to_four_vertices_gets_one_order) {
   }
 }
 
+// Vertices of up to 32 neighbours are kept otherwise than longer ones, and up to 64 of these as bits.
+TEST_P(OrderingRoadsTest, vertices_around_the_length_that_counts_as_long_get_one_order) {
+  Random random(9);
+  for (const std::int64_t leaves : {31, 32, 33, 64, 65}) {
+    for (const std::int64_t stars : {1, 3, 70}) {
+      Graph graph{stars * (leaves + 1), {}};
+      for (std::int64_t s = 0; s < stars; ++s) {
+        const std::int64_t centre = s * (leaves + 1);
+        for (std::int64_t leaf = 1; leaf <= leaves; ++leaf) graph.edges.emplace_back(centre, centre + leaf);
+        if (s > 0) graph.edges.emplace_back(centre - 1, centre + leaves);
+      }
+      expect_one_order(graph, random);
+      expect_one_order(relabelled(graph, random.permutation(graph.n)), random);
+      ASSERT_FALSE(HasFailure()) << stars << " stars of " << leaves;
+    }
+  }
+  for (const std::int64_t reach : {16, 17, 20, 32, 33}) {  // every vertex has twice as many neighbours
+    Graph graph{200, {}};
+    for (std::int64_t i = 0; i < graph.n; ++i)
+      for (std::int64_t d = 1; d <= reach; ++d)
+        graph.edges.emplace_back(std::min(i, (i + d) % graph.n), std::max(i, (i + d) % graph.n));
+    expect_one_order(graph, random);
+    expect_one_order(relabelled(graph, random.permutation(graph.n)), random);
+    ASSERT_FALSE(HasFailure()) << "reach " << reach;
+  }
+}
+
 // Rows in any order, repeated entries and entries below the diagonal, as no closing leaves them.
 TEST_P(OrderingRoadsTest, rows_that_are_not_tidy_get_one_order) {
   for (std::uint64_t seed = 0; seed < 600; ++seed) {

@@ -165,7 +165,7 @@ TEST(FindColumnAtEnds, answers_as_a_search_from_the_front) {
   }
 }
 
-TEST_P(SelectedInverseTest, leaves_zeros_where_where_pivots_were_dropped) {
+TEST_P(SelectedInverseTest, leaves_zeros_where_pivots_were_dropped) {
   for (std::uint64_t seed = 0; seed < 150; ++seed) {
     Random random(seed);
     const Semidefinite s = cross_product(random, 1 + random.below(50), random.below(20), random.below(8));
