@@ -3,12 +3,10 @@
 #include <cholmod.h>
 #include <fmt/format.h>
 #include <metis.h>
-#include <sys/mman.h>
 #include <sys/utsname.h>
 #include <unistd.h>
 
 #include <Eigen/Core>
-#include <algorithm>
 #include <cstdlib>
 #include <fstream>
 #include <set>
@@ -68,23 +66,6 @@ Json describe_machine(const std::string& module_file, Clock clock) {
             {"load", load[0]},
             {"dgemm", rates.gemm},
             {"copy", rates.copy}}}};
-}
-
-constexpr std::size_t kMostTouched = std::size_t{12} << 30;
-
-void touch_memory() {
-  const long page = sysconf(_SC_PAGESIZE);
-  const long free_pages = sysconf(_SC_AVPHYS_PAGES);
-  if (page <= 0 || free_pages <= 0) return;
-  auto bytes = std::min(static_cast<std::size_t>(free_pages / 2) * static_cast<std::size_t>(page), kMostTouched);
-  std::size_t limit = 0;  // of a container; "max" is no number
-  if (std::ifstream("/sys/fs/cgroup/memory.max") >> limit) bytes = std::min(bytes, limit / 2);
-  void* memory = mmap(nullptr, bytes, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
-  if (memory == MAP_FAILED) return;
-  madvise(memory, bytes, MADV_HUGEPAGE);
-  auto* const first = static_cast<volatile char*>(memory);
-  for (std::size_t k = 0; k < bytes; k += static_cast<std::size_t>(page)) first[k] = 1;
-  munmap(memory, bytes);
 }
 
 }  // namespace sm::bench

@@ -66,7 +66,6 @@ void run_cases(const Options& options, Module& module, Records& records) {
 int run(const Options& options) {
   chosen_clock() = options.clock;
   use_one_thread();
-  if (options.size != Size::quick) touch_memory();
   Module module;
   Records records(options.output);
   records.write(describe_machine(module.file(), options.clock));

@@ -1,30 +1,11 @@
 // The peak of a factorization job once the matrix is closed: what the closed matrix holds, and by how much the resident
 // set of the process grew above that while it was factored.
 #include <cstdio>
-#include <fstream>
-#include <string>
 
+#include "bench/harness/warm_memory.hpp"
 #include "bench/phases/phases.hpp"
 
 namespace sm::bench {
-namespace {
-
-// "VmHWM" or "VmRSS" in bytes; 0 when the system does not say.
-double resident(const std::string& what) {
-  std::ifstream status("/proc/self/status");
-  for (std::string line; std::getline(status, line);) {
-    if (line.rfind(what + ":", 0) == 0) return 1024.0 * std::stod(line.substr(what.size() + 1));
-  }
-  return 0.0;
-}
-
-bool forget_peak() {
-  std::ofstream file("/proc/self/clear_refs");
-  file << "5\n";
-  return static_cast<bool>(file.flush());
-}
-
-}  // namespace
 
 void measure_memory(Workbench& bench) {
   if (!bench.can_factor({"memory"})) return;
