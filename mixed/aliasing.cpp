@@ -8,9 +8,9 @@
 #include <algorithm>
 #include <array>
 #include <cmath>
-#include <numeric>
 
 #include "mixed/alias_roads.hpp"
+#include "mixed/dense.hpp"
 
 namespace sm::mixed {
 namespace {
@@ -25,9 +25,6 @@ constexpr double kMostNumbers = 2e7;
 constexpr double kMostWork = 3e8;
 
 using Vector = std::vector<double>;
-
-double dot(const Vector& a, const Vector& b) { return std::inner_product(a.begin(), a.end(), b.begin(), 0.0); }
-double norm_of(const Vector& a) { return std::sqrt(dot(a, a)); }
 
 void subtract(double factor, const Vector& b, Vector& a) {
   for (std::size_t i = 0; i < a.size(); ++i) a[i] -= factor * b[i];
@@ -177,10 +174,10 @@ class GramSchmidt {
   void take(std::int64_t j, Vector left, Vector parts) {
     const double size = x_.norm(j);
     project(parts.size(), left, parts);
-    double rest = norm_of(left);
+    double rest = norm(left);
     if (rest <= kShortened * size) {
       project(0, left, parts);
-      rest = norm_of(left);
+      rest = norm(left);
     }
     if (rest <= kDoubtful * size) {
       Vector b = dependence(j, parts);

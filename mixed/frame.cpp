@@ -79,7 +79,7 @@ bool distinct_whole_numbers(const std::vector<double>& values, Factor& factor, s
   for (std::size_t i = values.size(); i-- > 0;) {
     const double beyond = values[i] - *least;
     if (!(beyond >= 0.0 && beyond <= range) || values[i] != std::floor(values[i])) return false;
-    seen[static_cast<std::size_t>(values[i] - *least)] = i;
+    seen[static_cast<std::size_t>(beyond)] = i;
   }
   std::vector<std::int32_t> place(seen.size());
   for (std::size_t k = 0; k < seen.size(); ++k) {
@@ -95,7 +95,6 @@ bool distinct_whole_numbers(const std::vector<double>& values, Factor& factor, s
 
 Factor distinct_numbers(const std::vector<double>& values, std::vector<std::size_t>& first) {
   if (Factor whole; distinct_whole_numbers(values, whole, first)) return whole;
-  first.clear();
   std::vector<double> sorted = values;
   std::sort(sorted.begin(), sorted.end());
   sorted.erase(std::unique(sorted.begin(), sorted.end()), sorted.end());

@@ -83,6 +83,12 @@ std::vector<Indices> mixed_tails(Random& random, std::int64_t count, std::int64_
   return tails;
 }
 
+Graph mixed_subjects(Random& random, std::int64_t most, std::int64_t most_border) {
+  const std::int64_t border = 1 + random.below(most_border);
+  const std::vector<Indices> tails = mixed_tails(random, 1 + random.below(most), border);
+  return subjects(tails, 1 + random.below(9), border);
+}
+
 Twins twin_subjects(Random& random, std::int64_t count, std::int64_t width, std::int64_t border) {
   const std::int64_t own = count * width;
   const std::int64_t n = own + border;

@@ -20,6 +20,8 @@ Graph subjects(const std::vector<Indices>& tails, std::int64_t width, std::int64
 std::vector<Indices> whole_tails(std::int64_t count, std::int64_t border);
 // Each one of a few parts of the border.
 std::vector<Indices> mixed_tails(Random& random, std::int64_t count, std::int64_t border);
+// Up to that many subjects of up to nine vertices, each touching one of a few parts of the border.
+Graph mixed_subjects(Random& random, std::int64_t most, std::int64_t most_border);
 // Subjects whose coefficients are in part copies of the one before, all touching the whole border. What is left of a
 // copy is exactly 0, wherever it stands: the rank is given too.
 struct Twins {
