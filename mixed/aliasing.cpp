@@ -10,7 +10,7 @@
 #include <cmath>
 
 #include "mixed/alias_roads.hpp"
-#include "mixed/dense.hpp"
+#include "mixed/vectors.hpp"
 
 namespace sm::mixed {
 namespace {

@@ -4,12 +4,12 @@
 #include <Eigen/Core>
 #include <algorithm>
 #include <cmath>
-#include <numeric>
 #include <unordered_map>
 
 #include "mixed/alias_groups.hpp"
 #include "mixed/alias_roads.hpp"
 #include "mixed/error.hpp"
+#include "mixed/vectors.hpp"
 #include "mixed/words.hpp"
 
 namespace sm::mixed {
@@ -25,8 +25,6 @@ constexpr std::int64_t kBlockRows = 512;
 constexpr std::int64_t kMostDense = 8000;
 constexpr int kRefinements = 3;
 constexpr double kUnfelt = 1e-14;
-
-double dot(const Vector& a, const Vector& b) { return std::inner_product(a.begin(), a.end(), b.begin(), 0.0); }
 
 // Columns without a row in common, whose normal equations are diagonal: those of the largest such term.
 std::vector<std::int64_t> disjoint_columns(const std::vector<GroupedColumn>& columns,
@@ -284,7 +282,7 @@ class NullSpace {
     for (const std::int64_t j : equations_.doubtful()) {
       Vector left;
       Vector combination = residual(static_cast<std::size_t>(j), left);
-      const double rest = std::sqrt(dot(left, left));
+      const double rest = norm(left);
       const GroupedColumn& column = columns_[static_cast<std::size_t>(j)];
       double rounding = 0.0;
       for (std::size_t k = 0; k < columns_.size(); ++k) rounding += std::fabs(combination[k]) * columns_[k].noise;
@@ -321,7 +319,7 @@ class NullSpace {
         for (std::size_t i = 0; i < left.size(); ++i) left[i] -= part * directions_[d][i];
         for (std::size_t k = 0; k < combination.size(); ++k) combination[k] -= part * combinations_[d][k];
       }
-      if (std::sqrt(dot(left, left)) * columns_[j].scale <= kNothing / 100.0 * columns_[j].size) break;
+      if (norm(left) * columns_[j].scale <= kNothing / 100.0 * columns_[j].size) break;
     }
     return combination;
   }

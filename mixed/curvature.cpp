@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <cmath>
 
+#include "mixed/vectors.hpp"
+
 namespace sm::mixed {
 namespace {
 

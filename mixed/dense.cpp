@@ -4,7 +4,6 @@
 #include <algorithm>
 #include <cmath>
 #include <limits>
-#include <numeric>
 
 namespace sm::mixed {
 namespace {
@@ -26,12 +25,6 @@ bool finite(const Dense& a) {
 }
 
 }  // namespace
-
-double dot(std::span<const double> a, std::span<const double> b) {
-  return std::inner_product(a.begin(), a.end(), b.begin(), 0.0);
-}
-
-double norm(std::span<const double> a) { return std::sqrt(dot(a, a)); }
 
 Dense identity(std::size_t n) {
   Dense result(n * n, 0.0);

@@ -3,15 +3,11 @@
 #pragma once
 
 #include <cstddef>
-#include <span>
 #include <vector>
 
 namespace sm::mixed {
 
 using Dense = std::vector<double>;
-
-double dot(std::span<const double> a, std::span<const double> b);
-double norm(std::span<const double> a);
 
 Dense identity(std::size_t n);
 Dense product(const Dense& a, const Dense& b, std::size_t rows, std::size_t inner, std::size_t columns);  // A B

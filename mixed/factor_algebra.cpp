@@ -5,6 +5,8 @@
 #include <numeric>
 #include <span>
 
+#include "mixed/vectors.hpp"
+
 namespace sm::mixed {
 namespace {
 

@@ -13,6 +13,7 @@
 #include "mixed/optimize.hpp"
 #include "mixed/trust_region.hpp"
 #include "mixed/value_search.hpp"
+#include "mixed/vectors.hpp"
 
 namespace sm::mixed {
 

@@ -1,4 +1,5 @@
-# What reads a table and a formula, and makes their model. The fuzzer compiles these files for itself.
+# What reads a table and a formula, and makes their model. The fuzzer compiles these files for itself, and so they
+# are to need no others.
 set(QXMIXED_TABLE_SOURCES
   ${CMAKE_CURRENT_LIST_DIR}/alias_groups.cpp
   ${CMAKE_CURRENT_LIST_DIR}/aliasing.cpp
@@ -18,4 +19,5 @@ set(QXMIXED_TABLE_SOURCES
   ${CMAKE_CURRENT_LIST_DIR}/term_algebra.cpp
   ${CMAKE_CURRENT_LIST_DIR}/text.cpp
   ${CMAKE_CURRENT_LIST_DIR}/variables.cpp
+  ${CMAKE_CURRENT_LIST_DIR}/vectors.cpp
   ${CMAKE_CURRENT_LIST_DIR}/words.cpp)

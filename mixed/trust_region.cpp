@@ -4,6 +4,7 @@
 #include <cmath>
 
 #include "mixed/dense.hpp"
+#include "mixed/vectors.hpp"
 
 namespace sm::mixed {
 namespace {
