@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <cstddef>
+#include <span>
 
 #include "cholesky/ordering_graph.hpp"
 #include "cholesky/ordering_steps.hpp"
@@ -115,22 +116,23 @@ namespace {
 // The boundaries make use of one more number an edge than they need.
 constexpr i64 kSlack = 1;
 
+std::uint64_t whole_words(std::uint64_t bytes) { return (bytes + sizeof(i64) - 1) / sizeof(i64) * sizeof(i64); }
+
 // False when neither the workspace nor the pool has the memory.
 template <class Index>
 bool order_graph(SmMatrix& m, const EdgeCount& count, i64* perm, i64* inv_perm) {
   using Graph = OrderingGraph<Index>;
-  const std::uint64_t least = Graph::bytes(m.rows, count);
-  std::uint64_t bytes = Graph::bytes(m.rows, count, kSlack);
-  const std::uint64_t work = static_cast<std::uint64_t>(m.work_capacity) * sizeof(i64);
+  const std::uint64_t bytes = whole_words(Graph::bytes(m.rows, count, kSlack));
+  const std::span work = std::as_writable_bytes(std::span(m.work, static_cast<std::size_t>(m.work_capacity)));
   Scratch<std::byte> scratch;
-  void* memory = m.work;
-  if (least <= work) {
-    bytes = std::min(bytes, work);
-  } else {
+  std::span<std::byte> memory = work.first(std::min<std::size_t>(bytes, work.size()));
+  std::span<std::byte> spare = work.subspan(memory.size());
+  if (Graph::bytes(m.rows, count) > work.size()) {
     if (scratch.take(m.pool, static_cast<i64>(bytes)) != SM_OK) return false;
-    memory = scratch.data();
+    memory = {scratch.data(), bytes};
+    spare = work;
   }
-  Graph graph(m.rows, count, memory, bytes, perm, inv_perm);
+  Graph graph(m.rows, count, memory, spare, perm, inv_perm);
   graph.enter(m);
   graph.eliminate_all();
   for (i64 k = 0; k < m.rows; ++k) inv_perm[perm[k]] = k;

@@ -27,7 +27,7 @@ template <class Visit>
       crowded = true;
     }
     list[kept++] = name;
-    visit(e);
+    visit(e, name);
   }
   v.cells = kept;
   if (crowded) set_contained_apart(v);
@@ -58,7 +58,7 @@ Index OrderingGraph<Index>::single_element(Vertex& v) {
 
 template <class Index>
 [[gnu::noinline]] void OrderingGraph<Index>::make_room(Vertex& v) {
-  walk_elements(v, [](Element&) {});
+  walk_elements(v, [](Element&, Index) {});
   Index* list = elements_of(v);
   Lists& lists = lists_of(v);
   const Index contained = lists.listed + 1;
@@ -88,7 +88,7 @@ typename OrderingGraph<Index>::Element OrderingGraph<Index>::purge(Index pivot, 
   Index kept = 0;
   const Index stamp = stamp_;
   const std::uint64_t passed = passed_hubs_;
-  const auto meet = [stamp, passed](Element& e) {
+  const auto meet = [stamp, passed](Element& e, Index) {
     Index outside = e.met == stamp ? e.outside : e.size;
     if (passed != 0 && e.met != stamp) outside -= count_bits(e.hubs & passed);
     e.outside = outside - 1;
@@ -182,8 +182,8 @@ Index OrderingGraph<Index>::take_minimum() {
     const Index least = vertex(v).degree;
     lists_.remove(v);
     if (lists_.known(v) == Known::exact) return v;
-    const Index enough = 2 * least + 8;
-    const Index degree = count_degree(v, enough);
+    const Index enough = bits_.in_use() ? n_ : 2 * least + 8;
+    const Index degree = bits_.in_use() ? count_by_bits(v) : count_degree(v, enough);
     if (degree == least) {
       vertex(v).degree = degree;
       return v;
@@ -198,7 +198,7 @@ template <class Index>
 Index OrderingGraph<Index>::count_degree(Index v, Index enough) {
   if (stamp_ >= kGone - 2) restart_stamps();
   Vertex& mine = vertex(v);
-  walk_elements(mine, [](Element&) {});
+  walk_elements(mine, [](Element&, Index) {});
   const Index* list = elements_of(mine);
   const Index newest = list[mine.cells - 1];
   const Element& first = element(newest);
@@ -216,6 +216,7 @@ Index OrderingGraph<Index>::count_degree(Index v, Index enough) {
     const Element& e = element(list[k]);
     const Index* boundary = arena_ + e.begin;
     const Index size = e.size;
+    visits_ += size;
     for (Index b = 0; b < size; ++b) {
       Index& mark = mark_[boundary[b]];
       const Index seen = mark;
@@ -225,6 +226,15 @@ Index OrderingGraph<Index>::count_degree(Index v, Index enough) {
     }
   }
   return degree;
+}
+
+// 1 + the number of neighbours.
+template <class Index>
+Index OrderingGraph<Index>::count_by_bits(Index v) {
+  Vertex& mine = vertex(v);
+  bits_.clear();
+  walk_elements(mine, [this](Element&, Index name) { bits_.join(name); });
+  return bits_.count() + mine.vertices;
 }
 
 }  // namespace sm

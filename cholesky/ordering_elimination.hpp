@@ -134,7 +134,7 @@ template <class Index>
 void OrderingGraph<Index>::find_passed(const Index* boundary, Index size) {
   its_hubs_ = passed_hubs_ = 0;
   passed_others_ = 0;
-  walked_ = std::max(size / 2, kWalked);
+  walked_ = bits_.in_use() ? kWalkedBesideBits : std::max(size / 8, kWalked);
   if (count_.long_rows == 0) return;
   for (Index b = 0; b < size; ++b) {
     const Index v = boundary[b];
@@ -224,6 +224,34 @@ void OrderingGraph<Index>::cover_edges(const Index* boundary, Index size) {
   cover_hubs(last, times);
 }
 
+// Once counting has visited as many vertices as there are, and those of a boundary are more than the words that it would
+// take.
+template <class Index>
+bool OrderingGraph<Index>::bits_due(Index boundary) const {
+  const Index left = n_ - ordered_;
+  return bits_.in_use() ? bits_.outgrown(left) : visits_ > static_cast<i64>(n_) && boundary > left / 64;
+}
+
+template <class Index>
+void OrderingGraph<Index>::use_bits() {
+  visits_ = 0;
+  Index elements = 0;
+  const auto visit_boundaries = [this](auto&& visit) {
+    for (Index from = 0; from < top_;) {
+      const Index name = arena_[from];
+      const Index size = name < n_ ? element(name).size : name - n_;
+      if (name < n_) visit(name, arena_ + from + 1, size);
+      from += 1 + size;
+    }
+  };
+  visit_boundaries([&](Index, const Index*, Index) { ++elements; });
+  if (!bits_.start(n_, n_ - ordered_, elements)) return;
+  for (Index v = 0; v < n_; ++v) {
+    if (mark_[v] != kGone) bits_.enter(v);
+  }
+  visit_boundaries([this](Index name, const Index* boundary, Index size) { bits_.add(name, boundary, size); });
+}
+
 template <class Index>
 void OrderingGraph<Index>::eliminate_all() {
   while (ordered_ < n_) {
@@ -241,9 +269,11 @@ void OrderingGraph<Index>::eliminate_all() {
     top_ += made.size + 1;
     if (made.size == n_ - ordered_) {
       finish(pivot);
-    } else {
-      update_degrees(boundary, made, ordered_ - before);
+      return;
     }
+    update_degrees(boundary, made, ordered_ - before);
+    if (bits_.in_use()) bits_.add(pivot, boundary, made.size);
+    if (bits_due(made.size)) use_bits();
   }
 }
 

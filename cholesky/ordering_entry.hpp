@@ -25,22 +25,23 @@ i64 OrderingGraph<Index>::slots(i64 vertices, const EdgeCount& count) {
 }
 
 template <class Index>
-OrderingGraph<Index>::OrderingGraph(i64 vertices, const EdgeCount& count, void* memory, std::uint64_t bytes, i64* perm,
-                                    i64* inv_perm)
+OrderingGraph<Index>::OrderingGraph(i64 vertices, const EdgeCount& count, std::span<std::byte> memory,
+                                    std::span<std::byte> spare, i64* perm, i64* inv_perm)
     : n_(static_cast<Index>(vertices)),
       count_(count),
-      graph_(static_cast<Node*>(memory)),
+      graph_(reinterpret_cast<Node*>(memory.data())),
       time_(reinterpret_cast<i64*>(graph_ + n_ + 1)),
       hubs_of_(reinterpret_cast<std::uint64_t*>(time_ + n_)),
       slots_(reinterpret_cast<Index*>(hubs_of_ + (count.long_rows > 0 ? n_ : 0))),
       perm_(perm),
       mark_(reinterpret_cast<Index*>(inv_perm)),
       head_(sizeof(Index) == 4 ? mark_ + n_ : slots_),
-      lists_(graph_, head_, time_, n_) {
+      lists_(graph_, head_, time_, n_),
+      bits_(spare) {
   if (sizeof(Index) != 4) slots_ += n_;
   arena_ = slots_ + slots(vertices, count);
-  const auto end = reinterpret_cast<std::uintptr_t>(memory) + bytes;
-  arena_size_ = static_cast<Index>((end - reinterpret_cast<std::uintptr_t>(arena_)) / sizeof(Index));
+  const auto before = static_cast<std::size_t>(reinterpret_cast<std::byte*>(arena_) - memory.data());
+  arena_size_ = static_cast<Index>((memory.size() - before) / sizeof(Index));
 }
 
 // At most 64 vertices of the highest degrees. Their edges need rows in order.

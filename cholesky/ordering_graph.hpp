@@ -31,6 +31,7 @@
 // - Degrees are bounded: from above by the sum of these numbers, from below by their maximum and by the former bound
 //   less what has been eliminated since. Where the bounds meet the degree is known. Else the lower one enters the
 //   degree lists, with the time when the degree was due, and the count waits until it is the least of all.
+// - Late in an elimination degrees are counted by bits (ordering_bits.hpp). Hardly any list is walked then.
 // - A vertex that a prototype outmatches has at least its degree and an earlier time, so that it is never taken before
 //   the prototype, which touches it: whether it is in the lists makes no difference.
 // - Once an element bounds all that is left, only the order of its boundary matters (ordering_finish.hpp).
@@ -46,21 +47,16 @@
 
 #include <algorithm>
 #include <bit>
+#include <cstddef>
+#include <span>
 #include <utility>
 
 #include "cholesky/degree_lists.hpp"
 #include "cholesky/ordering.hpp"
+#include "cholesky/ordering_bits.hpp"
 #include "frame/core.hpp"
 
 namespace sm {
-
-// Without an instruction that older processors lack, and without a call.
-inline unsigned count_bits(std::uint64_t bits) {
-  bits -= bits >> 1 & 0x5555555555555555U;
-  bits = (bits & 0x3333333333333333U) + (bits >> 2 & 0x3333333333333333U);
-  bits = (bits + (bits >> 4)) & 0x0F0F0F0F0F0F0F0FU;
-  return static_cast<unsigned>(bits * 0x0101010101010101U >> 56);
-}
 
 template <class Index>
 struct GraphVertex {
@@ -106,8 +102,10 @@ class OrderingGraph {
   // Bytes of memory that are enough, or with so many more numbers an edge for the boundaries.
   static std::uint64_t bytes(i64 vertices, const EdgeCount& count, i64 slack = 0);
 
-  // perm holds the number of neighbours of every row, inv_perm is work memory.
-  OrderingGraph(i64 vertices, const EdgeCount& count, void* memory, std::uint64_t bytes, i64* perm, i64* inv_perm);
+  // perm holds the number of neighbours of every row, inv_perm is work memory. Both blocks start at a multiple of 8;
+  // the spare one may be of any size.
+  OrderingGraph(i64 vertices, const EdgeCount& count, std::span<std::byte> memory, std::span<std::byte> spare,
+                i64* perm, i64* inv_perm);
 
   void enter(const SmMatrix& m);
   void eliminate_all();
@@ -120,8 +118,10 @@ class OrderingGraph {
   static constexpr Index kShortHead = 3;
   static constexpr Index kLongHead = 6;
   static constexpr Index kGone = static_cast<Index>(-1);
-  // Longer lists of elements are not walked at each elimination beside them, unless the boundary is twice as long.
+  // Longer lists of elements are not walked at each elimination beside them, unless the boundary is eight times as
+  // long; nor, where counting goes by bits, longer ones than the second.
   static constexpr Index kWalked = 32;
+  static constexpr Index kWalkedBesideBits = 8;
   static constexpr Index kHubs = 64;
 
   Vertex& vertex(Index v) const { return graph_[v].vertex; }
@@ -148,6 +148,9 @@ class OrderingGraph {
   void restart_stamps();
   Index take_minimum();
   Index count_degree(Index v, Index enough);
+  Index count_by_bits(Index v);
+  bool bits_due(Index boundary) const;
+  void use_bits();
   void number(Index v) {
     mark_[v] = kGone;
     perm_[ordered_++] = static_cast<i64>(v);
@@ -200,6 +203,8 @@ class OrderingGraph {
   Index* mark_;  // of a vertex the stamp of the last visit; kGone once eliminated
   Index* head_;  // of the degree lists; of a wide index elsewhere
   DegreeLists<Index, Node> lists_;
+  BoundaryBits<Index> bits_;
+  i64 visits_ = 0;  // vertices seen in counting, since bits were thought of
   Index ordered_ = 0;
   Index stamp_ = kGone - 1000;  // so that no ordering of some size goes without the restart
   Index marked_ = kGone;        // the element whose whole boundary bears the mark marked_stamp_
