@@ -229,13 +229,13 @@ void OrderingGraph<Index>::cover_edges(const Index* boundary, Index size) {
 template <class Index>
 bool OrderingGraph<Index>::bits_due(Index boundary) const {
   const Index left = n_ - ordered_;
-  return bits_.in_use() ? bits_.outgrown(left) : visits_ > static_cast<i64>(n_) && boundary > left / 64;
+  return bits_.in_use() ? bits_.outgrown(left) : visits_ > static_cast<i64>(n_) && boundary >= bits_.words_for(left);
 }
 
 template <class Index>
 void OrderingGraph<Index>::use_bits() {
   visits_ = 0;
-  Index elements = 0;
+  Index large = 0;
   const auto visit_boundaries = [this](auto&& visit) {
     for (Index from = 0; from < top_;) {
       const Index name = arena_[from];
@@ -244,8 +244,10 @@ void OrderingGraph<Index>::use_bits() {
       from += 1 + size;
     }
   };
-  visit_boundaries([&](Index, const Index*, Index) { ++elements; });
-  if (!bits_.start(n_, n_ - ordered_, elements)) return;
+  const Index left = n_ - ordered_;
+  const Index words = bits_.words_for(left);
+  visit_boundaries([&](Index, const Index*, Index size) { large += bits_.large(size, words); });
+  if (!bits_.start(n_, left, large)) return;
   for (Index v = 0; v < n_; ++v) {
     if (mark_[v] != kGone) bits_.enter(v);
   }
