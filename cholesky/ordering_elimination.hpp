@@ -135,7 +135,7 @@ void OrderingGraph<Index>::find_passed(const Index* boundary, Index size) {
   its_hubs_ = passed_hubs_ = 0;
   passed_others_ = 0;
   walked_ = bits_.in_use() ? kWalkedBesideBits : std::max(size / 8, kWalked);
-  if (count_.long_rows == 0) return;
+  if (count_.long_rows == 0 && walked_ >= kShort) return;  // no list is longer
   for (Index b = 0; b < size; ++b) {
     const Index v = boundary[b];
     const std::uint64_t bit = hub_bit(v);

@@ -96,6 +96,16 @@ TEST_P(OrderingRoadsTest, larger_designs_get_one_order) {
   }
 }
 
+// So large that the vertices left at the end take many words, and are halved more than once.
+TEST_P(OrderingRoadsTest, designs_with_long_ends_get_one_order) {
+  for (std::uint64_t seed = 0; seed < 2; ++seed) {
+    Random random(seed);
+    expect_one_order(mixed_model(random, 1500, 600 + random.below(600), 8 + random.below(12)), random);
+    expect_one_order(pedigree(random, 4000, 5 + random.below(40)), random);
+    EXPECT_FALSE(HasFailure()) << "seed " << seed;
+  }
+}
+
 TEST_P(OrderingRoadsTest, every_graph_of_up_to_four_vertices_gets_one_order) {
   Random random(1);
   for (std::int64_t n = 1; n <= 4; ++n) {
