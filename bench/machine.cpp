@@ -42,7 +42,7 @@ std::set<std::string> linear_algebra() {
 // By the bytes that are loaded from.
 Json latencies() {
   Json list = Json::array();
-  for (const std::size_t megabytes : {1, 16, 256}) {
+  for (const std::size_t megabytes : {1, 4, 16, 256}) {
     const std::size_t bytes = megabytes << 20;
     list.push_back({{"bytes", bytes}, {"seconds", dependent_load(bytes)}});
   }

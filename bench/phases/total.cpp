@@ -67,6 +67,18 @@ double run_cholmod(Workbench& bench, Ordering ordering, Kind kind, Steps& steps,
   return seconds;
 }
 
+constexpr const char* kEigen = "Eigen SimplicialLDLT";
+
+// Eigen's steps cost it something, so they are timed beside the race, and only where it is the fastest peer.
+bool is_fastest_peer(const std::vector<Outcome>& outcomes, const std::string& name) {
+  const Outcome* fastest = nullptr;
+  for (const Outcome& outcome : outcomes) {
+    if (!outcome.counts() || outcome.name.starts_with(kOurs)) continue;
+    if (!fastest || outcome.median() < fastest->median()) fastest = &outcome;
+  }
+  return fastest && fastest->name == name;
+}
+
 }  // namespace
 
 void measure_total(Workbench& bench) {
@@ -92,9 +104,12 @@ void measure_total(Workbench& bench) {
         });
       }
     }
-    add("Eigen SimplicialLDLT", [&] { return seconds_of([&] { solve_by_eigen(bench.rows(), b, x); }); });
+    add(kEigen, [&] { return seconds_of([&] { solve_by_eigen(bench.rows(), b, x); }); });
   }
   const std::vector<Outcome> outcomes = bench.race("total", contestants);
+  if (is_fastest_peer(outcomes, kEigen)) {
+    for (int k = 0; k < 3; ++k) solve_by_eigen(bench.rows(), b, x, steps[kEigen]);
+  }
   Json facts = Json::object();
   for (const auto& [name, taken] : steps) facts["steps"][name] = taken.medians();
   bench.record("total", "", outcomes, facts);

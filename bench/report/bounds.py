@@ -69,19 +69,25 @@ def of_ordering(run, r):
 
 def of_symbolic(run, r):
     peer = r.seconds("CHOLMOD supernodal")
-    return {"peer_ns": product(quotient(peer, r.entries), 1e9), "ns": product(quotient(r.ours(), r.entries), 1e9),
+    return {"peer_ns": product(quotient(peer, r.entries), 1e9), **loads(run, r, r.entries, 16.0 * r.entries),
             **rates(run, r, moved=r.facts.get("bytes"))}
 
 
+def row_length(numeric):
+    """Entries of a row of U on average."""
+    return quotient(numeric.facts.get("factor_entries"), numeric.n) if numeric else None
+
+
 def of_numeric(run, r):
-    return rates(run, r, r.facts.get("flops"), r.facts.get("bytes"))
+    return {"row": row_length(r), **rates(run, r, r.facts.get("flops"), r.facts.get("bytes"))}
 
 
 def of_solve(run, r):
     ordering = run.find(r, "ordering")
     fill = ordering.facts.get("fill", {}) if ordering else {}
     ours, metis = (fill.get(name, {}).get("entries") for name in (OURS, "METIS"))
-    return {"metis_fill": quotient(metis, ours), **rates(run, r, r.facts.get("flops"), r.facts.get("bytes"))}
+    return {"metis_fill": quotient(metis, ours), "row": row_length(r),
+            **rates(run, r, r.facts.get("flops"), r.facts.get("bytes"))}
 
 
 def shares(steps, names):
@@ -103,7 +109,8 @@ def of_total(run, r):
 def of_inverse(run, r):
     """Each entry of a row of U meets each other one: twice the operations of the factorization."""
     numeric = run.find(r, "numeric")
-    return rates(run, r, product(2.0, numeric.facts.get("flops") if numeric else None))
+    flops = product(2.0, numeric.facts.get("flops") if numeric else None)
+    return {"row": row_length(numeric), **rates(run, r, flops)}
 
 
 def of_refactor(run, r):
@@ -117,7 +124,7 @@ def of_refactor(run, r):
 
 
 def of_moving(run, r):
-    return rates(run, r, moved=r.facts.get("bytes"))
+    return {"matrix_mb": 16e-6 * r.entries, "vector_mb": 8e-6 * r.n, **rates(run, r, moved=r.facts.get("bytes"))}
 
 
 MEASURED = {
@@ -134,19 +141,21 @@ COLUMNS = {
         ("Gflop of the factor: " + ", ".join(ORDERINGS),
          lambda m: ", ".join(text.number(m[f"gflop_{name.lower()}"]) for name in ORDERINGS)),
         ("ns an entry", "ns"), ("a dependent load, ns", "load_ns")],
-    "symbolic": [("ns an entry", "ns"), ("of the copy rate", "of_copy")],
+    "symbolic": [("ns an entry", "ns"), ("loads of memory an entry", "loads"), ("of the copy rate", "of_copy")],
     "numeric": [
-        ("GFLOP/s", "gflops"), ("of dgemm", "of_dgemm"), ("of the copy rate", "of_copy"),
+        ("GFLOP/s", "gflops"), ("of dgemm", "of_dgemm"), ("of the copy rate", "of_copy"), ("entries of a row of U", "row"),
         ("nearest bound", lambda m: f"{m['bound']}, {text.number(m['nearest'], 2)}" if m["bound"] else "–")],
     "total": [
         ("ordering / symbolic / numeric / solve", lambda m: parts(m, [f"share_{name}" for name in OUR_STEPS])),
         ("fastest peer: analysis / numeric / solve", lambda m: parts(m, [f"peer_{name}" for name in STEPS_OF_PEERS])),
         ("without the ordering", "without_ordering")],
     "solve": [("of the copy rate", "of_copy"), ("GB/s", "gbytes"), ("GFLOP/s", "gflops")],
-    "inverse": [("GFLOP/s", "gflops"), ("of dgemm", "of_dgemm")],
-    "trace": [("GFLOP/s", "gflops"), ("of dgemm", "of_dgemm")],
+    "inverse": [("GFLOP/s", "gflops"), ("of dgemm", "of_dgemm"), ("entries of a row of U", "row")],
+    "trace": [("GFLOP/s", "gflops"), ("of dgemm", "of_dgemm"), ("entries of a row of U", "row")],
     "refactor": [
-        ("refilling, ms", "refill_ms"), ("refilling, GB/s", "refill_gbytes"), ("refilling, % of the time", "share_refill")],
+        ("refilling, ms", "refill_ms"), ("refilling, GB/s", "refill_gbytes"),
+        ("refilling, % of the time", "share_refill"), ("factoring again, ms", "numeric_ms"),
+        ("factoring first, ms", "first_ms")],
     "product": [("of the copy rate", "of_copy")],
     "iteration": [("of the copy rate", "of_copy")],
 }

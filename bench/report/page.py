@@ -16,8 +16,8 @@ FAMILIES = {
 }
 PHASES = [
     ("assembly", "Assembly",
-     "Every contribution entered by itself; Eigen takes them all at once. A load is one whose address the load before "
-     "gave, over a memory as large as the trees."),
+     "Every contribution entered by itself; Eigen takes them all at once. A load is one whose address the load "
+     "before gave, over a memory as large as the trees."),
     ("closing", "Closing", "From trees, or from the maps, to compressed rows."),
     ("ordering", "Ordering",
      "Minimum degree here and in AMD, nested dissection in METIS, which is given its graph. The time of an entry beside "
@@ -31,18 +31,19 @@ PHASES = [
      "library for the peers, keeps pages of moderate size from the run before. Bytes: "
      "16 for each entry of U, written and read, and 16 for each of A; the nearest bound is the larger share."),
     ("total", "Order, factor and solve",
-     "From a closed matrix to one solution, everybody with orderings of their own. The steps of the module are timed in "
-     "runs of their own; without the ordering: the ratio if it took no time at all."),
+     "From a closed matrix to one solution, everybody with orderings of their own. The steps of the module are timed "
+     "in runs of their own; without the ordering: the ratio if it took no time at all."),
     ("solve", "Solves", "With a factor that is there. Bytes: in a pass over the factor, eight vectors at "
-     "most, the values and the kept subscripts of U twice and five words a row, and three words a row for each vector."),
+     "most, the values and the kept subscripts of U twice and five words a row, and three words a row for each "
+     "vector."),
     ("inverse", "Diagonal of the inverse",
      "Beside a column by column Takahashi on CHOLMOD's factor, in the same order. Operations: "
      "twice those of the factorization."),
     ("trace", "Trace of an inverse product", "tr(A⁻B), B on the pattern of A."),
     ("refactor", "Refactor loop", "New values on the same pattern. Refilling moves 24 bytes an entry."),
     ("product", "Symmetric product", "From one stored triangle. Bytes: 16 for each entry, and the vectors."),
-    ("iteration", "Conjugate gradients", "Time of a step; one stored triangle, diagonal preconditioner. Bytes: those of "
-     "the product, and nine words a row."),
+    ("iteration", "Conjugate gradients", "Time of a step; one stored triangle, diagonal preconditioner. Bytes: those "
+     "of the product, and nine words a row."),
     ("dense factor", "Dense factor", "Packed here, full for dpotrf, packed for dpptrf."),
     ("dense inverse", "Dense inverse", "Packed here, full for LAPACK."),
 ]
