@@ -32,7 +32,7 @@ std::vector<std::uint32_t> random_cycle(std::uint32_t count) {
 
 double dependent_load(std::size_t bytes) {
   constexpr std::size_t kLoads = std::size_t{1} << 20;
-  constexpr int kTimes = 3;
+  constexpr int kTimes = 5;
   const std::vector<std::uint32_t> next = random_cycle(static_cast<std::uint32_t>(bytes / sizeof(Line)));
   std::vector<Line> lines(next.size());
   for (std::size_t k = 0; k < next.size(); ++k) lines[k].next = &lines[next[k]];

@@ -38,10 +38,11 @@ def rates(run, r, flops=None, moved=None):
     """Of a job of so many operations on so many bytes, beside dgemm and copying; the nearer of the two bounds."""
     gflops, gbytes = quotient(flops, r.ours()), quotient(moved, r.ours())
     of_dgemm, of_copy = quotient(gflops, run.machine["dgemm"]), quotient(gbytes, run.machine["copy"])
-    known = [(share, name) for share, name in ((of_dgemm, "dgemm"), (of_copy, "copying")) if share is not None]
+    nearest, bound = None, None
+    if of_dgemm is not None and of_copy is not None:
+        nearest, bound = max((of_dgemm, "dgemm"), (of_copy, "copying"))
     return {"gflops": product(gflops, 1e-9), "gbytes": product(gbytes, 1e-9), "of_dgemm": of_dgemm,
-            "of_copy": of_copy, "nearest": max(known)[0] if known else None,
-            "bound": max(known)[1] if known else None}
+            "of_copy": of_copy, "nearest": nearest, "bound": bound}
 
 
 def loads(run, r, count, size):
@@ -144,7 +145,7 @@ COLUMNS = {
     "symbolic": [("ns an entry", "ns"), ("loads of memory an entry", "loads"), ("of the copy rate", "of_copy")],
     "numeric": [
         ("GFLOP/s", "gflops"), ("of dgemm", "of_dgemm"), ("of the copy rate", "of_copy"), ("entries of a row of U", "row"),
-        ("nearest bound", lambda m: f"{m['bound']}, {text.number(m['nearest'], 2)}" if m["bound"] else "–")],
+        ("nearest bound", lambda m: f"{m['bound']}, {m['nearest']:.2f}" if m["bound"] else "–")],
     "total": [
         ("ordering / symbolic / numeric / solve", lambda m: parts(m, [f"share_{name}" for name in OUR_STEPS])),
         ("fastest peer: analysis / numeric / solve", lambda m: parts(m, [f"peer_{name}" for name in STEPS_OF_PEERS])),
