@@ -54,9 +54,11 @@ def loads(run, r, count, size):
 def of_assembly(run, r):
     count = r.facts.get("contributions")
     map_ns = product(quotient(r.seconds("std::map"), count), 1e9)
+    numbers = loads(run, r, count, r.facts.get("tree_bytes"))
+    if r.variant != "random order":
+        numbers["loads"] = None  # what comes next is near by, and fetched ahead
     return {"million": quotient(product(count, 1e-6), r.ours()), "map_ns": map_ns, "map_fifth": product(map_ns, 0.2),
-            "near_load_ns": product(latency(run, 2**20), 1e9),
-            **loads(run, r, count, r.facts.get("tree_bytes"))}
+            "near_load_ns": product(latency(run, 2**20), 1e9), **numbers}
 
 
 def of_ordering(run, r):
@@ -169,10 +171,10 @@ def parts(numbers, names):
 
 
 def measured(run, r):
-    """The numbers of a record by name; for every phase its ratio and its fastest peer."""
-    ratio, (peer, _) = r.ratio(), r.best_peer()
+    """The numbers of a record by name; for every phase its size and its fastest peer."""
+    peer, _ = r.best_peer()
     of_phase = MEASURED[r.phase](run, r) if r.phase in MEASURED else {}
-    return {"n": r.n, "entries": r.entries, "ratio": ratio, "peer": peer, **of_phase}
+    return {"n": r.n, "entries": r.entries, "peer": peer, **of_phase}
 
 
 def columns(run, r):

@@ -126,6 +126,10 @@ class Bounds(unittest.TestCase):
                                             contributions=10**6, tree_bytes=2**24)))
         self.assertAlmostEqual(numbers["loads"], 5.0)
         self.assertAlmostEqual(numbers["map_ns"], 1400.0)
+        natural = numbers_of(bounded(record("e", "x", 9, "assembly", {OURS: 0.7}, "natural order",
+                                            contributions=10**6, tree_bytes=2**24)))
+        self.assertAlmostEqual(natural["ns"], 700.0)
+        self.assertIsNone(natural["loads"])
 
     def test_the_inverse_takes_twice_the_operations_of_the_factor(self):
         run = bounded(record("a", "x", 9, "numeric", {OURS: 1.0}, flops=10e9),
