@@ -35,7 +35,7 @@ PHASES = [
      "in runs of their own; without the ordering: the ratio if it took no time at all."),
     ("solve", "Solves", "With a factor that is there. Bytes: in a pass over the factor, eight vectors at "
      "most, the values and the kept subscripts of U twice and five words a row, and three words a row for each "
-     "vector."),
+     "vector. The places of x in the caches: three words an entry of U for each vector."),
     ("inverse", "Diagonal of the inverse",
      "Beside a column by column Takahashi on CHOLMOD's factor, in the same order. Operations: "
      "twice those of the factorization."),

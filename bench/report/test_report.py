@@ -136,6 +136,13 @@ class Bounds(unittest.TestCase):
                       record("a", "x", 9, "inverse", {OURS: 0.5}))
         self.assertAlmostEqual(numbers_of(run)["gflops"], 40.0)
 
+    def test_a_solve_touches_its_vectors_at_every_entry(self):
+        numbers = numbers_of(bounded(record("a", "x", 10**6, "solve", {OURS: 0.5}, factor_entries=10**7, count=2,
+                                            bytes=2e9, flops=8e7)))
+        self.assertAlmostEqual(numbers["of_copy"], 0.2)
+        self.assertAlmostEqual(numbers["touched"], (2.0 + 0.48) / 0.5)
+        self.assertAlmostEqual(numbers["row"], 10.0)
+
     def test_refilling_is_judged_by_what_it_moves(self):
         numbers = numbers_of(bounded(record("f", "x", 9, "refactor", {OURS: 0.4}, refilling=0.1, refill_bytes=1e9)))
         self.assertAlmostEqual(numbers["of_copy"], 0.5)
