@@ -152,7 +152,8 @@ COLUMNS = {
         ("ns an entry", "ns"), ("a dependent load, ns", "load_ns")],
     "symbolic": [("ns an entry", "ns"), ("loads of memory an entry", "loads"), ("of the copy rate", "of_copy")],
     "numeric": [
-        ("GFLOP/s", "gflops"), ("of dgemm", "of_dgemm"), ("of the copy rate", "of_copy"), ("entries of a row of U", "row"),
+        ("GFLOP/s", "gflops"), ("of dgemm", "of_dgemm"), ("of the copy rate", "of_copy"),
+        ("entries of a row of U", "row"),
         ("nearest bound", lambda m: f"{m['bound']}, {m['nearest']:.2f}" if m["bound"] else "–")],
     "total": [
         ("ordering / symbolic / numeric / solve", lambda m: parts(m, [f"share_{name}" for name in OUR_STEPS])),

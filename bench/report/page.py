@@ -20,8 +20,8 @@ PHASES = [
      "before gave, over a memory as large as the trees."),
     ("closing", "Closing", "From trees, or from the maps, to compressed rows."),
     ("ordering", "Ordering",
-     "Minimum degree here and in AMD, nested dissection in METIS, which is given its graph. The time of an entry beside "
-     "that of a dependent load over a memory as large as the graph, both triangles."),
+     "Minimum degree here and in AMD, nested dissection in METIS, which is given its graph. The time of an entry "
+     "beside that of a dependent load over a memory as large as the graph, both triangles."),
     ("symbolic", "Symbolic factorization",
      "The module's own permutation given to all. CHOLMOD's simplicial analysis counts but leaves the subscripts to the "
      "numeric phase; the supernodal one makes them and is the peer here. Bytes: an entry of A read and written, 32, "
