@@ -14,6 +14,7 @@ FAMILIES = {
     "e": "squares of 5-point grids (13 points)",
     "f": "subjects with six coefficients, ten fixed effects",
 }
+IN_STEPS = f"{OURS}, in steps"  # the module once more, for the shares of its steps
 PHASES = [
     ("assembly", "Assembly",
      "Every contribution entered by itself; Eigen takes them all at once. A load is one whose address the load "
@@ -189,7 +190,7 @@ def series(run, family, phase, variant=""):
         if not definite(r):
             continue
         for name in r.times:
-            if r.seconds(name):
+            if r.seconds(name) and name != IN_STEPS:
                 lines.setdefault(name, []).append((r.n, r.seconds(name)))
     return lines
 
@@ -207,7 +208,7 @@ def scaling_table(run):
             ours = exponent(lines.get(OURS, []))
             best = {}
             for name, points in lines.items():
-                for n, s in points if name != OURS else []:
+                for n, s in points if not name.startswith(OURS) else []:
                     best[n] = min(s, best.get(n, s))
             row.append(f"{text.number(ours)} ({text.number(exponent(best.items()))})")
         rows.append(row)

@@ -228,6 +228,14 @@ class Page(unittest.TestCase):
             with open(os.path.join(folder, "performance.md"), encoding="utf-8") as file:
                 self.assertIn("| not run |", file.read())
 
+    def test_the_module_is_no_peer_of_itself(self):
+        def times(ours):
+            return {OURS: ours, page.IN_STEPS: ours / 9, f"{OURS}, METIS": ours / 2, "peer": 20.0}
+
+        run = run_of(*(record("a", f"of {n}", n, "total", times(s)) for n, s in ((10, 1.0), (100, 10.0))))
+        self.assertIn("| 1 (0) |", page.scaling_table(run))
+        self.assertNotIn(page.IN_STEPS, page.series(run, "a", "total"))
+
     @unittest.skipUnless(RESULTS, "no results were given")
     def test_a_run_makes_a_whole_page(self):
         run = Run([RESULTS])
