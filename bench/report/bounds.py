@@ -109,10 +109,11 @@ def of_total(run, r):
     peer, _ = r.best_peer()
     steps = r.facts.get("steps", {})
     ours, theirs = shares(steps.get(OURS), OUR_STEPS), shares(steps.get(peer), STEPS_OF_PEERS)
-    rest = None if ours["ordering"] is None else 1.0 - ours["ordering"] / 100.0
+    alone = product(ours["ordering"], 0.01)
+    rest = None if alone is None else 1.0 - alone
     return {**{f"share_{name}": share for name, share in ours.items()},
             **{f"peer_{name}": share for name, share in theirs.items()},
-            "without_ordering": quotient(r.ratio(), rest)}
+            "without_ordering": quotient(r.ratio(), rest), "ordering_alone": quotient(r.ratio(), alone)}
 
 
 def of_inverse(run, r):
@@ -158,7 +159,7 @@ COLUMNS = {
     "total": [
         ("ordering / symbolic / numeric / solve", lambda m: parts(m, [f"share_{name}" for name in OUR_STEPS])),
         ("fastest peer: analysis / numeric / solve", lambda m: parts(m, [f"peer_{name}" for name in STEPS_OF_PEERS])),
-        ("without the ordering", "without_ordering")],
+        ("without the ordering", "without_ordering"), ("the ordering alone", "ordering_alone")],
     "solve": [("of the copy rate", "of_copy"), ("GB/s", "gbytes"), ("with the places of x, GB/s", "touched"),
               ("GFLOP/s", "gflops")],
     "inverse": [("GFLOP/s", "gflops"), ("of dgemm", "of_dgemm"), ("entries of a row of U", "row")],

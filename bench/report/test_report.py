@@ -117,9 +117,11 @@ class Bounds(unittest.TestCase):
         run = bounded(record("c", "x", 9, "total", {OURS: 2.0, "fast": 3.0, "slow": 9.0}, steps=steps))
         numbers = numbers_of(run)
         self.assertAlmostEqual(numbers["without_ordering"], 1.5 / 0.4)
+        self.assertAlmostEqual(numbers["ordering_alone"], 1.5 / 0.6)
         self.assertEqual(dict(bounds.columns(run, run.results[0])), {
             "ordering / symbolic / numeric / solve": "60 / 10 / 20 / 10 %",
-            "fastest peer: analysis / numeric / solve": "50 / 25 / 25 %", "without the ordering": "3.75"})
+            "fastest peer: analysis / numeric / solve": "50 / 25 / 25 %", "without the ordering": "3.75",
+            "the ordering alone": "2.5"})
 
     def test_an_entry_takes_so_many_loads(self):
         numbers = numbers_of(bounded(record("e", "x", 9, "assembly", {OURS: 0.7, "std::map": 1.4}, "random order",
