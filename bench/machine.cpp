@@ -11,6 +11,7 @@
 #include <fstream>
 #include <set>
 
+#include "bench/harness/latency.hpp"
 #include "bench/peers/lapack.hpp"
 
 extern "C" char* openblas_get_config();
@@ -36,6 +37,16 @@ std::set<std::string> linear_algebra() {
     if (slash != std::string::npos && line.find("blas", slash) != std::string::npos) files.insert(line.substr(slash));
   }
   return files;
+}
+
+// By the bytes that are loaded from.
+Json latencies() {
+  Json list = Json::array();
+  for (const std::size_t megabytes : {1, 4, 16, 256}) {
+    const std::size_t bytes = megabytes << 20;
+    list.push_back({{"bytes", bytes}, {"seconds", dependent_load(bytes)}});
+  }
+  return list;
 }
 
 }  // namespace
@@ -65,7 +76,8 @@ Json describe_machine(const std::string& module_file, Clock clock) {
             {"clock", clock == Clock::cpu ? "cpu" : "wall"},
             {"load", load[0]},
             {"dgemm", rates.gemm},
-            {"copy", rates.copy}}}};
+            {"copy", rates.copy},
+            {"latency", latencies()}}}};
 }
 
 }  // namespace sm::bench

@@ -8,7 +8,7 @@
 
 namespace sm::bench {
 
-// Processor, libraries, compiler, load, and the rates of dgemm and of copying, measured now.
+// Processor, libraries, compiler, load, the rates of dgemm and of copying and the latencies of memory, measured now.
 Json describe_machine(const std::string& module_file, Clock clock);
 
 }  // namespace sm::bench

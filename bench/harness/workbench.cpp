@@ -2,6 +2,7 @@
 
 #include <fmt/format.h>
 
+#include <algorithm>
 #include <stdexcept>
 
 #include "bench/generators/random.hpp"
@@ -16,6 +17,15 @@ void enter(const SmFunctionTable& fn, SmMatrix* matrix, const Triplets& entries)
     status = assign(matrix, entries.row[k], entries.col[k], 1, entries.value[k]);
   }
   expect_ok(status, "entering an element");
+}
+
+double kept_subscripts(const SmMatrix& factor) {
+  std::int64_t end = 0;
+  for (std::int64_t k = 0; k < factor.rows; ++k) {
+    const std::int64_t length = factor.factor_iu[k + 1] - factor.factor_iu[k];
+    if (length > 0) end = std::max(end, factor.factor_iju[k] + length);
+  }
+  return static_cast<double>(end);
 }
 
 Workbench::Workbench(Module& module, Problem problem, Records& records, Forecast& forecast, int rounds)

@@ -56,4 +56,7 @@ class Workbench {
 // An open matrix with these contributions entered one by one.
 void enter(const SmFunctionTable& fn, SmMatrix* matrix, const Triplets& entries);
 
+// Subscripts that are kept of U: rows share the ends of theirs.
+double kept_subscripts(const SmMatrix& factor);
+
 }  // namespace sm::bench

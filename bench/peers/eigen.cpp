@@ -21,14 +21,27 @@ Lower lower_of(const UpperRows& rows) {
 
 Eigen::Map<const Vector> vector_of(const std::vector<double>& x, int n) { return {x.data(), n}; }
 
+using Solver = Eigen::SimplicialLDLT<Matrix, Eigen::Lower, Eigen::AMDOrdering<int>>;
+
 }  // namespace
 
 bool solve_by_eigen(const UpperRows& rows, const std::vector<double>& b, std::vector<double>& x) {
-  Eigen::SimplicialLDLT<Matrix, Eigen::Lower, Eigen::AMDOrdering<int>> solver;
+  Solver solver;
   solver.compute(lower_of(rows));
   if (solver.info() != Eigen::Success) return false;
   x.resize(b.size());
   Eigen::Map<Vector>(x.data(), rows.n) = solver.solve(vector_of(b, rows.n));
+  return true;
+}
+
+bool solve_by_eigen(const UpperRows& rows, const std::vector<double>& b, std::vector<double>& x, Steps& steps) {
+  Solver solver;
+  const auto a = lower_of(rows);
+  steps.time("analysis", [&] { solver.analyzePattern(a); });
+  steps.time("numeric", [&] { solver.factorize(a); });
+  if (solver.info() != Eigen::Success) return false;
+  x.resize(b.size());
+  steps.time("solve", [&] { Eigen::Map<Vector>(x.data(), rows.n) = solver.solve(vector_of(b, rows.n)); });
   return true;
 }
 

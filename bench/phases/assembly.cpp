@@ -54,7 +54,8 @@ void measure(Workbench& bench, const char* variant, const Triplets& entries) {
                               {"std::map", run_maps, [&] { return rows_fault(from_maps, bench.rows()); }},
                               {"Eigen setFromTriplets", [&] { return seconds_of([&] { eigen.run(); }); },
                                [&] { return eigen.fault(bench.rows()); }}});
-  const Json facts = {{"contributions", entries.size()}};
+  const double trees = static_cast<double>(sizeof(NonzeroNode)) * bench.rows().entries() + 8.0 * problem.n;
+  const Json facts = {{"contributions", entries.size()}, {"tree_bytes", trees}};
   bench.record("assembly", variant, outcomes, facts);
   bench.record("closing", variant, closings(outcomes, closing), facts);
 }

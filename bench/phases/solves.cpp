@@ -43,6 +43,18 @@ std::string block_fault(const UpperRows& rows, const double* x, const std::vecto
   return "";
 }
 
+// Vectors that one pass over the factor serves: kLanes of cholesky/substitution.hpp.
+constexpr int kVectorsAPass = 8;
+
+// What must move at least. A pass down and one up read values, subscripts, and where both begin; one of them the
+// diagonal; and each vector is read by its permutation and written.
+double least_bytes(const SmMatrix& factor, int count) {
+  const auto n = static_cast<double>(factor.rows);
+  const auto entries = static_cast<double>(factor.factor_iu[factor.rows]);
+  const int passes = (count + kVectorsAPass - 1) / kVectorsAPass;
+  return 8.0 * (passes * (2.0 * entries + 2.0 * kept_subscripts(factor) + 5.0 * n) + 3.0 * n * count);
+}
+
 }  // namespace
 
 void measure_solves(Workbench& bench) {
@@ -68,7 +80,10 @@ void measure_solves(Workbench& bench) {
     const double entries = static_cast<double>(ours->factor_iu[ours->rows]);
     bench.record("solve", fmt::format("{} right-hand side{}", count, count == 1 ? "" : "s"),
                  bench.race(fmt::format("solve{}", count), contestants),
-                 {{"factor_entries", entries}, {"count", count}});
+                 {{"factor_entries", entries},
+                  {"count", count},
+                  {"bytes", least_bytes(*ours, count)},
+                  {"flops", 4.0 * entries * count}});
   }
 }
 

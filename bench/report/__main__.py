@@ -8,7 +8,7 @@ import os
 import sys
 
 import document
-import page
+import reasons
 from results import Run
 
 
@@ -23,7 +23,7 @@ def main():
     if not run.machines:
         sys.exit("no results: the files describe no machine")
     os.makedirs(options.folder, exist_ok=True)
-    document.write(run, page.explanations(options.explanations), options.folder)
+    document.write(run, reasons.read(options.explanations), options.folder)
 
 
 if __name__ == "__main__":

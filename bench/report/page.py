@@ -1,5 +1,7 @@
 """The page: what was measured, against what it was to be."""
 
+import bounds
+import reasons as explained
 import text
 from results import OURS, definite, exponent
 from targets import TARGETS
@@ -12,42 +14,41 @@ FAMILIES = {
     "e": "squares of 5-point grids (13 points)",
     "f": "subjects with six coefficients, ten fixed effects",
 }
+IN_STEPS = f"{OURS}, in steps"  # the module once more, for the shares of its steps
 PHASES = [
-    ("assembly", "Assembly", "Every contribution entered by itself; Eigen takes them all at once."),
+    ("assembly", "Assembly",
+     "Every contribution entered by itself; Eigen takes them all at once. A load is one whose address the load "
+     "before gave, over a memory as large as the trees."),
     ("closing", "Closing", "From trees, or from the maps, to compressed rows."),
-    ("ordering", "Ordering", "Minimum degree here and in AMD, nested dissection in METIS, which is given its graph."),
+    ("ordering", "Ordering",
+     "Minimum degree here and in AMD, nested dissection in METIS, which is given its graph. The time of an entry "
+     "beside that of a dependent load over a memory as large as the graph, both triangles."),
     ("symbolic", "Symbolic factorization",
      "The module's own permutation given to all. CHOLMOD's simplicial analysis counts but leaves the subscripts to the "
-     "numeric phase; the supernodal one makes them and is the peer here."),
+     "numeric phase; the supernodal one makes them and is the peer here. Bytes: an entry of A read and written, 32, "
+     "the subscripts of U and four words a row."),
     ("numeric", "Numeric factorization",
      "The module's own permutation given to all. Everybody allocates anew in each run; the module's host, as the C "
-     "library for the peers, keeps pages of moderate size from the run before."),
+     "library for the peers, keeps pages of moderate size from the run before. Bytes: "
+     "16 for each entry of U, written and read, and 16 for each of A; the nearest bound is the larger share."),
     ("total", "Order, factor and solve",
-     "From a closed matrix to one solution, everybody with orderings of their own."),
-    ("solve", "Solves", "With a factor that is there."),
+     "From a closed matrix to one solution, everybody with orderings of their own. The steps of the module are timed "
+     "in runs of their own; without the ordering: the ratio if it took no time at all; the ordering alone: if nothing "
+     "else took any."),
+    ("solve", "Solves", "With a factor that is there. Bytes: in a pass over the factor, eight vectors at "
+     "most, the values and the kept subscripts of U twice and five words a row, and three words a row for each "
+     "vector. The places of x in the caches: three words an entry of U for each vector."),
     ("inverse", "Diagonal of the inverse",
-     "Beside a column by column Takahashi on CHOLMOD's factor, in the same order."),
+     "Beside a column by column Takahashi on CHOLMOD's factor, in the same order. Operations: "
+     "twice those of the factorization."),
     ("trace", "Trace of an inverse product", "tr(A⁻B), B on the pattern of A."),
-    ("refactor", "Refactor loop", "New values on the same pattern."),
+    ("refactor", "Refactor loop", "New values on the same pattern. Refilling moves 24 bytes an entry."),
     ("product", "Symmetric product", "From one stored triangle. Bytes: 16 for each entry, and the vectors."),
-    ("iteration", "Conjugate gradients", "Time of a step; one stored triangle, diagonal preconditioner."),
+    ("iteration", "Conjugate gradients", "Time of a step; one stored triangle, diagonal preconditioner. Bytes: those "
+     "of the product, and nine words a row."),
     ("dense factor", "Dense factor", "Packed here, full for dpotrf, packed for dpptrf."),
     ("dense inverse", "Dense inverse", "Packed here, full for LAPACK."),
 ]
-
-
-def explanations(file):
-    """Why targets are missed: lines "phase family: reason"."""
-    reasons = {}
-    try:
-        with open(file, encoding="utf-8") as lines:
-            for line in lines:
-                key, colon, reason = line.strip().partition(": ")
-                if colon and not line.startswith("#"):
-                    reasons[key] = reason
-    except FileNotFoundError:
-        pass
-    return reasons
 
 
 def conditions(run):
@@ -62,10 +63,16 @@ def conditions(run):
         ["OpenBLAS kernels", m["kernels"]],
         ["dgemm, order 2000", f"{m['dgemm'] / 1e9:.1f} GFLOP/s"],
         ["copy, read and written", f"{m['copy'] / 1e9:.1f} GB/s"],
+        ["a dependent load", latencies(m)],
         ["load when the run began", f"{m['load']:.1f} (one minute)"],
         ["clock", clock],
     ]
     return text.table(["", ""], rows, left=2)
+
+
+def latencies(machine):
+    points = [f"{p['seconds'] * 1e9:.0f} ns over {p['bytes'] / 2**20:.0f} MB" for p in machine.get("latency", [])]
+    return ", ".join(points) or "–"
 
 
 def disturbed(run):
@@ -116,25 +123,14 @@ def misses(run, reasons):
         missed = [v for v in target.judge(run) if v.known and not v.met]
         for family in sorted({v.result.family for v in missed}):
             worst = max((v for v in missed if v.result.family == family), key=lambda v: v.shortfall)
-            reason = reasons.get(f"{target.phase} {family}", "not explained yet")
             lines.append(f"- {target.phase}, {family} ({worst.result.case}), {target.text}: {shown(worst, target)}. "
-                         f"{reason[0].upper()}{reason[1:]}.")
+                         + explained.sentence(run, worst.result, reasons))
     return "\n".join(lines) + "\n" if lines else "None.\n"
 
 
-def extra(run, r):
-    """A column of its own for some phases: heading and value."""
-    ours = r.ours()
-    if r.phase == "assembly":
-        return "million/s", text.number(r.facts["contributions"] / ours / 1e6) if ours else "–"
-    if r.phase == "ordering":
-        fill = {k: v["flops"] for k, v in r.facts.get("fill", {}).items()}
-        return "Gflop of the factor: " + ", ".join(fill), ", ".join(text.number(f / 1e9) for f in fill.values())
-    if r.phase == "numeric":
-        return "GFLOP/s", text.number(r.facts["flops"] / ours / 1e9) if ours else "–"
-    if r.phase == "product":
-        return "of the copy rate", text.number(r.facts["bytes"] / ours / run.machine["copy"]) if ours else "–"
-    return None
+def headings(rows):
+    """Every heading once, in the order of their columns."""
+    return list(dict.fromkeys(head for row in rows for head, _ in row))
 
 
 def phase_table(run, phase):
@@ -144,19 +140,16 @@ def phase_table(run, phase):
         names += [n for n in r.times if n not in names]
     names.sort(key=lambda name: not name.startswith(OURS))
     variants = any(r.variant for r in results)
+    added = [bounds.columns(run, r) for r in results]
     head = ["family", "case"] + (["variant"] if variants else []) + ["n", "entries"] + names
-    head.append("faster than the best by")
-    rows, added = [], None
-    for r in results:
+    head += ["faster than the best by"] + headings(added)
+    rows = []
+    for r, own in zip(results, added):
         peers = ("CHOLMOD supernodal",) if phase == "symbolic" else ("std::map",) if phase == "assembly" else None
         row = [r.family, r.case] + ([r.variant] if variants else []) + [text.count(r.n), text.count(r.entries)]
         row += [text.time_of(r, name) for name in names] + [text.number(r.ratio(peers))]
-        column = extra(run, r)
-        if column:
-            added = added or column[0]
-            row.append(column[1])
-        rows.append(row)
-    return text.table(head + ([added] if added else []), rows, left=3 if variants else 2)
+        rows.append(row + [dict(own).get(name, "–") for name in headings(added)])
+    return text.table(head, rows, left=3 if variants else 2)
 
 
 def wrong_results(run):
@@ -198,7 +191,7 @@ def series(run, family, phase, variant=""):
         if not definite(r):
             continue
         for name in r.times:
-            if r.seconds(name):
+            if r.seconds(name) and name != IN_STEPS:
                 lines.setdefault(name, []).append((r.n, r.seconds(name)))
     return lines
 
@@ -216,7 +209,7 @@ def scaling_table(run):
             ours = exponent(lines.get(OURS, []))
             best = {}
             for name, points in lines.items():
-                for n, s in points if name != OURS else []:
+                for n, s in points if not name.startswith(OURS) else []:
                     best[n] = min(s, best.get(n, s))
             row.append(f"{text.number(ours)} ({text.number(exponent(best.items()))})")
         rows.append(row)

@@ -7,8 +7,10 @@ import tempfile
 import unittest
 import xml.etree.ElementTree as xml
 
+import bounds
 import document
 import page
+import reasons
 from results import OURS, Run, exponent
 from targets import TARGETS, Verdict, between
 
@@ -84,6 +86,123 @@ class Judging(unittest.TestCase):
         self.assertIsNone(exponent([(10, 2.0), (10, 3.0)]))
 
 
+def bounded(*records, latency=((2**20, 10e-9), (2**24, 140e-9), (2**28, 180e-9)), dgemm=100e9, copy=20e9):
+    """A run on a machine whose rates are easy to reckon with."""
+    run = run_of(*records)
+    run.machine.update(dgemm=dgemm, copy=copy, latency=[{"bytes": b, "seconds": s} for b, s in latency])
+    return run
+
+
+def numbers_of(run):
+    return bounds.measured(run, run.results[-1])
+
+
+class Bounds(unittest.TestCase):
+    def test_latency_lies_between_the_sizes_that_were_measured(self):
+        run = bounded()
+        self.assertEqual([bounds.latency(run, size) for size in (1, 2**20, 2**24, 2**30)],
+                         [10e-9, 10e-9, 140e-9, 180e-9])
+        self.assertAlmostEqual(bounds.latency(run, 2**22), 75e-9)
+        self.assertIsNone(bounds.latency(run_of(), 2**22))
+
+    def test_the_nearest_bound_is_the_larger_share(self):
+        numbers = numbers_of(bounded(record("d", "x", 9, "numeric", {OURS: 1.0}, flops=10e9, bytes=8e9)))
+        self.assertEqual((numbers["of_dgemm"], numbers["of_copy"], numbers["bound"]), (0.1, 0.4, "copying"))
+        numbers = numbers_of(bounded(record("b", "x", 9, "numeric", {OURS: 1.0}, flops=70e9, bytes=8e9)))
+        self.assertEqual((numbers["nearest"], numbers["bound"]), (0.7, "dgemm"))
+
+    def test_without_the_ordering_the_other_steps_decide(self):
+        steps = {OURS: {"ordering": 0.6, "symbolic": 0.1, "numeric": 0.2, "solve": 0.1},
+                 "fast": {"analysis": 1.0, "numeric": 0.5, "solve": 0.5}}
+        run = bounded(record("c", "x", 9, "total", {OURS: 2.0, "fast": 3.0, "slow": 9.0}, steps=steps))
+        numbers = numbers_of(run)
+        self.assertAlmostEqual(numbers["without_ordering"], 1.5 / 0.4)
+        self.assertAlmostEqual(numbers["ordering_alone"], 1.5 / 0.6)
+        self.assertEqual(dict(bounds.columns(run, run.results[0])), {
+            "ordering / symbolic / numeric / solve": "60 / 10 / 20 / 10 %",
+            "fastest peer: analysis / numeric / solve": "50 / 25 / 25 %", "without the ordering": "3.75",
+            "the ordering alone": "2.5"})
+
+    def test_an_entry_takes_so_many_loads(self):
+        numbers = numbers_of(bounded(record("e", "x", 9, "assembly", {OURS: 0.7, "std::map": 1.4}, "random order",
+                                            contributions=10**6, tree_bytes=2**24)))
+        self.assertAlmostEqual(numbers["loads"], 5.0)
+        self.assertAlmostEqual(numbers["map_ns"], 1400.0)
+        natural = numbers_of(bounded(record("e", "x", 9, "assembly", {OURS: 0.7}, "natural order",
+                                            contributions=10**6, tree_bytes=2**24)))
+        self.assertAlmostEqual(natural["ns"], 700.0)
+        self.assertIsNone(natural["loads"])
+
+    def test_the_inverse_takes_twice_the_operations_of_the_factor(self):
+        run = bounded(record("a", "x", 9, "numeric", {OURS: 1.0}, flops=10e9),
+                      record("a", "x", 9, "inverse", {OURS: 0.5}))
+        self.assertAlmostEqual(numbers_of(run)["gflops"], 40.0)
+
+    def test_a_solve_touches_its_vectors_at_every_entry(self):
+        numbers = numbers_of(bounded(record("a", "x", 10**6, "solve", {OURS: 0.5}, factor_entries=10**7, count=2,
+                                            bytes=2e9, flops=8e7)))
+        self.assertAlmostEqual(numbers["of_copy"], 0.2)
+        self.assertAlmostEqual(numbers["touched"], (2.0 + 0.48) / 0.5)
+        self.assertAlmostEqual(numbers["row"], 10.0)
+
+    def test_refilling_is_judged_by_what_it_moves(self):
+        numbers = numbers_of(bounded(record("f", "x", 9, "refactor", {OURS: 0.4}, refilling=0.1, refill_bytes=1e9)))
+        self.assertAlmostEqual(numbers["of_copy"], 0.5)
+        self.assertAlmostEqual(numbers["share_refill"], 25.0)
+
+    def test_records_without_the_facts_have_dashes(self):
+        for phase in bounds.MEASURED:
+            run = run_of(record("d", "x", 100, phase, {OURS: 1.0, "peer": 1.2}, contributions=5))
+            table = page.phase_table(run, phase)
+            for head, _ in bounds.COLUMNS[phase]:
+                self.assertIn(head, table)
+            self.assertIn("–", table)
+
+
+class Reasons(unittest.TestCase):
+    EXPLANATIONS = reasons.read(os.path.join(os.path.dirname(os.path.abspath(__file__)), "explanations.txt"))
+
+    def test_numbers_are_filled_in_and_missing_ones_are_dashes(self):
+        numbers = {"of_copy": 0.456, "peer": "p", "loads": None}
+        words = reasons.filled("{of_copy:.2f} of {peer}, {loads:.1f} loads", numbers)
+        self.assertEqual(words, "0.46 of p, – loads")
+
+    def test_the_family_comes_before_all_and_the_variant_before_the_phase(self):
+        (result,) = run_of(record("a", "x", 1, "solve", {OURS: 1.0}, "one")).results
+        known = {"solve *": "1", "solve *, one": "2", "solve a": "3", "solve a, one": "4"}
+        for key in sorted(known, key=known.get, reverse=True):
+            self.assertEqual(reasons.of(result, known), known.pop(key))
+        self.assertIsNone(reasons.of(result, known))
+
+    def test_a_reason_names_numbers_that_its_phase_has(self):
+        self.assertTrue(self.EXPLANATIONS)
+        for key, reason in self.EXPLANATIONS.items():
+            phase = key.partition(",")[0].rpartition(" ")[0]
+            known = numbers_of(run_of(record("d", "x", 100, phase, {OURS: 1.0})))
+            self.assertTrue(reasons.names(reason), f"{key} rests on no number")
+            self.assertLessEqual(set(reasons.names(reason)), set(known), key)
+
+    def test_every_phase_with_a_target_that_is_a_speed_has_a_reason(self):
+        for target in TARGETS:
+            if target.phase not in bounds.MEASURED:
+                continue
+            for family in target.families:
+                orders = [record(family, "x", 1, target.phase, {OURS: 1.0}, f"{v} order")
+                          for v in ("natural", "random")]
+                for result in run_of(*orders).results:
+                    self.assertIsNotNone(reasons.of(result, self.EXPLANATIONS), (target.phase, family))
+
+    @unittest.skipUnless(RESULTS, "no results were given")
+    def test_a_run_has_every_number_of_its_reasons(self):
+        run = Run([RESULTS])
+        judged = [v.result for t in TARGETS for v in t.judge(run) if v.known]
+        for result in judged:
+            reason = reasons.of(result, self.EXPLANATIONS)
+            known = bounds.measured(run, result)
+            for name in reasons.names(reason or ""):
+                self.assertIsNotNone(known[name], (result.phase, result.family, result.case, name))
+
+
 class Page(unittest.TestCase):
     def test_every_miss_is_listed_with_its_reason(self):
         run = run_of(record("e", "x", 100, "numeric", {OURS: 1.0, "peer": 1.2}))
@@ -110,6 +229,14 @@ class Page(unittest.TestCase):
             document.write(run, {}, folder)
             with open(os.path.join(folder, "performance.md"), encoding="utf-8") as file:
                 self.assertIn("| not run |", file.read())
+
+    def test_the_module_is_no_peer_of_itself(self):
+        def times(ours):
+            return {OURS: ours, page.IN_STEPS: ours / 9, f"{OURS}, METIS": ours / 2, "peer": 20.0}
+
+        run = run_of(*(record("a", f"of {n}", n, "total", times(s)) for n, s in ((10, 1.0), (100, 10.0))))
+        self.assertIn("| 1 (0) |", page.scaling_table(run))
+        self.assertNotIn(page.IN_STEPS, page.series(run, "a", "total"))
 
     @unittest.skipUnless(RESULTS, "no results were given")
     def test_a_run_makes_a_whole_page(self):

@@ -6,6 +6,8 @@
 
 #include "bench/cases.hpp"
 #include "bench/generators/generators.hpp"
+#include "bench/harness/latency.hpp"
+#include "bench/harness/steps.hpp"
 #include "bench/harness/workbench.hpp"
 #include "bench/phases/phases.hpp"
 
@@ -52,6 +54,57 @@ TEST(Race, the_median_of_an_even_number_is_between_the_two) {
   Outcome outcome;
   outcome.seconds = {4.0, 1.0, 3.0, 2.0};
   EXPECT_EQ(outcome.median(), 2.5);
+}
+
+TEST(Steps, each_has_the_median_of_its_runs_in_the_order_of_the_first) {
+  Steps steps;
+  const auto nothing = [] {};
+  const double late = steps.time("z", nothing);
+  double volatile sum = 0.0;  // volatile: it is work
+  const double early = steps.time("a", [&] {
+    for (int k = 0; k < 100000; ++k) sum = sum + 1.0;
+  });
+  const Json medians = steps.medians();
+  EXPECT_EQ(medians.dump(), (Json{{"z", late}, {"a", early}}).dump());
+  EXPECT_GT(early, 0.0);
+  const double second = steps.time("a", nothing);
+  EXPECT_EQ(steps.medians()["a"].get<double>(), 0.5 * (early + second));
+}
+
+TEST(Latency, the_chase_comes_by_every_place_before_it_is_back) {
+  for (const std::uint32_t count : {1u, 2u, 3u, 1000u}) {
+    const std::vector<std::uint32_t> next = random_cycle(count);
+    std::uint32_t at = 0, steps = 0;
+    do {
+      at = next[at];
+      ++steps;
+    } while (at != 0 && steps <= count);
+    EXPECT_EQ(steps, count);
+  }
+}
+
+TEST(Latency, a_load_takes_time) {
+  const double seconds = dependent_load(std::size_t{1} << 20);
+  EXPECT_GT(seconds, 1e-10);
+  EXPECT_LT(seconds, 1e-5);
+}
+
+TEST(Workbench, rows_that_share_the_end_of_their_subscripts_keep_it_once) {
+  const std::string file = testing::TempDir() + "bench_subscripts.jsonl";
+  Module module;
+  Records records(file);
+  Forecast forecast(60.0);
+  Problem apart{.family = "x", .name = "apart", .n = 4, .rank = 4, .upper = {}, .rhs = {}};
+  for (int i = 0; i < 4; ++i) apart.upper.add(i, i, 9.0);
+  // All joined: the first row's subscripts hold those of the others.
+  Problem joined = apart;
+  for (int i = 0; i < 4; ++i) {
+    for (int j = i + 1; j < 4; ++j) joined.upper.add(i, j, -1.0);
+  }
+  Workbench none(module, apart, records, forecast, 1), all(module, joined, records, forecast, 1);
+  EXPECT_EQ(kept_subscripts(*none.factored()), 0.0);
+  EXPECT_EQ(kept_subscripts(*all.factored()), 3.0);
+  std::remove(file.c_str());
 }
 
 TEST(Checks, a_wrong_solution_is_a_fault_and_so_is_a_nan) {

@@ -1,0 +1,45 @@
+#include "bench/harness/latency.hpp"
+
+#include <algorithm>
+#include <numeric>
+
+#include "bench/generators/random.hpp"
+#include "bench/harness/clock.hpp"
+
+namespace sm::bench {
+namespace {
+
+struct alignas(64) Line {
+  const Line* next = nullptr;
+};
+
+// `loads` of them, one after the other; where they end.
+const Line* chase(const Line* line, std::size_t loads) {
+  for (std::size_t k = 0; k < loads; ++k) line = line->next;
+  return line;
+}
+
+}  // namespace
+
+// Sattolo, "An algorithm to generate a random cyclic permutation", Information Processing Letters 22, 1986.
+std::vector<std::uint32_t> random_cycle(std::uint32_t count) {
+  std::vector<std::uint32_t> next(count);
+  std::iota(next.begin(), next.end(), 0u);
+  Random random(17);
+  for (std::uint32_t k = count; k-- > 1;) std::swap(next[k], next[random.bits() % k]);
+  return next;
+}
+
+double dependent_load(std::size_t bytes) {
+  constexpr std::size_t kLoads = std::size_t{1} << 20;
+  constexpr int kTimes = 5;
+  const std::vector<std::uint32_t> next = random_cycle(static_cast<std::uint32_t>(bytes / sizeof(Line)));
+  std::vector<Line> lines(next.size());
+  for (std::size_t k = 0; k < next.size(); ++k) lines[k].next = &lines[next[k]];
+  const Line* volatile at = chase(lines.data(), std::min(kLoads, lines.size()));  // volatile: the chase is not left out
+  double least = 1e300;
+  for (int k = 0; k < kTimes; ++k) least = std::min(least, seconds_of([&] { at = chase(at, kLoads); }));
+  return least / static_cast<double>(kLoads);
+}
+
+}  // namespace sm::bench
