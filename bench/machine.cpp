@@ -77,7 +77,8 @@ Json describe_machine(const std::string& module_file, Clock clock) {
             {"load", load[0]},
             {"dgemm", rates.gemm},
             {"copy", rates.copy},
-            {"latency", latencies()}}}};
+            {"latency", latencies()},
+            {"scattered", scattered_addition(std::size_t{1} << 18)}}}};
 }
 
 }  // namespace sm::bench

@@ -19,6 +19,14 @@ const Line* chase(const Line* line, std::size_t loads) {
   return line;
 }
 
+constexpr std::size_t kRun = 8;
+
+// Not in vectors: no processor stores to many places at a time faster than to one after the other.
+__attribute__((noinline, optimize("no-tree-vectorize"))) void add_run(double* y, const std::int64_t* place,
+                                                                       const double* x, double a) {
+  for (std::size_t k = 0; k < kRun; ++k) y[place[k]] += a * x[k];
+}
+
 }  // namespace
 
 // Sattolo, "An algorithm to generate a random cyclic permutation", Information Processing Letters 22, 1986.
@@ -40,6 +48,25 @@ double dependent_load(std::size_t bytes) {
   double least = 1e300;
   for (int k = 0; k < kTimes; ++k) least = std::min(least, seconds_of([&] { at = chase(at, kLoads); }));
   return least / static_cast<double>(kLoads);
+}
+
+double scattered_addition(std::size_t bytes) {
+  constexpr std::size_t kAdditions = std::size_t{1} << 20;
+  constexpr int kTimes = 5;
+  std::vector<double> y(bytes / sizeof(double));
+  std::vector<std::int64_t> place(std::size_t{1} << 14);
+  Random random(23);
+  for (auto& p : place) p = static_cast<std::int64_t>(random.bits() % y.size());
+  for (auto run = place.begin(); run != place.end(); run += kRun) std::sort(run, run + kRun);
+  const std::vector<double> x(place.size(), 1.0);
+  const auto pass = [&] {
+    for (std::size_t done = 0; done < kAdditions; done += place.size()) {
+      for (std::size_t k = 0; k < place.size(); k += kRun) add_run(y.data(), &place[k], &x[k], 0.5);
+    }
+  };
+  double least = 1e300;
+  for (int k = 0; k < kTimes; ++k) least = std::min(least, seconds_of(pass));
+  return least / static_cast<double>(kAdditions);
 }
 
 }  // namespace sm::bench

@@ -83,7 +83,9 @@ def row_length(numeric):
 
 
 def of_numeric(run, r):
-    return {"row": row_length(r), **rates(run, r, r.facts.get("flops"), r.facts.get("bytes"))}
+    numbers = rates(run, r, r.facts.get("flops"), r.facts.get("bytes"))
+    return {"row": row_length(r), "each_ns": quotient(2.0, numbers["gflops"]),
+            "scattered_ns": product(run.machine.get("scattered"), 1e9), **numbers}
 
 
 def of_solve(run, r):
@@ -154,7 +156,7 @@ COLUMNS = {
     "symbolic": [("ns an entry", "ns"), ("loads of memory an entry", "loads"), ("of the copy rate", "of_copy")],
     "numeric": [
         ("GFLOP/s", "gflops"), ("of dgemm", "of_dgemm"), ("of the copy rate", "of_copy"),
-        ("entries of a row of U", "row"),
+        ("ns a multiply-add", "each_ns"), ("entries of a row of U", "row"),
         ("nearest bound", lambda m: f"{m['bound']}, {m['nearest']:.2f}" if m["bound"] else "–")],
     "total": [
         ("ordering / symbolic / numeric / solve", lambda m: parts(m, [f"share_{name}" for name in OUR_STEPS])),

@@ -64,6 +64,7 @@ def conditions(run):
         ["dgemm, order 2000", f"{m['dgemm'] / 1e9:.1f} GFLOP/s"],
         ["copy, read and written", f"{m['copy'] / 1e9:.1f} GB/s"],
         ["a dependent load", latencies(m)],
+        ["an addition to a scattered place", f"{m['scattered'] * 1e9:.2f} ns within 256 kB" if "scattered" in m else "–"],
         ["load when the run began", f"{m['load']:.1f} (one minute)"],
         ["clock", clock],
     ]

@@ -89,7 +89,8 @@ class Judging(unittest.TestCase):
 def bounded(*records, latency=((2**20, 10e-9), (2**24, 140e-9), (2**28, 180e-9)), dgemm=100e9, copy=20e9):
     """A run on a machine whose rates are easy to reckon with."""
     run = run_of(*records)
-    run.machine.update(dgemm=dgemm, copy=copy, latency=[{"bytes": b, "seconds": s} for b, s in latency])
+    run.machine.update(dgemm=dgemm, copy=copy, latency=[{"bytes": b, "seconds": s} for b, s in latency],
+                       scattered=0.5e-9)
     return run
 
 
@@ -110,6 +111,10 @@ class Bounds(unittest.TestCase):
         self.assertEqual((numbers["of_dgemm"], numbers["of_copy"], numbers["bound"]), (0.1, 0.4, "copying"))
         numbers = numbers_of(bounded(record("b", "x", 9, "numeric", {OURS: 1.0}, flops=70e9, bytes=8e9)))
         self.assertEqual((numbers["nearest"], numbers["bound"]), (0.7, "dgemm"))
+
+    def test_a_multiply_add_stands_beside_a_scattered_addition(self):
+        numbers = numbers_of(bounded(record("d", "x", 9, "numeric", {OURS: 2.0}, flops=8e9, bytes=1e9)))
+        self.assertEqual((numbers["each_ns"], numbers["scattered_ns"]), (0.5, 0.5))
 
     def test_without_the_ordering_the_other_steps_decide(self):
         steps = {OURS: {"ordering": 0.6, "symbolic": 0.1, "numeric": 0.2, "solve": 0.1},

@@ -89,6 +89,12 @@ TEST(Latency, a_load_takes_time) {
   EXPECT_LT(seconds, 1e-5);
 }
 
+TEST(Latency, an_addition_to_a_scattered_place_takes_time) {
+  const double seconds = scattered_addition(std::size_t{1} << 18);
+  EXPECT_GT(seconds, 1e-11);
+  EXPECT_LT(seconds, 1e-6);
+}
+
 TEST(Workbench, rows_that_share_the_end_of_their_subscripts_keep_it_once) {
   const std::string file = testing::TempDir() + "bench_subscripts.jsonl";
   Module module;
