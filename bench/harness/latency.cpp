@@ -23,7 +23,7 @@ constexpr std::size_t kRun = 8;
 
 // Not in vectors: no processor stores to many places at a time faster than to one after the other.
 __attribute__((noinline, optimize("no-tree-vectorize"))) void add_run(double* y, const std::int64_t* place,
-                                                                       const double* x, double a) {
+                                                                      const double* x, double a) {
   for (std::size_t k = 0; k < kRun; ++k) y[place[k]] += a * x[k];
 }
 
