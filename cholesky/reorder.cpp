@@ -17,13 +17,12 @@ bool has_workspace(const SmMatrix& m, i64 words) { return m.work && m.work_capac
 void find_owners(SmMatrix& m, i64* counts, i64* owner) {
   std::fill_n(counts, m.rows, 0);
   for (i64 i = 0; i < m.rows; ++i) {
+    const i64 place = m.inv_perm[i];
     for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
       const i64 j = m.col_index[p];
-      owner[p] = i;
-      if (m.inv_perm[j] < m.inv_perm[i]) {
-        m.col_index[p] = i;
-        owner[p] = j;
-      }
+      const i64 exchange = m.inv_perm[j] < place ? i ^ j : 0;  // no jump: which comes first cannot be foretold
+      owner[p] = i ^ exchange;
+      m.col_index[p] = j ^ exchange;
       ++counts[owner[p]];
     }
   }
@@ -64,24 +63,6 @@ void permute_entries(SmMatrix& m, i64* target) {
   }
 }
 
-// Through copies where the workspace has room for them: along cycles each entry waits for the memory of the one before.
-void move_entries(SmMatrix& m, i64* ends, i64* owner) {
-  const i64 used = m.rows + m.nnz;
-  if (!has_workspace(m, used + 2 * m.nnz)) {
-    for_each_target(m, ends, owner, [&](i64 p, i64 target) { owner[p] = target; });
-    permute_entries(m, owner);
-    return;
-  }
-  i64* column = m.work + used;
-  auto* value = reinterpret_cast<double*>(column + m.nnz);
-  for_each_target(m, ends, owner, [&](i64 p, i64 target) {
-    column[target] = m.col_index[p];
-    value[target] = m.nz_values[p];
-  });
-  std::copy_n(column, m.nnz, m.col_index);
-  std::copy_n(value, m.nnz, m.nz_values);
-}
-
 Gate may_reorder(const SmMatrix& m) {
   SM_STOP_IF(m.nnz < 1, SM_OK);
   SM_STOP_IF(m.state >= SM_STATE_REORDERED, SM_OK);
@@ -105,16 +86,42 @@ void for_each_entry(const SmMatrix& m, auto&& visit) {
   }
 }
 
-}  // namespace
+struct Entry {
+  i64 column;
+  double value;
+};
 
-SmStatus reorder(SmMatrix& m) {
-  SM_PASS(may_reorder(m));
-  give_back(m.pool, m.factor_reserved);  // the places that a refill found in an earlier order
+// Through copies where the workspace has room for them: along cycles each entry waits for the memory of the one before.
+void move_entries(SmMatrix& m, i64* ends, i64* owner) {
+  const i64 used = m.rows + m.nnz;
+  if (!has_workspace(m, used + 2 * m.nnz)) {
+    for_each_target(m, ends, owner, [&](i64 p, i64 target) { owner[p] = target; });
+    permute_entries(m, owner);
+    return;
+  }
+  auto* entries = reinterpret_cast<Entry*>(m.work + used);
+  for_each_target(m, ends, owner, [&](i64 p, i64 target) { entries[target] = {m.col_index[p], m.nz_values[p]}; });
+  for (i64 p = 0; p < m.nnz; ++p) {
+    m.col_index[p] = entries[p].column;
+    m.nz_values[p] = entries[p].value;
+  }
+}
+
+// Whatever the rows look like.
+void reorder_by_owners(SmMatrix& m) {
   i64* counts = m.work;
   i64* owner = m.work + m.rows;
   find_owners(m, counts, owner);
   move_row_starts(m, counts);
   move_entries(m, counts, owner);
+}
+
+}  // namespace
+
+SmStatus reorder(SmMatrix& m) {
+  SM_PASS(may_reorder(m));
+  give_back(m.pool, m.factor_reserved);  // the places that a refill found in an earlier order
+  if (!reorder_border(m)) reorder_by_owners(m);
   m.state = SM_STATE_REORDERED;
   return SM_OK;
 }
