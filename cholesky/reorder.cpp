@@ -20,7 +20,8 @@ void find_owners(SmMatrix& m, i64* counts, i64* owner) {
     const i64 place = m.inv_perm[i];
     for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
       const i64 j = m.col_index[p];
-      const i64 exchange = m.inv_perm[j] < place ? i ^ j : 0;  // no jump: which comes first cannot be foretold
+      // No jump, since which comes first cannot be foretold: the sign of the difference makes a mask.
+      const i64 exchange = (i ^ j) & ((m.inv_perm[j] - place) >> 63);
       owner[p] = i ^ exchange;
       m.col_index[p] = j ^ exchange;
       ++counts[owner[p]];
