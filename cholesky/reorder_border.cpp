@@ -19,6 +19,7 @@ namespace {
 constexpr i64 kColumns = 256;  // of the rows walked side by side, at a time
 constexpr i64 kSideBySide = 16;
 constexpr i64 kShare = 8;  // a long row has an eighth of all columns, or more
+constexpr i64 kFew = 16;   // of that many rows, one is long: a matrix with more of them is nearly full
 
 struct Moved {
   i64 column;
@@ -38,7 +39,7 @@ class MovedEntries {
   explicit MovedEntries(SmMatrix& m)
       : m_(m), n_(m.rows), next_(m.work), kept_end_(m.work + n_), moved_(reinterpret_cast<Moved*>(m.work + 2 * n_)) {}
 
-  // Whether most entries are in long rows that stand together.
+  // Whether a good part of all entries is in a few long rows that stand together.
   bool has_border() const;
   // False when the rows are not as closing leaves them, or what moves has no room.
   bool count();
@@ -124,11 +125,14 @@ bool MovedEntries::is_full(const Block& block) const {
 }
 
 bool MovedEntries::has_border() const {
+  i64 rows = 0;
   i64 entries = 0;
   for (i64 i = 0; i + 1 < n_; ++i) {
-    if (is_long(i) && is_long(i + 1)) entries += m_.row_start[i + 1] - m_.row_start[i];
+    if (!is_long(i) || !is_long(i + 1)) continue;
+    ++rows;
+    entries += m_.row_start[i + 1] - m_.row_start[i];
   }
-  return entries > m_.nnz / 3;
+  return rows <= n_ / kFew && entries > m_.nnz / 3;
 }
 
 bool MovedEntries::count() {
