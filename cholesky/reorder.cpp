@@ -13,27 +13,35 @@ namespace sm {
 
 namespace {
 
+constexpr i64 kLongRow = 64;
+
 bool has_workspace(const SmMatrix& m, i64 words) { return m.work && m.work_capacity >= words; }
 
-// Gives every entry to the row of whichever index comes first in the order; owner[p] and counts get the result.
+// Gives every entry to the row of whichever index comes first in the order; owner[p] and counts get the result. In a
+// short row, which comes first cannot be foretold, so there is no jump: the sign of a difference makes a mask.
 template <class Index>
 void find_owners(SmMatrix& m, Index* counts, Index* owner) {
   std::fill_n(counts, m.rows, Index{0});
   for (i64 i = 0; i < m.rows; ++i) {
     const i64 place = m.inv_perm[i];
     const i64 end = m.row_start[i + 1];
-    i64 kept = 0;
+    const bool is_short = end - m.row_start[i] < kLongRow;
     for (i64 p = m.row_start[i]; p < end; ++p) {
       const i64 j = m.col_index[p];
-      // No jump, since which comes first cannot be foretold: the sign of the difference makes a mask.
-      const i64 moves = (m.inv_perm[j] - place) >> 63;
-      const i64 exchange = (i ^ j) & moves;
-      owner[p] = static_cast<Index>(i ^ exchange);
-      m.col_index[p] = j ^ exchange;
-      counts[j] -= static_cast<Index>(moves);
-      kept += 1 + moves;
+      if (is_short) {
+        const i64 exchange = (i ^ j) & ((m.inv_perm[j] - place) >> 63);
+        owner[p] = static_cast<Index>(i ^ exchange);
+        m.col_index[p] = j ^ exchange;
+        ++counts[i ^ exchange];
+      } else if (m.inv_perm[j] < place) {
+        owner[p] = static_cast<Index>(j);
+        m.col_index[p] = i;
+        ++counts[j];
+      } else {
+        owner[p] = static_cast<Index>(i);
+        ++counts[i];
+      }
     }
-    counts[i] += static_cast<Index>(kept);
   }
 }
 
