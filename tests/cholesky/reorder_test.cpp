@@ -78,11 +78,11 @@ void expect_moved(SmMatrix* m, const std::string& what) {
 Problem bordered(Random& random, std::int64_t rows, std::int64_t percent, bool apart) {
   const std::int64_t first = apart ? 2 * rows : rows;
   Graph g{first + 700 + random.below(600), {}};
-  for (std::int64_t i = 0; i < g.n; ++i)
-    for (std::int64_t j = i + 1; j < g.n; ++j) {
-      const bool in_block = i >= first && (i - first) / 4 == (j - first) / 4;
-      if (i < rows ? random.chance(percent) : in_block) g.edges.emplace_back(i, j);
-    }
+  for (std::int64_t i = 0; i < rows; ++i)
+    for (std::int64_t j = i + 1; j < g.n; ++j)
+      if (random.chance(percent)) g.edges.emplace_back(i, j);
+  for (std::int64_t i = first; i < g.n; ++i)
+    for (std::int64_t j = i + 1; j < g.n && (i - first) / 4 == (j - first) / 4; ++j) g.edges.emplace_back(i, j);
   return positive_definite(g, random);
 }
 
@@ -95,20 +95,18 @@ void order_again(SmMatrix* m, std::int64_t which, Random& random) {
 }
 
 TEST_P(ReorderTest, moves_the_long_rows_of_a_border_like_any_other) {
-  for (std::uint64_t seed = 0; seed < 48; ++seed) {
+  for (std::uint64_t seed = 0; seed < 12; ++seed) {
     Random random(seed);
     constexpr std::int64_t kRows[] = {2, 3, 10, 16, 17, 35};
     constexpr std::int64_t kPercent[] = {100, 100, 99, 85};
     const Problem problem =
         bordered(random, kRows[seed % 6], kPercent[static_cast<std::size_t>(random.below(4))], random.chance(30));
     for (std::int64_t which = 0; which < 4; ++which) {
-      for (const bool room : {true, false}) {
-        SmMatrix* m = ordered(problem);
-        order_again(m, which, random);
-        if (!room) replace_work(m, problem.n + m->nnz);
-        expect_moved(m, "seed " + std::to_string(seed) + " order " + std::to_string(which));
-        destroy(m);
-      }
+      SmMatrix* m = ordered(problem);
+      order_again(m, which, random);
+      if (random.chance(50)) replace_work(m, problem.n + m->nnz);  // mostly no room for the copies
+      expect_moved(m, "seed " + std::to_string(seed) + " order " + std::to_string(which));
+      destroy(m);
     }
   }
 }
