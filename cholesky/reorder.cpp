@@ -2,6 +2,8 @@
 #include "cholesky/reorder.hpp"
 
 #include <algorithm>
+#include <cstdint>
+#include <limits>
 #include <utility>
 
 #include "cholesky/steps.hpp"
@@ -11,75 +13,74 @@ namespace sm {
 
 namespace {
 
+constexpr i64 kLongRow = 64;
+
 bool has_workspace(const SmMatrix& m, i64 words) { return m.work && m.work_capacity >= words; }
 
-// Gives every entry to the row of whichever index comes first in the order; owner[p] and counts get the result.
-void find_owners(SmMatrix& m, i64* counts, i64* owner) {
-  std::fill_n(counts, m.rows, 0);
+// Gives every entry to the row of whichever index comes first in the order; owner[p] and counts get the result. In a
+// short row, which comes first cannot be foretold, so there is no jump: the sign of a difference makes a mask.
+template <class Index>
+void find_owners(SmMatrix& m, Index* counts, Index* owner) {
+  std::fill_n(counts, m.rows, Index{0});
   for (i64 i = 0; i < m.rows; ++i) {
-    for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
+    const i64 place = m.inv_perm[i];
+    const i64 end = m.row_start[i + 1];
+    const bool is_short = end - m.row_start[i] < kLongRow;
+    for (i64 p = m.row_start[i]; p < end; ++p) {
       const i64 j = m.col_index[p];
-      owner[p] = i;
-      if (m.inv_perm[j] < m.inv_perm[i]) {
+      if (is_short) {
+        const i64 exchange = (i ^ j) & ((m.inv_perm[j] - place) >> 63);
+        owner[p] = static_cast<Index>(i ^ exchange);
+        m.col_index[p] = j ^ exchange;
+        ++counts[i ^ exchange];
+      } else if (m.inv_perm[j] < place) {
+        owner[p] = static_cast<Index>(j);
         m.col_index[p] = i;
-        owner[p] = j;
+        ++counts[j];
+      } else {
+        owner[p] = static_cast<Index>(i);
+        ++counts[i];
       }
-      ++counts[owner[p]];
     }
   }
 }
 
-void move_row_starts(SmMatrix& m, i64* counts) {
+template <class Index>
+void move_row_starts(SmMatrix& m, Index* counts) {
   for (i64 i = 0; i < m.rows; ++i) {
     m.row_start[i + 1] = m.row_start[i] + counts[i];
-    counts[i] = m.row_start[i + 1];
+    counts[i] = static_cast<Index>(m.row_start[i + 1]);
   }
 }
 
 // Rows fill from their end; the diagonal takes the first slot, where the factorization expects it. The diagonals of one
 // row stand together in this walk, so remembering the last row is enough to tell a repeated one. visit(p, where entry p
 // belongs).
-void for_each_target(const SmMatrix& m, i64* ends, const i64* owner, auto&& visit) {
+template <class Index>
+void for_each_target(const SmMatrix& m, Index* ends, const Index* owner, auto&& visit) {
   i64 last_diagonal = -1;
   for (i64 p = m.nnz - 1; p >= 0; --p) {
-    const i64 row = owner[p];
+    const i64 row = static_cast<i64>(owner[p]);
     if (m.col_index[p] == row && row != last_diagonal) {
       last_diagonal = row;
       visit(p, m.row_start[row]);
     } else {
-      visit(p, --ends[row]);
+      visit(p, static_cast<i64>(--ends[row]));
     }
   }
 }
 
-void permute_entries(SmMatrix& m, i64* target) {
+template <class Index>
+void permute_entries(SmMatrix& m, Index* target) {
   for (i64 p = 0; p < m.nnz; ++p) {
-    while (target[p] != p) {
-      const i64 to = target[p];
+    while (static_cast<i64>(target[p]) != p) {
+      const i64 to = static_cast<i64>(target[p]);
       std::swap(m.col_index[p], m.col_index[to]);
       std::swap(m.nz_values[p], m.nz_values[to]);
       target[p] = target[to];
-      target[to] = to;
+      target[to] = static_cast<Index>(to);
     }
   }
-}
-
-// Through copies where the workspace has room for them: along cycles each entry waits for the memory of the one before.
-void move_entries(SmMatrix& m, i64* ends, i64* owner) {
-  const i64 used = m.rows + m.nnz;
-  if (!has_workspace(m, used + 2 * m.nnz)) {
-    for_each_target(m, ends, owner, [&](i64 p, i64 target) { owner[p] = target; });
-    permute_entries(m, owner);
-    return;
-  }
-  i64* column = m.work + used;
-  auto* value = reinterpret_cast<double*>(column + m.nnz);
-  for_each_target(m, ends, owner, [&](i64 p, i64 target) {
-    column[target] = m.col_index[p];
-    value[target] = m.nz_values[p];
-  });
-  std::copy_n(column, m.nnz, m.col_index);
-  std::copy_n(value, m.nnz, m.nz_values);
 }
 
 Gate may_reorder(const SmMatrix& m) {
@@ -105,16 +106,46 @@ void for_each_entry(const SmMatrix& m, auto&& visit) {
   }
 }
 
+// As many entries are counted in half words, which a random walk finds in half the memory.
+constexpr i64 kShort = std::numeric_limits<std::uint32_t>::max();
+
+// Through copies where the workspace has room for them: along cycles each entry waits for the memory of the one before.
+template <class Index>
+void move_entries(SmMatrix& m, Index* ends, Index* owner) {
+  const i64 used = m.rows + m.nnz;
+  if (!has_workspace(m, used + 2 * m.nnz)) {
+    for_each_target(m, ends, owner, [&](i64 p, i64 target) { owner[p] = static_cast<Index>(target); });
+    permute_entries(m, owner);
+    return;
+  }
+  i64* column = m.work + used;
+  auto* value = reinterpret_cast<double*>(column + m.nnz);
+  for_each_target(m, ends, owner, [&](i64 p, i64 target) {
+    column[target] = m.col_index[p];
+    value[target] = m.nz_values[p];
+  });
+  std::copy_n(column, m.nnz, m.col_index);
+  std::copy_n(value, m.nnz, m.nz_values);
+}
+
+// Whatever the rows look like.
+template <class Index>
+void reorder_by_owners(SmMatrix& m) {
+  auto* counts = reinterpret_cast<Index*>(m.work);
+  Index* owner = counts + m.rows;
+  find_owners(m, counts, owner);
+  move_row_starts(m, counts);
+  move_entries(m, counts, owner);
+}
+
 }  // namespace
 
 SmStatus reorder(SmMatrix& m) {
   SM_PASS(may_reorder(m));
   give_back(m.pool, m.factor_reserved);  // the places that a refill found in an earlier order
-  i64* counts = m.work;
-  i64* owner = m.work + m.rows;
-  find_owners(m, counts, owner);
-  move_row_starts(m, counts);
-  move_entries(m, counts, owner);
+  if (!reorder_border(m)) {
+    m.nnz <= kShort ? reorder_by_owners<std::uint32_t>(m) : reorder_by_owners<i64>(m);
+  }
   m.state = SM_STATE_REORDERED;
   return SM_OK;
 }

@@ -5,6 +5,10 @@
 
 namespace sm {
 
+// Moves the rows as closing left them, diagonal first and columns ascending, into the factor's order, by way of copies
+// of the entries that change rows. False, with nothing changed, where a row is different or the workspace has no room.
+bool reorder_border(SmMatrix& m);
+
 // Undoes reorder in the workspace that ordering left: upper triangle, columns ascending. Allocates nothing.
 void restore_order(SmMatrix& m);
 

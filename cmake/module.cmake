@@ -38,6 +38,7 @@ add_library(qxesm_objects OBJECT
   cholesky/ordering_plain.cpp
   cholesky/refill.cpp
   cholesky/reorder.cpp
+  cholesky/reorder_border.cpp
   cholesky/selected_inverse.cpp
   cholesky/shared_tails.cpp
   cholesky/slabs.cpp
