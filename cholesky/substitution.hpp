@@ -57,12 +57,28 @@ struct FactorRows {
   static constexpr i64 kNear = i64{1} << 20;
 };
 
-// y is in the order of the factor; with lanes, element k of vector v is y[k * kLanes + v].
+// Where rows go: row i of the vectors is row place[i] of the factor, and perm[place[i]] is i.
+struct RowOrder {
+  i64 n;
+  const i64 *perm, *place;
+};
+
+// For `lanes` vectors side by side: element k of vector v is y[k * lanes + v], in the order of the factor.
+struct LanePasses {
+  int lanes;
+  void (*pack)(const RowOrder& order, const double* b, double* y);
+  void (*forward)(const FactorRows& f, double* y);
+  void (*backward)(const FactorRows& f, double* y);
+  // y may begin up to kLanes - 1 elements before the end of x.
+  void (*unpack)(const RowOrder& order, const double* y, double* x);
+  // y begins at x, or up to kLanes - 1 elements before it; `spare` has room for n elements.
+  void (*unpack_in_place)(const RowOrder& order, double* y, double* x, double* spare);
+};
+
 struct SubstitutionPasses {
   void (*forward)(const FactorRows& f, double* y);
   void (*backward)(const FactorRows& f, double* y);
-  void (*forward_lanes)(const FactorRows& f, double* y);
-  void (*backward_lanes)(const FactorRows& f, double* y);
+  LanePasses eight, sixteen;
 };
 
 extern const SubstitutionPasses kPortableSubstitution;
