@@ -42,7 +42,7 @@ class SparseSolve {
     passes.forward(rows_, lanes);
     passes.backward(rows_, lanes);
     if (lanes == x) {
-      passes.unpack_in_place(order_, lanes, x, w_);
+      passes.unpack_in_place(order_, x, w_);
     } else {
       passes.unpack(order_, lanes, x);
     }
@@ -63,7 +63,7 @@ class SparseSolve {
 
 void substitute_sparse(const SmMatrix& m, const double* b, double* x, i64 count) {
   const SparseSolve solve(m);
-  for (const LanePasses* passes : {&solve.passes().sixteen, &solve.passes().eight}) {
+  for (const LanePasses* passes : {&solve.passes().wide, &solve.passes().eight}) {
     const i64 lanes = passes->lanes;
     for (; count >= lanes; count -= lanes, b += lanes * m.rows, x += lanes * m.rows) {
       solve.several(*passes, b, x, count - lanes >= lanes ? x + lanes * m.rows : x);

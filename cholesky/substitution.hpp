@@ -1,4 +1,5 @@
-// Passes over a finished sparse factor: U'D forward and U backward, for one vector, or for eight side by side.
+// Passes over a finished sparse factor: U'D forward and U backward, for one vector, or for eight or sixteen side by
+// side.
 //
 // Both walk strips of up to eight rows with one structure (cholesky/blocks.hpp): a column behind the strip is then
 // fetched, and stored, once for all of its rows. The passes are compiled for the widest vectors of a few
@@ -69,16 +70,15 @@ struct LanePasses {
   void (*pack)(const RowOrder& order, const double* b, double* y);
   void (*forward)(const FactorRows& f, double* y);
   void (*backward)(const FactorRows& f, double* y);
-  // y may begin up to kLanes - 1 elements before the end of x.
   void (*unpack)(const RowOrder& order, const double* y, double* x);
-  // y begins at x, or up to kLanes - 1 elements before it; `spare` has room for n elements.
-  void (*unpack_in_place)(const RowOrder& order, double* y, double* x, double* spare);
+  // From y to y; `spare` has room for n elements.
+  void (*unpack_in_place)(const RowOrder& order, double* y, double* spare);
 };
 
 struct SubstitutionPasses {
   void (*forward)(const FactorRows& f, double* y);
   void (*backward)(const FactorRows& f, double* y);
-  LanePasses eight, sixteen;
+  LanePasses wide, eight;  // wide may be eight, too
 };
 
 extern const SubstitutionPasses kPortableSubstitution;

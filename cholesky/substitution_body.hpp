@@ -30,6 +30,7 @@ constexpr i64 kWideAhead = 128;     // in each row of a wide strip
 constexpr i64 kNarrowAhead = 512;   // values of narrow strips, and of single rows
 constexpr i64 kColumnsAhead = 128;  // their subscripts
 constexpr i64 kRowsAhead = 64;
+constexpr i64 kSinglesAhead = 16;  // rows whose places in y are fetched, with lanes
 
 // Way is 1 going forward and -1 going backward.
 template <int kRows>
@@ -69,11 +70,31 @@ struct Several {
       if (s.count <= kNarrowTail) fetch_narrow(f, s, first, way);
     }
   }
-  // One of the rows at a time.
+  // The block that follows, as if it were of the same size: a line of it, or less, for each column of this one.
   template <int kRows>
-  SM_PASS_INLINE static void fetch_column(const Strip<kRows>& s, i64 c) {
-    if constexpr (kRows > 3) __builtin_prefetch(s.row + c % kRows * s.step + c + kWideAhead);
+  SM_PASS_INLINE static void fetch_next(const Strip<kRows>& s, i64 c, i64 way) {
+    if constexpr (kRows > 3) __builtin_prefetch(s.row + (way * s.count + c) * kRows);
   }
+  // What a single row to come will need of y: as many of its columns as the strip at hand has. Where it has none, or is
+  // not there, the strip at hand stands in.
+  class Ahead {
+   public:
+    template <int kRows>
+    SM_PASS_INLINE Ahead(const FactorRows& f, const Strip<kRows>& s, i64 row) {
+      const bool there = row >= 0 && row < f.n && f.length(row) > 0;
+      column_ = there ? f.columns(row) : s.column;
+      last_ = (there ? f.length(row) : s.count) - 1;
+    }
+    SM_PASS_INLINE void fetch(double* y, i64 c) const {
+      const Lanes* to = at(y, column_[std::min(c, last_)]);
+#pragma GCC unroll 8
+      for (int h = 0; h < kWide; ++h) __builtin_prefetch(to + h);
+    }
+
+   private:
+    const i64* column_;
+    i64 last_;
+  };
 
   template <int kRows>
   SM_PASS_INLINE static void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
@@ -90,8 +111,13 @@ struct Several {
         for (int h = 0; h < kWide; ++h) w[j][h] += s.at(i)[j] * w[i][h];
     }
     fetch<kRows>(f, s, first, 1);
+    const Ahead ahead(f, s, first + kSinglesAhead);
     for (i64 c = 0; c < s.count; ++c) {
-      fetch_column(s, c);
+      if constexpr (kRows == 1) {
+        ahead.fetch(y, c);
+      } else {
+        fetch_next(s, c, 1);
+      }
       Lanes sum[kWide];
 #pragma GCC unroll 8
       for (int i = 0; i < kRows; ++i) {
@@ -117,8 +143,13 @@ struct Several {
 #pragma GCC unroll 8
       for (int h = 0; h < kWide; ++h) w[i][h] = Lanes{};
     fetch<kRows>(f, s, first, -1);
+    const Ahead ahead(f, s, first - kSinglesAhead);
     for (i64 c = 0; c < s.count; ++c) {
-      fetch_column(s, c);
+      if constexpr (kRows == 1) {
+        ahead.fetch(y, c);
+      } else {
+        fetch_next(s, c, -1);
+      }
       const Lanes* from = at(y, s.column[c]);
       Lanes z[kWide];
 #pragma GCC unroll 8
@@ -202,4 +233,5 @@ constexpr LanePasses kLanePasses = {
     kWide* kLanes, pack<kWide>,           forward_pass<Several<kWide>>, backward_pass<Several<kWide>>,
     unpack<kWide>, unpack_in_place<kWide>};
 
-constexpr SubstitutionPasses kPasses = {forward_pass<Single>, backward_pass<Single>, kLanePasses<1>, kLanePasses<2>};
+constexpr SubstitutionPasses kPasses = {forward_pass<Single>, backward_pass<Single>, kLanePasses<Access::kWide>,
+                                        kLanePasses<1>};

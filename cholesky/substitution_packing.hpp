@@ -57,8 +57,6 @@ SM_PASS_TARGET void pack(const RowOrder& order, const double* b, double* y) {
   }
 }
 
-// The last eight rows come last and by themselves, and of these the first lanes first: what y and x have in common is
-// read before it is written.
 template <int kWide>
 SM_PASS_TARGET void unpack(const RowOrder& order, const double* y, double* x) {
   constexpr int kAll = kWide * kLanes;
@@ -104,13 +102,13 @@ SM_PASS_INLINE void rows_to_segments(const double* from, i64 rows, double* to) {
   }
 }
 
-// As many chunks as there are lanes, of so many rows that the spare room takes one: each becomes segments, one for a
-// lane. The segments are a square, segment v of chunk j in place (j, v), and a column of x needs column v of it. It is
-// gathered into the spare room, in the order of x, from the last one on; then what row v has left goes to the places
-// of the segments taken, which mirror its own, and the column goes to where row v was. The few rows behind the chunks
-// wait on the side.
+// The rows are cut into as many chunks as there are lanes, so that the spare room takes a chunk. Each becomes segments,
+// one for a lane: segment v of chunk j is in place (j, v) of a square. Column v of the square is what vector v needs: from
+// the last on it is gathered in the spare room, in the order of x; then what row v has left moves to the places of the
+// segments taken, which mirror its own, and the vector goes to where row v began, or a little behind. The few rows behind
+// the chunks wait on the side.
 template <int kWide>
-SM_PASS_TARGET void unpack_in_place(const RowOrder& order, double* y, double* x, double* spare) {
+SM_PASS_TARGET void unpack_in_place(const RowOrder& order, double* y, double* spare) {
   constexpr int kAll = kWide * kLanes;
   const i64 n = order.n;
   const i64 m = n / kAll;
@@ -129,6 +127,6 @@ SM_PASS_TARGET void unpack_in_place(const RowOrder& order, double* y, double* x,
     }
     for (i64 k = chunk; k < n; ++k) spare[order.perm[k]] = behind[(k - chunk) * kAll + v];
     for (i64 j = 0; j < v; ++j) std::copy_n(y + v * chunk + j * m, m, y + j * chunk + v * m);
-    std::copy_n(spare, n, x + v * n);
+    std::copy_n(spare, n, y + v * n);
   }
 }
