@@ -175,7 +175,7 @@ TEST_P(SubstitutionTest, solves_1_to_33_right_hand_sides) {
 TEST_P(SubstitutionTest, solves_together_what_it_solves_one_by_one) {
   Random random(11);
   for (const std::int64_t n : {1, 5, 15, 16, 17, 63, 64, 65, 127, 128, 129, 143, 144, 151}) {
-    const Problem problem = positive_definite(sparse_graph(random, n), random);
+    const Problem problem = positive_definite(random_graph(random, n, 4), random);
     for (const std::int64_t count : {7, 8, 9, 15, 16, 17, 24, 31, 32, 33, 40}) {
       SCOPED_TRACE(std::to_string(n) + " rows, " + std::to_string(count) + " vectors");
       check(problem, random, count, true);
