@@ -100,15 +100,17 @@ struct Several {
   SM_PASS_INLINE static void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
     Lanes w[kRows][kWide];
 #pragma GCC unroll 8
-    for (int i = 0; i < kRows; ++i)
+    for (int i = 0; i < kRows; ++i) {
 #pragma GCC unroll 8
       for (int h = 0; h < kWide; ++h) w[i][h] = at(y, first + i)[h];
+    }
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) {
 #pragma GCC unroll 8
-      for (int j = i + 1; j < kRows; ++j)
+      for (int j = i + 1; j < kRows; ++j) {
 #pragma GCC unroll 8
         for (int h = 0; h < kWide; ++h) w[j][h] += s.at(i)[j] * w[i][h];
+      }
     }
     fetch<kRows>(f, s, first, 1);
     const Ahead ahead(f, s, first + kSinglesAhead);
@@ -130,18 +132,20 @@ struct Several {
       for (int h = 0; h < kWide; ++h) to[h] += sum[h];
     }
 #pragma GCC unroll 8
-    for (int i = 0; i < kRows; ++i)
+    for (int i = 0; i < kRows; ++i) {
 #pragma GCC unroll 8
       for (int h = 0; h < kWide; ++h) at(y, first + i)[h] = f.diag[first + i] * w[i][h];
+    }
   }
 
   template <int kRows>
   SM_PASS_INLINE static void backward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
     Lanes w[kRows][kWide];
 #pragma GCC unroll 8
-    for (int i = 0; i < kRows; ++i)
+    for (int i = 0; i < kRows; ++i) {
 #pragma GCC unroll 8
       for (int h = 0; h < kWide; ++h) w[i][h] = Lanes{};
+    }
     fetch<kRows>(f, s, first, -1);
     const Ahead ahead(f, s, first - kSinglesAhead);
     for (i64 c = 0; c < s.count; ++c) {
@@ -162,7 +166,7 @@ struct Several {
       }
     }
 #pragma GCC unroll 8
-    for (int i = kRows - 1; i >= 0; --i)
+    for (int i = kRows - 1; i >= 0; --i) {
 #pragma GCC unroll 8
       for (int h = 0; h < kWide; ++h) {
         w[i][h] += at(y, first + i)[h];
@@ -170,6 +174,7 @@ struct Several {
         for (int j = kRows - 1; j > i; --j) w[i][h] += s.at(i)[j] * w[j][h];
         at(y, first + i)[h] = w[i][h];
       }
+    }
   }
 };
 

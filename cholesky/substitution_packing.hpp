@@ -34,50 +34,50 @@ constexpr i64 kPlacesAhead = 32;  // rows whose places in the lanes are fetched 
 
 template <int kWide>
 SM_PASS_TARGET void pack(const RowOrder& order, const double* b, double* y) {
-  constexpr int kAll = kWide * kLanes;
+  constexpr i64 kAll = i64{kWide} * kLanes;
   const i64 n = order.n;
   const i64* place = order.place;
   i64 i = 0;
   for (; i < n % kLanes; ++i) {
-    for (int v = 0; v < kAll; ++v) y[place[i] * kAll + v] = b[i + v * n];
+    for (i64 v = 0; v < kAll; ++v) y[place[i] * kAll + v] = b[i + v * n];
   }
   for (; i < n; i += kLanes) {
-    for (int r = 0; r < kLanes; ++r) {
+    for (i64 r = 0; r < kLanes; ++r) {
       const double* ahead = y + place[std::min(i + kPlacesAhead + r, n - 1)] * kAll;
-      for (int h = 0; h < kWide; ++h) __builtin_prefetch(ahead + h * kLanes, 1);
+      for (i64 h = 0; h < kWide; ++h) __builtin_prefetch(ahead + h * kLanes, 1);
     }
-    for (int h = 0; h < kWide; ++h) {
+    for (i64 h = 0; h < kWide; ++h) {
       Lanes t[kLanes];
 #pragma GCC unroll 8
-      for (int v = 0; v < kLanes; ++v) t[v] = lanes_at(b + i + (h * kLanes + v) * n);
+      for (i64 v = 0; v < kLanes; ++v) t[v] = lanes_at(b + i + (h * kLanes + v) * n);
       transpose(t);
 #pragma GCC unroll 8
-      for (int r = 0; r < kLanes; ++r) lanes_at(y + place[i + r] * kAll + h * kLanes) = t[r];
+      for (i64 r = 0; r < kLanes; ++r) lanes_at(y + place[i + r] * kAll + h * kLanes) = t[r];
     }
   }
 }
 
 template <int kWide>
 SM_PASS_TARGET void unpack(const RowOrder& order, const double* y, double* x) {
-  constexpr int kAll = kWide * kLanes;
+  constexpr i64 kAll = i64{kWide} * kLanes;
   const i64 n = order.n;
   const i64* place = order.place;
   i64 i = 0;
   for (; i < n % kLanes; ++i) {
-    for (int v = 0; v < kAll; ++v) x[i + v * n] = y[place[i] * kAll + v];
+    for (i64 v = 0; v < kAll; ++v) x[i + v * n] = y[place[i] * kAll + v];
   }
   for (; i < n; i += kLanes) {
-    for (int r = 0; r < kLanes; ++r) {
+    for (i64 r = 0; r < kLanes; ++r) {
       const double* ahead = y + place[std::min(i + kPlacesAhead + r, n - 1)] * kAll;
-      for (int h = 0; h < kWide; ++h) __builtin_prefetch(ahead + h * kLanes);
+      for (i64 h = 0; h < kWide; ++h) __builtin_prefetch(ahead + h * kLanes);
     }
-    for (int h = 0; h < kWide; ++h) {
+    for (i64 h = 0; h < kWide; ++h) {
       Lanes t[kLanes];
 #pragma GCC unroll 8
-      for (int r = 0; r < kLanes; ++r) t[r] = lanes_at(y + place[i + r] * kAll + h * kLanes);
+      for (i64 r = 0; r < kLanes; ++r) t[r] = lanes_at(y + place[i + r] * kAll + h * kLanes);
       transpose(t);
 #pragma GCC unroll 8
-      for (int v = 0; v < kLanes; ++v) lanes_at(x + i + (h * kLanes + v) * n) = t[v];
+      for (i64 v = 0; v < kLanes; ++v) lanes_at(x + i + (h * kLanes + v) * n) = t[v];
     }
   }
 }
@@ -85,20 +85,20 @@ SM_PASS_TARGET void unpack(const RowOrder& order, const double* y, double* x) {
 // `rows` rows of lanes: element v of row i goes to `to[v * rows + i]`.
 template <int kWide>
 SM_PASS_INLINE void rows_to_segments(const double* from, i64 rows, double* to) {
-  constexpr int kAll = kWide * kLanes;
+  constexpr i64 kAll = i64{kWide} * kLanes;
   i64 i = 0;
   for (; i + kLanes <= rows; i += kLanes) {
-    for (int h = 0; h < kWide; ++h) {
+    for (i64 h = 0; h < kWide; ++h) {
       Lanes t[kLanes];
 #pragma GCC unroll 8
-      for (int r = 0; r < kLanes; ++r) t[r] = lanes_at(from + (i + r) * kAll + h * kLanes);
+      for (i64 r = 0; r < kLanes; ++r) t[r] = lanes_at(from + (i + r) * kAll + h * kLanes);
       transpose(t);
 #pragma GCC unroll 8
-      for (int v = 0; v < kLanes; ++v) lanes_at(to + (h * kLanes + v) * rows + i) = t[v];
+      for (i64 v = 0; v < kLanes; ++v) lanes_at(to + (h * kLanes + v) * rows + i) = t[v];
     }
   }
   for (; i < rows; ++i) {
-    for (int v = 0; v < kAll; ++v) to[v * rows + i] = from[i * kAll + v];
+    for (i64 v = 0; v < kAll; ++v) to[v * rows + i] = from[i * kAll + v];
   }
 }
 
@@ -109,13 +109,13 @@ SM_PASS_INLINE void rows_to_segments(const double* from, i64 rows, double* to) {
 // the chunks wait on the side.
 template <int kWide>
 SM_PASS_TARGET void unpack_in_place(const RowOrder& order, double* y, double* spare) {
-  constexpr int kAll = kWide * kLanes;
+  constexpr i64 kAll = i64{kWide} * kLanes;
   const i64 n = order.n;
   const i64 m = n / kAll;
   const i64 chunk = m * kAll;
   double behind[kAll * kAll];
   std::copy(y + chunk * kAll, y + n * kAll, behind);
-  for (int j = 0; j < kAll; ++j) {
+  for (i64 j = 0; j < kAll; ++j) {
     std::copy_n(y + j * chunk, chunk, spare);
     rows_to_segments<kWide>(spare, m, y + j * chunk);
   }
