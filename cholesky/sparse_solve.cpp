@@ -23,7 +23,11 @@ namespace {
 class SparseSolve {
  public:
   explicit SparseSolve(const SmMatrix& m)
-      : n_(m.rows), perm_(m.perm), rows_(m), w_(reinterpret_cast<double*>(m.factor_scratch)) {}
+      : n_(m.rows),
+        perm_(m.perm),
+        order_{m.rows, m.perm, m.inv_perm},
+        rows_(m),
+        w_(reinterpret_cast<double*>(m.factor_scratch)) {}
 
   void one(const double* b, double* x) const {
     for (i64 k = 0; k < n_; ++k) w_[k] = b[perm_[k]];
@@ -32,48 +36,24 @@ class SparseSolve {
     for (i64 k = 0; k < n_; ++k) x[perm_[k]] = w_[k];
   }
 
-  // kLanes vectors in `lanes`, kLanes * n doubles: those of x itself, or others that are free until later.
-  void several(const double* b, double* x, double* lanes) const {
-    for (i64 k = 0; k < n_; ++k) {
-      const double* ahead = b + perm_[std::min(k + kAhead, n_ - 1)];
-      for (int v = 0; v < kLanes; ++v) __builtin_prefetch(ahead + v * n_);
-      for (int v = 0; v < kLanes; ++v) lanes[k * kLanes + v] = b[perm_[k] + v * n_];
-    }
-    passes_.forward_lanes(rows_, lanes);
-    passes_.backward_lanes(rows_, lanes);
+  // As many vectors as the passes take, in `lanes`: the room of x itself, or one that is free until later.
+  void several(const LanePasses& passes, const double* b, double* x, double* lanes) const {
+    passes.pack(order_, b, lanes);
+    passes.forward(rows_, lanes);
+    passes.backward(rows_, lanes);
     if (lanes == x) {
-      unpack_in_place(x);
-      return;
-    }
-    for (i64 k = 0; k < n_; ++k) {
-      const double* ahead = x + perm_[std::min(k + kAhead, n_ - 1)];
-      for (int v = 0; v < kLanes; ++v) __builtin_prefetch(ahead + v * n_, 1);
-      for (int v = 0; v < kLanes; ++v) x[perm_[k] + v * n_] = lanes[k * kLanes + v];
+      passes.unpack_in_place(order_, x, w_);
+    } else {
+      passes.unpack(order_, lanes, x);
     }
   }
+
+  [[nodiscard]] const SubstitutionPasses& passes() const { return passes_; }
 
  private:
-  static constexpr i64 kAhead = 16;  // rows whose places in b or x are fetched early
-
-  // The last lane goes to the scratch, the others move together, and it takes the room that they left, which is its
-  // own; then the next.
-  void unpack_in_place(double* x) const {
-    for (int lane = kLanes - 1; lane > 0; --lane) {
-      for (i64 k = 0; k < n_; ++k) {
-        const double* from = x + k * (lane + 1);
-        double* to = x + k * lane;
-        const double last = from[lane];
-        for (int v = 0; v < lane; ++v) to[v] = from[v];
-        w_[perm_[k]] = last;
-      }
-      std::copy_n(w_, n_, x + lane * n_);
-    }
-    for (i64 k = 0; k < n_; ++k) w_[perm_[k]] = x[k];
-    std::copy_n(w_, n_, x);
-  }
-
   i64 n_;
   const i64* perm_;
+  RowOrder order_;
   FactorRows rows_;
   double* w_;
   const SubstitutionPasses& passes_ = substitution_passes();
@@ -83,9 +63,11 @@ class SparseSolve {
 
 void substitute_sparse(const SmMatrix& m, const double* b, double* x, i64 count) {
   const SparseSolve solve(m);
-  const i64 group = kLanes * m.rows;
-  for (; count >= kLanes; count -= kLanes, b += group, x += group) {
-    solve.several(b, x, count - kLanes >= kLanes ? x + group : x);
+  for (const LanePasses* passes : {&solve.passes().wide, &solve.passes().eight}) {
+    const i64 lanes = passes->lanes;
+    for (; count >= lanes; count -= lanes, b += lanes * m.rows, x += lanes * m.rows) {
+      solve.several(*passes, b, x, count - lanes >= lanes ? x + lanes * m.rows : x);
+    }
   }
   for (; count > 0; --count, b += m.rows, x += m.rows) solve.one(b, x);
 }

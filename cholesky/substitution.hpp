@@ -1,4 +1,5 @@
-// Passes over a finished sparse factor: U'D forward and U backward, for one vector, or for eight side by side.
+// Passes over a finished sparse factor: U'D forward and U backward, for one vector, or for eight or sixteen side by
+// side.
 //
 // Both walk strips of up to eight rows with one structure (cholesky/blocks.hpp): a column behind the strip is then
 // fetched, and stored, once for all of its rows. The passes are compiled for the widest vectors of a few
@@ -57,12 +58,27 @@ struct FactorRows {
   static constexpr i64 kNear = i64{1} << 20;
 };
 
-// y is in the order of the factor; with lanes, element k of vector v is y[k * kLanes + v].
+// Where rows go: row i of the vectors is row place[i] of the factor, and perm[place[i]] is i.
+struct RowOrder {
+  i64 n;
+  const i64 *perm, *place;
+};
+
+// For `lanes` vectors side by side: element k of vector v is y[k * lanes + v], in the order of the factor.
+struct LanePasses {
+  int lanes;
+  void (*pack)(const RowOrder& order, const double* b, double* y);
+  void (*forward)(const FactorRows& f, double* y);
+  void (*backward)(const FactorRows& f, double* y);
+  void (*unpack)(const RowOrder& order, const double* y, double* x);
+  // From y to y; `spare` has room for n elements.
+  void (*unpack_in_place)(const RowOrder& order, double* y, double* spare);
+};
+
 struct SubstitutionPasses {
   void (*forward)(const FactorRows& f, double* y);
   void (*backward)(const FactorRows& f, double* y);
-  void (*forward_lanes)(const FactorRows& f, double* y);
-  void (*backward_lanes)(const FactorRows& f, double* y);
+  LanePasses wide, eight;  // wide may be eight, too
 };
 
 extern const SubstitutionPasses kPortableSubstitution;

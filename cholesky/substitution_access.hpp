@@ -3,6 +3,7 @@
 // Deliberately without an include guard, as substitution_body.hpp.
 
 struct PlainAccess {
+  static constexpr int kWide = 1;  // more vectors than eight do not fit the registers
   // The first `count` of eight elements, 1 <= count <= 8, then zeros.
   SM_PASS_INLINE static Lanes load(const double* p, i64 count) {
     if (count == kLanes) return *reinterpret_cast<const Lanes*>(p);

@@ -17,6 +17,7 @@ namespace {
 
 #if defined(__x86_64__)
 struct Access {
+  static constexpr int kWide = 2;  // of eight rows, sixteen vectors fill half of the registers
   SM_PASS_INLINE static __mmask8 first(i64 count) { return static_cast<__mmask8>((1U << count) - 1U); }
   SM_PASS_INLINE static Lanes load(const double* p, i64 count) { return _mm512_maskz_loadu_pd(first(count), p); }
   SM_PASS_INLINE static bool equal(const i64* a, const i64* b, i64 count) {

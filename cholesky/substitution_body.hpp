@@ -30,6 +30,7 @@ constexpr i64 kWideAhead = 128;     // in each row of a wide strip
 constexpr i64 kNarrowAhead = 512;   // values of narrow strips, and of single rows
 constexpr i64 kColumnsAhead = 128;  // their subscripts
 constexpr i64 kRowsAhead = 64;
+constexpr i64 kSinglesAhead = 16;  // rows whose places in y are fetched, with lanes
 
 // Way is 1 going forward and -1 going backward.
 template <int kRows>
@@ -57,9 +58,10 @@ SM_PASS_INLINE void fetch_single(const Strip<1>& s, i64 way) {
 
 #include "cholesky/substitution_single.hpp"
 
-// Eight vectors, one to a lane.
+// kWide times eight vectors, one to a lane. What a row of U holds is spread over the lanes once for all of them.
+template <int kWide>
 struct Several {
-  SM_PASS_INLINE static Lanes& at(double* y, i64 k) { return *reinterpret_cast<Lanes*>(y + k * kLanes); }
+  SM_PASS_INLINE static Lanes* at(double* y, i64 k) { return reinterpret_cast<Lanes*>(y + k * kWide * kLanes); }
   template <int kRows>
   SM_PASS_INLINE static void fetch(const FactorRows& f, const Strip<kRows>& s, i64 first, i64 way) {
     if constexpr (kRows == 1) {
@@ -68,52 +70,110 @@ struct Several {
       if (s.count <= kNarrowTail) fetch_narrow(f, s, first, way);
     }
   }
-  // One of the rows at a time.
+  // The block that follows, as if it were of the same size: a line of it, or less, for each column of this one.
   template <int kRows>
-  SM_PASS_INLINE static void fetch_column(const Strip<kRows>& s, i64 c) {
-    if constexpr (kRows > 3) __builtin_prefetch(s.row + c % kRows * s.step + c + kWideAhead);
+  SM_PASS_INLINE static void fetch_next(const Strip<kRows>& s, i64 c, i64 way) {
+    if constexpr (kRows > 3) __builtin_prefetch(s.row + (way * s.count + c) * kRows);
   }
+  // What a single row to come will need of y: as many of its columns as the strip at hand has. Where it has none, or is
+  // not there, the strip at hand stands in.
+  class Ahead {
+   public:
+    template <int kRows>
+    SM_PASS_INLINE Ahead(const FactorRows& f, const Strip<kRows>& s, i64 row) {
+      const bool there = row >= 0 && row < f.n && f.length(row) > 0;
+      column_ = there ? f.columns(row) : s.column;
+      last_ = (there ? f.length(row) : s.count) - 1;
+    }
+    SM_PASS_INLINE void fetch(double* y, i64 c) const {
+      const Lanes* to = at(y, column_[std::min(c, last_)]);
+#pragma GCC unroll 8
+      for (int h = 0; h < kWide; ++h) __builtin_prefetch(to + h);
+    }
+
+   private:
+    const i64* column_;
+    i64 last_;
+  };
 
   template <int kRows>
   SM_PASS_INLINE static void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
-    Lanes w[kRows];
-#pragma GCC unroll 8
-    for (int i = 0; i < kRows; ++i) w[i] = at(y, first + i);
+    Lanes w[kRows][kWide];
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) {
 #pragma GCC unroll 8
-      for (int j = i + 1; j < kRows; ++j) w[j] += s.at(i)[j] * w[i];
+      for (int h = 0; h < kWide; ++h) w[i][h] = at(y, first + i)[h];
+    }
+#pragma GCC unroll 8
+    for (int i = 0; i < kRows; ++i) {
+#pragma GCC unroll 8
+      for (int j = i + 1; j < kRows; ++j) {
+#pragma GCC unroll 8
+        for (int h = 0; h < kWide; ++h) w[j][h] += s.at(i)[j] * w[i][h];
+      }
     }
     fetch<kRows>(f, s, first, 1);
+    const Ahead ahead(f, s, first + kSinglesAhead);
     for (i64 c = 0; c < s.count; ++c) {
-      fetch_column(s, c);
-      Lanes sum = s.at(0)[kRows + c] * w[0];
+      if constexpr (kRows == 1) {
+        ahead.fetch(y, c);
+      } else {
+        fetch_next(s, c, 1);
+      }
+      Lanes sum[kWide];
 #pragma GCC unroll 8
-      for (int i = 1; i < kRows; ++i) sum += s.at(i)[kRows + c] * w[i];
-      at(y, s.column[c]) += sum;
+      for (int i = 0; i < kRows; ++i) {
+        const double u = s.at(i)[kRows + c];
+#pragma GCC unroll 8
+        for (int h = 0; h < kWide; ++h) sum[h] = i == 0 ? u * w[i][h] : sum[h] + u * w[i][h];
+      }
+      Lanes* to = at(y, s.column[c]);
+#pragma GCC unroll 8
+      for (int h = 0; h < kWide; ++h) to[h] += sum[h];
     }
 #pragma GCC unroll 8
-    for (int i = 0; i < kRows; ++i) at(y, first + i) = f.diag[first + i] * w[i];
+    for (int i = 0; i < kRows; ++i) {
+#pragma GCC unroll 8
+      for (int h = 0; h < kWide; ++h) at(y, first + i)[h] = f.diag[first + i] * w[i][h];
+    }
   }
 
   template <int kRows>
   SM_PASS_INLINE static void backward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
-    Lanes w[kRows];
+    Lanes w[kRows][kWide];
 #pragma GCC unroll 8
-    for (int i = 0; i < kRows; ++i) w[i] = Lanes{};
+    for (int i = 0; i < kRows; ++i) {
+#pragma GCC unroll 8
+      for (int h = 0; h < kWide; ++h) w[i][h] = Lanes{};
+    }
     fetch<kRows>(f, s, first, -1);
+    const Ahead ahead(f, s, first - kSinglesAhead);
     for (i64 c = 0; c < s.count; ++c) {
-      fetch_column(s, c);
-      const Lanes z = at(y, s.column[c]);
+      if constexpr (kRows == 1) {
+        ahead.fetch(y, c);
+      } else {
+        fetch_next(s, c, -1);
+      }
+      const Lanes* from = at(y, s.column[c]);
+      Lanes z[kWide];
 #pragma GCC unroll 8
-      for (int i = 0; i < kRows; ++i) w[i] += s.at(i)[kRows + c] * z;
+      for (int h = 0; h < kWide; ++h) z[h] = from[h];
+#pragma GCC unroll 8
+      for (int i = 0; i < kRows; ++i) {
+        const double u = s.at(i)[kRows + c];
+#pragma GCC unroll 8
+        for (int h = 0; h < kWide; ++h) w[i][h] += u * z[h];
+      }
     }
 #pragma GCC unroll 8
     for (int i = kRows - 1; i >= 0; --i) {
-      w[i] += at(y, first + i);
 #pragma GCC unroll 8
-      for (int j = kRows - 1; j > i; --j) w[i] += s.at(i)[j] * w[j];
-      at(y, first + i) = w[i];
+      for (int h = 0; h < kWide; ++h) {
+        w[i][h] += at(y, first + i)[h];
+#pragma GCC unroll 8
+        for (int j = kRows - 1; j > i; --j) w[i][h] += s.at(i)[j] * w[j][h];
+        at(y, first + i)[h] = w[i][h];
+      }
     }
   }
 };
@@ -171,5 +231,12 @@ SM_PASS_TARGET void backward_pass(const FactorRows& given, double* y) {
   }
 }
 
-constexpr SubstitutionPasses kPasses = {forward_pass<Single>, backward_pass<Single>, forward_pass<Several>,
-                                        backward_pass<Several>};
+#include "cholesky/substitution_packing.hpp"
+
+template <int kWide>
+constexpr LanePasses kLanePasses = {
+    kWide* kLanes, pack<kWide>,           forward_pass<Several<kWide>>, backward_pass<Several<kWide>>,
+    unpack<kWide>, unpack_in_place<kWide>};
+
+constexpr SubstitutionPasses kPasses = {forward_pass<Single>, backward_pass<Single>, kLanePasses<Access::kWide>,
+                                        kLanePasses<1>};

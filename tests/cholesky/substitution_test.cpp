@@ -99,6 +99,17 @@ class SubstitutionTest : public ModuleTest {
     }
     ASSERT_EQ(fn().qxsmDestroyMatrix(instance(), &m), SM_OK);
   }
+  void check_one_by_one(const Problem& problem, const std::vector<double>& b) {
+    SmMatrix* m = new_sparse(session(), problem);
+    ASSERT_EQ(fn().qxsmfact(m, 0), SM_OK);
+    const std::vector<double> x = solve(m, b);
+    for (auto from = b.begin(); from != b.end(); from += problem.n) {
+      const std::vector<double> alone = solve(m, {from, from + problem.n});
+      const auto together = x.begin() + (from - b.begin());
+      EXPECT_TRUE(near(alone, {together, together + problem.n}, 1e-12)) << "vector " << (from - b.begin()) / problem.n;
+    }
+    ASSERT_EQ(fn().qxsmDestroyMatrix(instance(), &m), SM_OK);
+  }
   // The same for subjects in natural order.
   void check_subjects(Random& random, const Subjects& subjects, std::int64_t count) {
     const Problem problem = normal_equations(random, subjects);
@@ -158,6 +169,19 @@ TEST_P(SubstitutionTest, solves_narrow_blocks_with_dropped_pivots) {
 TEST_P(SubstitutionTest, solves_1_to_33_right_hand_sides) {
   Random random(9);
   for (std::int64_t count = 1; count <= 33; ++count) check_subjects(random, {6, 10, 6}, count);
+}
+
+// Of every length that may be left over when rows are cut into chunks for 8 or 16 vectors, and into eights within them.
+TEST_P(SubstitutionTest, solves_together_what_it_solves_one_by_one) {
+  Random random(11);
+  for (const std::int64_t n : {1, 5, 15, 16, 17, 63, 64, 65, 127, 128, 129, 143, 144, 151}) {
+    const Problem problem = positive_definite(random_graph(random, n, 4), random);
+    for (const std::int64_t count : {7, 8, 9, 15, 16, 17, 24, 31, 32, 33, 40}) {
+      SCOPED_TRACE(std::to_string(n) + " rows, " + std::to_string(count) + " vectors");
+      check(problem, random, count, true);
+      check_one_by_one(problem, random.vector(n * count));
+    }
+  }
 }
 
 }  // namespace
