@@ -43,8 +43,8 @@ std::string block_fault(const UpperRows& rows, const double* x, const std::vecto
   return "";
 }
 
-// Vectors that one pass over the factor serves: kLanes of cholesky/substitution.hpp.
-constexpr int kVectorsAPass = 8;
+// Vectors that one pass over the factor serves: those of cholesky/substitution.hpp with AVX-512.
+constexpr int kVectorsAPass = 16;
 
 // What must move at least. A pass down and one up read values, subscripts, and where both begin; one of them the
 // diagonal; and each vector is read by its permutation and written.

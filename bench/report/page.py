@@ -35,7 +35,7 @@ PHASES = [
      "From a closed matrix to one solution, everybody with orderings of their own. The steps of the module are timed "
      "in runs of their own; without the ordering: the ratio if it took no time at all; the ordering alone: if nothing "
      "else took any."),
-    ("solve", "Solves", "With a factor that is there. Bytes: in a pass over the factor, eight vectors at "
+    ("solve", "Solves", "With a factor that is there. Bytes: in a pass over the factor, sixteen vectors at "
      "most, the values and the kept subscripts of U twice and five words a row, and three words a row for each "
      "vector. The places of x in the caches: three words an entry of U for each vector."),
     ("inverse", "Diagonal of the inverse",
