@@ -2,8 +2,8 @@
 //
 // There few vertices are left, and the boundary of an element takes in a good part of them. The union of some boundaries
 // is then counted sooner word by word than by visiting their vertices: the more so in designs with long lists of large
-// elements, such as animal models, whose last vertices would take as long as all others. Boundaries of fewer vertices
-// than words, and those for which no memory is left, are still visited.
+// elements, such as animal models, whose last vertices would take as long as all others. Small boundaries,
+// and those for which no memory is left, are still visited.
 #pragma once
 
 #include <algorithm>
@@ -33,7 +33,7 @@ class BoundaryBits {
   // Half of the vertices that were there have gone.
   bool outgrown(Index left) const { return in_use() && left <= least_; }
   static Index words_for(Index left) { return left / 64 + 1; }
-  // A visit of a vertex takes as long as a few words.
+  // A visit of a vertex takes as long as a few words: smaller boundaries have no row.
   static bool large(Index boundary, Index words) { return boundary >= words / kWordsPerVisit; }
 
   // For the `left` of n vertices, which are to be entered, and so many large boundaries. False when there is no memory

@@ -224,8 +224,8 @@ void OrderingGraph<Index>::cover_edges(const Index* boundary, Index size) {
   cover_hubs(last, times);
 }
 
-// Once counting has visited as many vertices as there are, and those of a boundary are more than the words that it would
-// take.
+// Once counting has visited as many vertices as the graph had, which pays for looking through them all, and a boundary has
+// as many vertices as it would take words.
 template <class Index>
 bool OrderingGraph<Index>::bits_due(Index boundary) const {
   const Index left = n_ - ordered_;

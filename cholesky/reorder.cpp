@@ -106,8 +106,9 @@ void for_each_entry(const SmMatrix& m, auto&& visit) {
   }
 }
 
-// As many entries are counted in half words, which a random walk finds in half the memory.
-constexpr i64 kShort = std::numeric_limits<std::uint32_t>::max();
+// As many entries, and rows, each of which has one, are counted in half words, which a random walk finds in half the
+// memory.
+constexpr i64 kHalfWord = std::numeric_limits<std::uint32_t>::max();
 
 // Through copies where the workspace has room for them: along cycles each entry waits for the memory of the one before.
 template <class Index>
@@ -144,7 +145,7 @@ SmStatus reorder(SmMatrix& m) {
   SM_PASS(may_reorder(m));
   give_back(m.pool, m.factor_reserved);  // the places that a refill found in an earlier order
   if (!reorder_border(m)) {
-    m.nnz <= kShort ? reorder_by_owners<std::uint32_t>(m) : reorder_by_owners<i64>(m);
+    m.nnz <= kHalfWord ? reorder_by_owners<std::uint32_t>(m) : reorder_by_owners<i64>(m);
   }
   m.state = SM_STATE_REORDERED;
   return SM_OK;

@@ -6,7 +6,8 @@
 namespace sm {
 
 // Moves the rows as closing left them, diagonal first and columns ascending, into the factor's order, by way of copies
-// of the entries that change rows. False, with nothing changed, where a row is different or the workspace has no room.
+// of the entries that change rows. False, with nothing changed, where there is no border of a few long rows that hold a
+// good part of the entries, where a row is different, or where the workspace has no room.
 bool reorder_border(SmMatrix& m);
 
 // Undoes reorder in the workspace that ordering left: upper triangle, columns ascending. Allocates nothing.

@@ -19,7 +19,9 @@ namespace {
 constexpr i64 kColumns = 256;  // of the rows walked side by side, at a time
 constexpr i64 kSideBySide = 16;
 constexpr i64 kShare = 8;  // a long row has an eighth of all columns, or more
-constexpr i64 kFew = 16;   // of that many rows, one is long: a matrix with more of them is nearly full
+constexpr i64 kFew = 16;   // of that many rows, one is long: with more of them most entries go where long rows go
+// A block holds all columns of the rows side by side, so that one that is moved whole is none of theirs.
+static_assert(kColumns >= kSideBySide);
 
 struct Moved {
   i64 column;

@@ -162,4 +162,27 @@ std::int64_t owned_blocks(const SmMatrix* matrix) {
   return one(matrix->dense_factor) + (matrix->owns_values ? one(matrix->values) : 0);
 }
 
+StoredRows reordered_rows(const SmMatrix* m) {
+  const std::int64_t n = m->rows;
+  std::vector<Indices> cols(at(n));
+  std::vector<std::vector<double>> values(at(n));
+  for (std::int64_t i = 0; i < n; ++i)
+    for (std::int64_t p = m->row_start[i]; p < m->row_start[i + 1]; ++p) {
+      const std::int64_t j = m->col_index[p];
+      const bool swap = m->inv_perm[j] < m->inv_perm[i];
+      auto& row = cols[at(swap ? j : i)];
+      auto& row_values = values[at(swap ? j : i)];
+      const bool front = i == j;
+      row.insert(front ? row.begin() : row.end(), swap ? i : j);
+      row_values.insert(front ? row_values.begin() : row_values.end(), m->nz_values[p]);
+    }
+  StoredRows want{{0}, {}, {}};
+  for (std::int64_t i = 0; i < n; ++i) {
+    want.col_index.insert(want.col_index.end(), cols[at(i)].begin(), cols[at(i)].end());
+    for (const std::uint64_t b : bits(values[at(i)])) want.value_bits.push_back(b);
+    want.row_start.push_back(static_cast<std::int64_t>(want.col_index.size()));
+  }
+  return want;
+}
+
 }  // namespace sm::test

@@ -42,6 +42,10 @@ Indices natural_order(std::int64_t n);
 // A block of exactly `capacity` words in place of the workspace.
 void replace_work(SmMatrix* matrix, std::int64_t capacity);
 
+// The rows of an ordered matrix as reordering is to leave them: every entry in the row of the index that comes first, the
+// diagonal in front, the rest as it was met.
+StoredRows reordered_rows(const SmMatrix* matrix);
+
 // U as the record holds it: columns of each row, from the compressed subscripts.
 std::vector<Indices> stored_structure(const SmMatrix* matrix);
 // What the workspace must hold at least: integers, two vectors of n, and the values of U.

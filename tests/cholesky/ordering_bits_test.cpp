@@ -3,6 +3,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <set>
 #include <span>
 #include <vector>
@@ -62,6 +63,21 @@ class OrderingBitsTest : public ::testing::Test {
     }
   }
 
+  // Memory of so many words, with more behind it that must stay as it is.
+  class Memory {
+   public:
+    explicit Memory(std::uint64_t words) : words_(words), all_(words + 64, kUntouched) {}
+    [[nodiscard]] std::span<std::byte> bytes() { return std::as_writable_bytes(std::span(all_).first(words_)); }
+    [[nodiscard]] bool overrun() const {
+      return std::any_of(all_.end() - 64, all_.end(), [](std::uint64_t word) { return word != kUntouched; });
+    }
+
+   private:
+    static constexpr std::uint64_t kUntouched = 0x5A5A5A5A5A5A5A5AU;
+    std::uint64_t words_;
+    std::vector<std::uint64_t> all_;
+  };
+
   Index n_ = 0;
   std::vector<Index> vertices_;
   std::vector<Boundary> boundaries_;
@@ -80,13 +96,14 @@ TYPED_TEST(OrderingBitsTest, counts_unions_with_room_for_every_large_boundary_or
     const std::uint64_t least = (std::uint64_t{this->n_} * sizeof(TypeParam) + 7) / 8 +
                                 (std::uint64_t{large} + 1) * BoundaryBits<TypeParam>::words_for(left);
     for (const std::uint64_t more : {std::uint64_t{0}, std::uint64_t{1}, std::uint64_t{5000}}) {
-      std::vector<std::uint64_t> memory(least + more, ~std::uint64_t{0});
-      BoundaryBits<TypeParam> bits(std::as_writable_bytes(std::span(memory)));
+      typename TestFixture::Memory memory(least + more);
+      BoundaryBits<TypeParam> bits(memory.bytes());
       EXPECT_FALSE(bits.in_use());
       ASSERT_TRUE(bits.start(this->n_, left, large));
       EXPECT_TRUE(bits.in_use());
       this->enter_all(bits);
       this->expect_unions(random, bits);
+      EXPECT_FALSE(memory.overrun());
     }
     if (this->HasFailure()) FAIL() << "seed " << seed;
   }
@@ -98,11 +115,12 @@ TYPED_TEST(OrderingBitsTest, counts_unions_of_boundaries_that_no_row_is_left_for
   this->choose(random, TypeParam{600});
   const auto left = static_cast<TypeParam>(this->vertices_.size());
   const std::uint64_t least = (600 * sizeof(TypeParam) + 7) / 8 + 3 * BoundaryBits<TypeParam>::words_for(left);
-  std::vector<std::uint64_t> memory(least);
-  BoundaryBits<TypeParam> bits(std::as_writable_bytes(std::span(memory)));
+  typename TestFixture::Memory memory(least);
+  BoundaryBits<TypeParam> bits(memory.bytes());
   ASSERT_TRUE(bits.start(this->n_, left, 2));
   this->enter_all(bits);
   this->expect_unions(random, bits);
+  EXPECT_FALSE(memory.overrun());
 }
 
 TYPED_TEST(OrderingBitsTest, does_not_start_without_memory) {

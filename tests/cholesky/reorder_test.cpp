@@ -1,8 +1,4 @@
-#include <algorithm>
 #include <cmath>
-#include <cstring>
-#include <string>
-#include <utility>
 
 #include "cholesky/cholesky_support.hpp"
 
@@ -20,30 +16,6 @@ class ReorderTest : public ModuleTest {
 };
 INSTANTIATE_BOTH_HOSTS(ReorderTest);
 
-// Where every entry belongs: the row of the index that comes first, the diagonal in front, the rest as it was met.
-StoredRows expected_rows(const SmMatrix* m) {
-  const std::int64_t n = m->rows;
-  std::vector<Indices> cols(at(n));
-  std::vector<std::vector<double>> values(at(n));
-  for (std::int64_t i = 0; i < n; ++i)
-    for (std::int64_t p = m->row_start[i]; p < m->row_start[i + 1]; ++p) {
-      const std::int64_t j = m->col_index[p];
-      const bool swap = m->inv_perm[j] < m->inv_perm[i];
-      auto& row = cols[at(swap ? j : i)];
-      auto& row_values = values[at(swap ? j : i)];
-      const bool front = i == j;
-      row.insert(front ? row.begin() : row.end(), swap ? i : j);
-      row_values.insert(front ? row_values.begin() : row_values.end(), m->nz_values[p]);
-    }
-  StoredRows want{{0}, {}, {}};
-  for (std::int64_t i = 0; i < n; ++i) {
-    want.col_index.insert(want.col_index.end(), cols[at(i)].begin(), cols[at(i)].end());
-    for (const std::uint64_t b : bits(values[at(i)])) want.value_bits.push_back(b);
-    want.row_start.push_back(static_cast<std::int64_t>(want.col_index.size()));
-  }
-  return want;
-}
-
 TEST_P(ReorderTest, moves_every_entry_to_the_row_of_the_index_that_comes_first) {
   for (std::uint64_t seed = 0; seed < 800; ++seed) {
     Random random(seed);
@@ -52,7 +24,7 @@ TEST_P(ReorderTest, moves_every_entry_to_the_row_of_the_index_that_comes_first) 
     SmMatrix* m = ordered(problem);
     if (random.chance(50)) impose_order(m, random.permutation(problem.n));
     if (random.chance(50)) replace_work(m, problem.n + m->nnz);  // no room but for the targets
-    const StoredRows want = expected_rows(m);
+    const StoredRows want = reordered_rows(m);
     ASSERT_EQ(qxsmreorder(m), SM_OK);
     EXPECT_EQ(m->state, SM_STATE_REORDERED);
     const StoredRows got = rows_of(m);
@@ -61,82 +33,6 @@ TEST_P(ReorderTest, moves_every_entry_to_the_row_of_the_index_that_comes_first) 
     EXPECT_EQ(got.value_bits, want.value_bits) << "seed " << seed;
     EXPECT_TRUE(near(dense_of_rows(m), problem.dense(), 0.0)) << "seed " << seed;
     destroy(m);
-  }
-}
-
-void expect_moved(SmMatrix* m, const std::string& what) {
-  const StoredRows want = expected_rows(m);
-  ASSERT_EQ(qxsmreorder(m), SM_OK) << what;
-  const StoredRows got = rows_of(m);
-  EXPECT_EQ(got.row_start, want.row_start) << what;
-  EXPECT_EQ(got.col_index, want.col_index) << what;
-  EXPECT_EQ(got.value_bits, want.value_bits) << what;
-}
-
-// `rows` long rows in front of small blocks, linked to that part of everything behind them, and as many rows without
-// them between the two where `apart`.
-Problem bordered(Random& random, std::int64_t rows, std::int64_t percent, bool apart) {
-  const std::int64_t first = apart ? 2 * rows : rows;
-  Graph g{first + 700 + random.below(600), {}};
-  for (std::int64_t i = 0; i < rows; ++i)
-    for (std::int64_t j = i + 1; j < g.n; ++j)
-      if (random.chance(percent)) g.edges.emplace_back(i, j);
-  for (std::int64_t i = first; i < g.n; ++i)
-    for (std::int64_t j = i + 1; j < g.n && (i - first) / 4 == (j - first) / 4; ++j) g.edges.emplace_back(i, j);
-  return positive_definite(g, random);
-}
-
-// The orders of a bordered matrix: computed, as stored, the border last, and any.
-void order_again(SmMatrix* m, std::int64_t which, Random& random) {
-  Indices order = natural_order(m->rows);
-  if (which == 2) std::reverse(order.begin(), order.end());
-  if (which == 3) order = random.permutation(m->rows);
-  if (which > 0) impose_order(m, order);
-}
-
-TEST_P(ReorderTest, moves_the_long_rows_of_a_border_like_any_other) {
-  for (std::uint64_t seed = 0; seed < 12; ++seed) {
-    Random random(seed);
-    constexpr std::int64_t kRows[] = {2, 3, 10, 16, 17, 35};
-    constexpr std::int64_t kPercent[] = {100, 100, 99, 85};
-    const Problem problem =
-        bordered(random, kRows[seed % 6], kPercent[static_cast<std::size_t>(random.below(4))], random.chance(30));
-    for (std::int64_t which = 0; which < 4; ++which) {
-      SmMatrix* m = ordered(problem);
-      order_again(m, which, random);
-      if (random.chance(50)) replace_work(m, problem.n + m->nnz);  // mostly no room for the copies
-      expect_moved(m, "seed " + std::to_string(seed) + " order " + std::to_string(which));
-      destroy(m);
-    }
-  }
-}
-
-TEST_P(ReorderTest, moves_a_border_in_exactly_the_room_that_its_entries_need) {
-  Random random(11);
-  const Problem problem = bordered(random, 5, 100, false);
-  const std::int64_t n = problem.n;
-  const std::int64_t moving = 5 * (n - 5);  // to the rows of the blocks, when these come first in their order
-  Indices order = natural_order(n);
-  std::rotate(order.begin(), order.begin() + 5, order.end());
-  for (const std::int64_t missing : {0, 1}) {
-    SmMatrix* m = ordered(problem);
-    impose_order(m, order);
-    replace_work(m, 2 * n + 2 * moving - missing);
-    expect_moved(m, "missing " + std::to_string(missing));
-  }
-}
-
-TEST_P(ReorderTest, moves_long_rows_that_closing_did_not_write) {
-  Random random(12);
-  const Problem problem = bordered(random, 4, 100, false);
-  const std::int64_t n = problem.n;
-  for (const std::int64_t entry : {std::int64_t{1}, std::int64_t{300}, n - 2, n + 400, 4 * n}) {
-    for (std::int64_t which = 0; which < 4; ++which) {
-      SmMatrix* m = ordered(problem);
-      order_again(m, which, random);
-      std::swap(m->col_index[entry], m->col_index[entry + 1]);
-      expect_moved(m, "entry " + std::to_string(entry) + " order " + std::to_string(which));
-    }
   }
 }
 
