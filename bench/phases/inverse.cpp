@@ -115,8 +115,8 @@ class InverseBench {
     };
     // The diagonal of the peer's has been compared with solves.
     const auto fault = [&] {
-      std::string fault = pattern_fault(bench_.rows(), ours);
-      return fault.empty() && !theirs.empty() ? difference(ours, theirs) : fault;
+      std::string wrong = pattern_fault(bench_.rows(), ours);
+      return wrong.empty() && !theirs.empty() ? difference(ours, theirs) : wrong;
     };
     record("inverse", "on the pattern", {{kPeer, run_peer, [] { return ""; }}, {kOurs, run, fault}});
   }
