@@ -32,6 +32,15 @@ SM_PASS_INLINE const Lanes& lanes_at(const double* p) { return *reinterpret_cast
 
 constexpr i64 kPlacesAhead = 32;  // rows whose places in the lanes are fetched early
 
+// Of the eight rows that come kPlacesAhead after row i; kWrite is 1 where they will be written.
+template <int kWide, int kWrite>
+SM_PASS_INLINE void fetch_places(const RowOrder& order, const double* y, i64 i) {
+  for (i64 r = 0; r < kLanes; ++r) {
+    const double* ahead = y + order.place[std::min(i + kPlacesAhead + r, order.n - 1)] * kWide * kLanes;
+    for (i64 h = 0; h < kWide; ++h) __builtin_prefetch(ahead + h * kLanes, kWrite);
+  }
+}
+
 template <int kWide>
 SM_PASS_TARGET void pack(const RowOrder& order, const double* b, double* y) {
   constexpr i64 kAll = i64{kWide} * kLanes;
@@ -42,10 +51,7 @@ SM_PASS_TARGET void pack(const RowOrder& order, const double* b, double* y) {
     for (i64 v = 0; v < kAll; ++v) y[place[i] * kAll + v] = b[i + v * n];
   }
   for (; i < n; i += kLanes) {
-    for (i64 r = 0; r < kLanes; ++r) {
-      const double* ahead = y + place[std::min(i + kPlacesAhead + r, n - 1)] * kAll;
-      for (i64 h = 0; h < kWide; ++h) __builtin_prefetch(ahead + h * kLanes, 1);
-    }
+    fetch_places<kWide, 1>(order, y, i);
     for (i64 h = 0; h < kWide; ++h) {
       Lanes t[kLanes];
 #pragma GCC unroll 8
@@ -67,10 +73,7 @@ SM_PASS_TARGET void unpack(const RowOrder& order, const double* y, double* x) {
     for (i64 v = 0; v < kAll; ++v) x[i + v * n] = y[place[i] * kAll + v];
   }
   for (; i < n; i += kLanes) {
-    for (i64 r = 0; r < kLanes; ++r) {
-      const double* ahead = y + place[std::min(i + kPlacesAhead + r, n - 1)] * kAll;
-      for (i64 h = 0; h < kWide; ++h) __builtin_prefetch(ahead + h * kLanes);
-    }
+    fetch_places<kWide, 0>(order, y, i);
     for (i64 h = 0; h < kWide; ++h) {
       Lanes t[kLanes];
 #pragma GCC unroll 8

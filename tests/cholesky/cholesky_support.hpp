@@ -42,6 +42,17 @@ Indices natural_order(std::int64_t n);
 // A block of exactly `capacity` words in place of the workspace.
 void replace_work(SmMatrix* matrix, std::int64_t capacity);
 
+// For tests of what comes after the ordering.
+class OrderedTest : public ModuleTest {
+ protected:
+  SmMatrix* ordered(const Problem& problem) {
+    SmMatrix* m = new_sparse(session(), problem);
+    EXPECT_EQ(qxsmmd(m), SM_OK);
+    return m;
+  }
+  void destroy(SmMatrix* m) { EXPECT_EQ(fn().qxsmDestroyMatrix(instance(), &m), SM_OK); }
+};
+
 // The rows of an ordered matrix as reordering is to leave them: every entry in the row of the index that comes first, the
 // diagonal in front, the rest as it was met.
 StoredRows reordered_rows(const SmMatrix* matrix);

@@ -9,15 +9,7 @@
 namespace sm::test {
 namespace {
 
-class ReorderBorderTest : public ModuleTest {
- protected:
-  SmMatrix* ordered(const Problem& problem) {
-    SmMatrix* m = new_sparse(session(), problem);
-    EXPECT_EQ(qxsmmd(m), SM_OK);
-    return m;
-  }
-  void destroy(SmMatrix* m) { EXPECT_EQ(fn().qxsmDestroyMatrix(instance(), &m), SM_OK); }
-};
+class ReorderBorderTest : public OrderedTest {};
 INSTANTIATE_BOTH_HOSTS(ReorderBorderTest);
 
 void expect_moved(SmMatrix* m, const std::string& what) {

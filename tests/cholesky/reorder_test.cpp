@@ -5,15 +5,7 @@
 namespace sm::test {
 namespace {
 
-class ReorderTest : public ModuleTest {
- protected:
-  SmMatrix* ordered(const Problem& problem) {
-    SmMatrix* m = new_sparse(session(), problem);
-    EXPECT_EQ(qxsmmd(m), SM_OK);
-    return m;
-  }
-  void destroy(SmMatrix* m) { EXPECT_EQ(fn().qxsmDestroyMatrix(instance(), &m), SM_OK); }
-};
+class ReorderTest : public OrderedTest {};
 INSTANTIATE_BOTH_HOSTS(ReorderTest);
 
 TEST_P(ReorderTest, moves_every_entry_to_the_row_of_the_index_that_comes_first) {
