@@ -274,8 +274,11 @@ void OrderingGraph<Index>::eliminate_all() {
       return;
     }
     update_degrees(boundary, made, ordered_ - before);
-    if (bits_.in_use()) bits_.add(pivot, boundary, made.size);
-    if (bits_due(made.size)) use_bits();
+    if (bits_due(made.size)) {
+      use_bits();
+    } else if (bits_.in_use()) {
+      bits_.add(pivot, boundary, made.size);
+    }
   }
 }
 

@@ -138,7 +138,6 @@ bool MovedEntries::has_border() const {
 }
 
 bool MovedEntries::count() {
-  if (m_.work_capacity < 2 * n_) return false;
   std::fill_n(next_, n_, 0);
   bool as_closed = true;
   i64 all = 0;
@@ -237,6 +236,7 @@ void MovedEntries::join() {
 }  // namespace
 
 bool reorder_border(SmMatrix& m) {
+  if (m.work_capacity < 2 * m.rows) return false;
   MovedEntries entries(m);
   if (!entries.has_border() || !entries.count()) return false;
   entries.take_out();
