@@ -22,9 +22,9 @@ def product(*factors):
     return math.prod(factors) if None not in factors else None
 
 
-def latency(run, size):
+def latency(machine, size):
     """Seconds of a dependent load over so many bytes: between the sizes that were measured, by their logarithm."""
-    points = sorted((p["bytes"], p["seconds"]) for p in run.machine.get("latency", []))
+    points = sorted((p["bytes"], p["seconds"]) for p in machine.get("latency", []))
     if not points or not size:
         return None
     if size <= points[0][0]:
@@ -35,10 +35,10 @@ def latency(run, size):
     return points[-1][1]
 
 
-def rates(run, r, flops=None, moved=None):
+def rates(r, flops=None, moved=None):
     """Of a job of so many operations on so many bytes, beside dgemm and copying; the nearer of the two bounds."""
     gflops, gbytes = quotient(flops, r.ours()), quotient(moved, r.ours())
-    of_dgemm, of_copy = quotient(gflops, run.machine["dgemm"]), quotient(gbytes, run.machine["copy"])
+    of_dgemm, of_copy = quotient(gflops, r.machine["dgemm"]), quotient(gbytes, r.machine["copy"])
     nearest, bound = None, None
     if of_dgemm is not None and of_copy is not None:
         nearest, bound = max((of_dgemm, "dgemm"), (of_copy, "copying"))
@@ -46,20 +46,20 @@ def rates(run, r, flops=None, moved=None):
             "of_copy": of_copy, "nearest": nearest, "bound": bound}
 
 
-def loads(run, r, count, size):
+def loads(r, count, size):
     """Time of one of `count`, in nanoseconds and in dependent loads over so many bytes."""
-    each, load = quotient(r.ours(), count), latency(run, size)
+    each, load = quotient(r.ours(), count), latency(r.machine, size)
     return {"ns": product(each, 1e9), "load_ns": product(load, 1e9), "loads": quotient(each, load)}
 
 
 def of_assembly(run, r):
     count = r.facts.get("contributions")
     map_ns = product(quotient(r.seconds("std::map"), count), 1e9)
-    numbers = loads(run, r, count, r.facts.get("tree_bytes"))
+    numbers = loads(r, count, r.facts.get("tree_bytes"))
     if r.variant != "random order":
         numbers["loads"] = None  # what comes next is near by, and fetched ahead
     return {"million": quotient(product(count, 1e-6), r.ours()), "map_ns": map_ns, "map_fifth": product(map_ns, 0.2),
-            "near_load_ns": product(latency(run, 2**20), 1e9), "twenty_ns": 50.0 * machine_scale(run), **numbers}
+            "near_load_ns": product(latency(r.machine, 2**20), 1e9), "twenty_ns": 50.0 * machine_scale(r), **numbers}
 
 
 def of_ordering(run, r):
@@ -68,13 +68,13 @@ def of_ordering(run, r):
             "of_amd_flops": quotient(fill[OURS], fill["AMD"]), "of_metis_flops": quotient(fill[OURS], fill["METIS"]),
             "amd_ns": product(quotient(r.seconds("AMD"), r.entries), 1e9),
             "of_amd_time": quotient(r.ours(), r.seconds("AMD")),
-            **loads(run, r, r.entries, r.facts.get("graph_bytes"))}
+            **loads(r, r.entries, r.facts.get("graph_bytes"))}
 
 
 def of_symbolic(run, r):
     peer = r.seconds("CHOLMOD supernodal")
-    return {"peer_ns": product(quotient(peer, r.entries), 1e9), **loads(run, r, r.entries, 16.0 * r.entries),
-            **rates(run, r, moved=r.facts.get("bytes"))}
+    return {"peer_ns": product(quotient(peer, r.entries), 1e9), **loads(r, r.entries, 16.0 * r.entries),
+            **rates(r, moved=r.facts.get("bytes"))}
 
 
 def row_length(numeric):
@@ -83,9 +83,9 @@ def row_length(numeric):
 
 
 def of_numeric(run, r):
-    numbers = rates(run, r, r.facts.get("flops"), r.facts.get("bytes"))
+    numbers = rates(r, r.facts.get("flops"), r.facts.get("bytes"))
     return {"row": row_length(r), "each_ns": quotient(2.0, numbers["gflops"]),
-            "scattered_ns": product(run.machine.get("scattered"), 1e9), **numbers}
+            "scattered_ns": product(r.machine.get("scattered"), 1e9), **numbers}
 
 
 def of_solve(run, r):
@@ -98,7 +98,7 @@ def of_solve(run, r):
     touched = moved + places if None not in (moved, places) else None
     return {"metis_fill": quotient(metis, ours), "row": row_length(r),
             "touched": product(quotient(touched, r.ours()), 1e-9),
-            **rates(run, r, r.facts.get("flops"), r.facts.get("bytes"))}
+            **rates(r, r.facts.get("flops"), r.facts.get("bytes"))}
 
 
 def shares(steps, names):
@@ -122,21 +122,21 @@ def of_inverse(run, r):
     """Each entry of a row of U meets each other one: twice the operations of the factorization."""
     numeric = run.find(r, "numeric")
     flops = product(2.0, numeric.facts.get("flops") if numeric else None)
-    return {"row": row_length(numeric), **rates(run, r, flops)}
+    return {"row": row_length(numeric), **rates(r, flops)}
 
 
 def of_refactor(run, r):
     refilling, numeric = r.facts.get("refilling"), run.find(r, "numeric")
     speed = quotient(r.facts.get("refill_bytes"), refilling)
     return {"refill_ms": product(refilling, 1e3), "refill_gbytes": product(speed, 1e-9),
-            "of_copy": quotient(speed, run.machine["copy"]),
+            "of_copy": quotient(speed, r.machine["copy"]),
             "share_refill": product(quotient(refilling, r.ours()), 100.0),
             "numeric_ms": product(r.facts.get("numeric"), 1e3),
             "first_ms": product(numeric.ours() if numeric else None, 1e3)}
 
 
 def of_moving(run, r):
-    return {"matrix_mb": 16e-6 * r.entries, "vector_mb": 8e-6 * r.n, **rates(run, r, moved=r.facts.get("bytes"))}
+    return {"matrix_mb": 16e-6 * r.entries, "vector_mb": 8e-6 * r.n, **rates(r, moved=r.facts.get("bytes"))}
 
 
 MEASURED = {

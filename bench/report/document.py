@@ -25,7 +25,7 @@ def write(run, reasons, folder):
         "Written by `bench/run`; not edited by hand. Times are medians of five runs of everybody in turns, in one "
         "process and on one thread; in brackets the number of runs where one took long. A ratio above 1 means that "
         "the module is faster than the best of the others.\n",
-        page.disturbed(run) + page.conditions(run),
+        page.together(run) + page.disturbed(run) + page.conditions(run),
         "## Targets\n",
         "Absolute times are scaled by the copy rate, from a machine that copies at 23 GB/s.\n",
         page.overview(run),

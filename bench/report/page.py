@@ -61,14 +61,21 @@ def conditions(run):
         ["module", f"commit {m['commit']}"],
         ["peers", f"CHOLMOD {m['cholmod']}, METIS {m['metis']}, Eigen {m['eigen']}, {m['openblas'].strip()}"],
         ["OpenBLAS kernels", m["kernels"]],
-        ["dgemm, order 2000", f"{m['dgemm'] / 1e9:.1f} GFLOP/s"],
-        ["copy, read and written", f"{m['copy'] / 1e9:.1f} GB/s"],
+        ["dgemm, order 2000", f"{span(run, 'dgemm')} GFLOP/s"],
+        ["copy, read and written", f"{span(run, 'copy')} GB/s"],
         ["a dependent load", latencies(m)],
         ["an addition to a scattered place", f"{m['scattered'] * 1e9:.2f} ns within 256 kB" if "scattered" in m else "–"],
-        ["load when the run began", f"{m['load']:.1f} (one minute)"],
+        ["load when a run began", f"{span(run, 'load', 1.0)} (one minute)"],
         ["clock", clock],
     ]
     return text.table(["", ""], rows, left=2)
+
+
+def span(run, name, unit=1e9):
+    """Of the runs that the page is put together from."""
+    values = [machine[name] / unit for machine in run.machines]
+    least, most = f"{min(values):.1f}", f"{max(values):.1f}"
+    return least if least == most else f"{least} to {most}"
 
 
 def latencies(machine):
@@ -76,9 +83,16 @@ def latencies(machine):
     return ", ".join(points) or "–"
 
 
+def together(run):
+    """A sentence when the page has more than one run."""
+    count = len(run.machines)
+    return "" if count == 1 else (f"Put together from {count} runs of the program; every result is held to the rates "
+                                  "that were measured when its own run began.\n\n")
+
+
 def disturbed(run):
     """A sentence when the machine was not ours alone."""
-    if run.machine["load"] <= 0.7:
+    if max(machine["load"] for machine in run.machines) <= 0.7:
         return ""
     return ("**The machine was busy with other work during this run** (see the load below). Processor time leaves out "
             "the time of others but not what they did to caches and memory, so ratios here are worth less than those "

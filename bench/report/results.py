@@ -19,6 +19,7 @@ class Result:
     variant: str
     times: dict = field(default_factory=dict)
     facts: dict = field(default_factory=dict)
+    machine: dict = field(default_factory=dict)  # as it was when the file of this result began
 
     def seconds(self, name):
         """Median of a program; None when it did not run or was wrong."""
@@ -61,7 +62,7 @@ class Run:
         times = {t["name"]: t for t in record["times"]}
         result = Result(
             record["family"], record["case"], record["n"], record["entries"], record["phase"], record["variant"],
-            times, record["facts"])
+            times, record["facts"], self.machine)
         # A later run of the same job takes the place of an earlier one.
         results[result.family, result.case, result.phase, result.variant] = result
 

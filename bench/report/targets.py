@@ -58,14 +58,14 @@ def faster(phase, families, required, text, variant="", peers=None):
     return Target(phase, tuple(families), text, judge)
 
 
-def machine_scale(run):
+def machine_scale(r):
     """Absolute times were set for a machine that copies at 23 GB/s."""
-    return COPY_OF_REFERENCE / run.machine["copy"]
+    return COPY_OF_REFERENCE / r.machine["copy"]
 
 
 def seconds(phase, family, case, limit, text):
     def judge(run):
-        return [Verdict(r, r.ours(), limit * machine_scale(run), at_most=True)
+        return [Verdict(r, r.ours(), limit * machine_scale(r), at_most=True)
                 for r in run.of(phase, (family,)) if r.case == case]
     return Target(phase, (family,), text, judge, "s")
 
@@ -88,18 +88,18 @@ def hubs_stay_linear(run):
 def entries_per_second(variant, required):
     def judge(run):
         return [Verdict(r, r.facts["contributions"] / r.ours() / 1e6 if r.ours() else None,
-                        required / machine_scale(run))
+                        required / machine_scale(r))
                 for r in run.of("assembly", GRIDS, variant)]
     return judge
 
 
 def product_bandwidth(run):
-    return [Verdict(r, r.facts["bytes"] / r.ours() / run.machine["copy"] if r.ours() else None, 0.8)
+    return [Verdict(r, r.facts["bytes"] / r.ours() / r.machine["copy"] if r.ours() else None, 0.8)
             for r in run.of("product", None, "1 vector")]
 
 
 def share_of_dgemm(run):
-    return [Verdict(r, r.facts["flops"] / r.ours() / run.machine["dgemm"] if r.ours() else None, 0.7)
+    return [Verdict(r, r.facts["flops"] / r.ours() / r.machine["dgemm"] if r.ours() else None, 0.7)
             for r in run.of("numeric", ("b",)) if r.n >= 200000]
 
 

@@ -99,12 +99,29 @@ def numbers_of(run):
 
 
 class Bounds(unittest.TestCase):
+    def test_a_result_is_held_to_the_rates_of_its_own_run(self):
+        files = []
+        for copy, case in ((10e9, "first"), (40e9, "second")):
+            machine = {"machine": {**MACHINE["machine"], "copy": copy, "load": copy / 10e9}}
+            job = record("a", case, 9, "product", {OURS: 1.0}, "1 vector", bytes=8e9)
+            files.append(tempfile.NamedTemporaryFile("w", suffix=".jsonl"))
+            files[-1].write(json.dumps(machine) + "\n" + json.dumps(job) + "\n")
+            files[-1].flush()
+        run = Run([file.name for file in files])
+        for file in files:
+            file.close()
+        self.assertEqual([v.measured for v in verdicts(run, "product", "80 %")], [0.8, 0.2])
+        self.assertEqual([bounds.measured(run, r)["of_copy"] for r in run.results], [0.8, 0.2])
+        self.assertIn("10.0 to 40.0 GB/s", page.conditions(run))
+        self.assertIn("busy", page.disturbed(run))
+        self.assertIn("2 runs", page.together(run))
+
     def test_latency_lies_between_the_sizes_that_were_measured(self):
         run = bounded()
-        self.assertEqual([bounds.latency(run, size) for size in (1, 2**20, 2**24, 2**30)],
+        self.assertEqual([bounds.latency(run.machine, size) for size in (1, 2**20, 2**24, 2**30)],
                          [10e-9, 10e-9, 140e-9, 180e-9])
-        self.assertAlmostEqual(bounds.latency(run, 2**22), 75e-9)
-        self.assertIsNone(bounds.latency(run_of(), 2**22))
+        self.assertAlmostEqual(bounds.latency(run.machine, 2**22), 75e-9)
+        self.assertIsNone(bounds.latency(run_of().machine, 2**22))
 
     def test_the_nearest_bound_is_the_larger_share(self):
         numbers = numbers_of(bounded(record("d", "x", 9, "numeric", {OURS: 1.0}, flops=10e9, bytes=8e9)))
