@@ -78,7 +78,8 @@ Json describe_machine(const std::string& module_file, Clock clock) {
             {"dgemm", rates.gemm},
             {"copy", rates.copy},
             {"latency", latencies()},
-            {"scattered", scattered_addition(std::size_t{1} << 18)}}}};
+            {"scattered", scattered_addition(std::size_t{1} << 18)},
+            {"update", vector_update(std::size_t{1} << 20)}}}};
 }
 
 }  // namespace sm::bench

@@ -12,6 +12,7 @@
 #include "bench/cases.hpp"
 #include "bench/generators/matrix_file.hpp"
 #include "bench/harness/clock.hpp"
+#include "bench/harness/memory.hpp"
 #include "bench/machine.hpp"
 #include "bench/peers/lapack.hpp"
 #include "bench/phases/phases.hpp"
@@ -66,6 +67,7 @@ void run_cases(const Options& options, Module& module, Records& records) {
 int run(const Options& options) {
   chosen_clock() = options.clock;
   use_one_thread();
+  keep_freed_memory();
   Module module;
   Records records(options.output);
   records.write(describe_machine(module.file(), options.clock));

@@ -1,4 +1,5 @@
 // The C API of the embedded host and the services it hands to extensions.
+#include <algorithm>
 #include <cstdlib>
 
 #include "host/checker.hpp"
@@ -48,6 +49,7 @@ extern "C" QxHost* qxhost_create(const QxHostOptions* options) {
   if (!host) return nullptr;
   host->services.create_pool = create_pool;
   host->services.load_extension = load_extension;
+  host->kept_pages.set_limit(sm::host::KeptPages::kUsualLimit);
   bool complete = sm::host::begin_search_beside_host(host->loader);
   if (options) {
     host->account.ceiling = options->memory_ceiling;
@@ -85,6 +87,10 @@ extern "C" const char* qxhost_last_error(const QxHost* host) { return host->load
 extern "C" void qxhost_set_memory_ceiling(QxHost* host, uint64_t bytes) { host->account.ceiling = bytes; }
 
 extern "C" void qxhost_trim(QxHost* host) { host->kept_pages.trim(); }
+
+extern "C" void qxhost_set_kept_memory(QxHost* host, uint64_t bytes) {
+  host->kept_pages.set_limit(std::min(bytes, sm::host::kLargestBlock));
+}
 
 extern "C" int32_t qxhost_set_pool_ceiling(QxHost* host, MemoryPool* pool, uint64_t bytes) {
   PoolHead* head = host->pools;

@@ -76,14 +76,19 @@ Pages KeptPages::take(std::uint64_t span, bool zero) {
   return mapped.start || !trim() ? mapped : map_pages(whole);
 }
 
+void KeptPages::set_limit(std::uint64_t bytes) {
+  limit_ = bytes;
+  while (bytes_ > most()) drop_oldest();
+}
+
 void KeptPages::give(Pages pages) {
   const auto same = [&](const Pages& kept) { return kept.start == pages.start; };
   if (std::any_of(kept_, kept_ + count_, same)) return;  // freed twice
-  if (pages.span > kLargestKept) {
+  if (pages.span > limit_ / 2 + kPage) {
     release(pages);
     return;
   }
-  while (count_ == kMostSpans || bytes_ + pages.span > kMostKept) drop_oldest();
+  while (count_ == kMostSpans || bytes_ + pages.span > most()) drop_oldest();
   ASAN_POISON_MEMORY_REGION(pages.start, pages.span);
   kept_[count_++] = pages;
   bytes_ += pages.span;

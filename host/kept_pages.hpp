@@ -17,12 +17,13 @@ class KeptPages {
  public:
   static constexpr std::uint64_t kPage = 4096;
   static constexpr std::uint32_t kMostSpans = 64;
-  // With the page in front of each block. Larger ones go back to the system at once.
-  static constexpr std::uint64_t kLargestKept = (std::uint64_t{32} << 20) + kPage;
-  static constexpr std::uint64_t kMostKept = (std::uint64_t{64} << 20) + kMostSpans * kPage;
+  static constexpr std::uint64_t kUsualLimit = std::uint64_t{64} << 20;
   // Beyond this many zeros fresh pages are the better ones: much of what is asked for may never be touched.
   static constexpr std::uint64_t kMostZeroed = (std::uint64_t{4} << 20) + kPage;
 
+  // Bytes of blocks that are kept from now on, without the page in front of each. Blocks of more than half of that go
+  // back to the system at once.
+  void set_limit(std::uint64_t bytes);
   // At least `span` bytes, of zeros if so asked. Huge pages begin with the second page, if there are any.
   Pages take(std::uint64_t span, bool zero);
   // Keeps them, or gives them or older ones back to the system.
@@ -33,12 +34,14 @@ class KeptPages {
 
  private:
   Pages take_kept(std::uint64_t span);
+  [[nodiscard]] std::uint64_t most() const { return limit_ + kMostSpans * kPage; }
   void forget(std::uint32_t place);
   void drop_oldest();
 
   Pages kept_[kMostSpans];  // the oldest first
   std::uint32_t count_;
   std::uint64_t bytes_;
+  std::uint64_t limit_;
 };
 
 }  // namespace sm::host

@@ -27,6 +27,11 @@ __attribute__((noinline, optimize("no-tree-vectorize"))) void add_run(double* y,
   for (std::size_t k = 0; k < kRun; ++k) y[place[k]] += a * x[k];
 }
 
+__attribute__((noinline)) void add_vector(double* __restrict y, const double* __restrict x, double a,
+                                          std::size_t count) {
+  for (std::size_t k = 0; k < count; ++k) y[k] += a * x[k];
+}
+
 }  // namespace
 
 // Sattolo, "An algorithm to generate a random cyclic permutation", Information Processing Letters 22, 1986.
@@ -67,6 +72,20 @@ double scattered_addition(std::size_t bytes) {
   double least = 1e300;
   for (int k = 0; k < kTimes; ++k) least = std::min(least, seconds_of(pass));
   return least / static_cast<double>(kAdditions);
+}
+
+double vector_update(std::size_t bytes) {
+  constexpr int kTimes = 5, kPasses = 20;
+  const std::size_t count = bytes / (2 * sizeof(double));
+  std::vector<double> y(count, 0.0);
+  const std::vector<double> x(count, 1.0);
+  double least = 1e300;
+  for (int time = 0; time < kTimes; ++time) {
+    least = std::min(least, seconds_of([&] {
+                       for (int k = 0; k < kPasses; ++k) add_vector(y.data(), x.data(), 0.5, count);
+                     }));
+  }
+  return kPasses * 3.0 * sizeof(double) * static_cast<double>(count) / least;
 }
 
 }  // namespace sm::bench

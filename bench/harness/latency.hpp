@@ -1,5 +1,5 @@
-// What memory takes where it is not read in a row: a load whose address the load before it gave, and adding to places that
-// a list names.
+// What bounds a job that copying and dgemm do not: a load whose address the load before it gave, adding to places that a
+// list names, and adding vectors that are in the caches.
 #pragma once
 
 #include <cstddef>
@@ -17,5 +17,8 @@ double dependent_load(std::size_t bytes);
 // Seconds for y[place[k]] += a * x[k], in runs of a few ascending places over `bytes` of y, as thin rows of a factor add
 // to others.
 double scattered_addition(std::size_t bytes);
+
+// Bytes a second of y += a * x, three words an element, x and y together as large.
+double vector_update(std::size_t bytes);
 
 }  // namespace sm::bench

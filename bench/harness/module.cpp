@@ -7,11 +7,18 @@
 
 namespace sm::bench {
 
+namespace {
+
+constexpr std::uint64_t kKeptMemory = std::uint64_t{16} << 30;
+
+}  // namespace
+
 void expect_ok(SmStatus status, const char* doing) {
   if (status != SM_OK) throw std::runtime_error(fmt::format("{} ended with status {}", doing, status));
 }
 
 Module::Module() : extension_(host_), instance_(extension_) {
+  host_.set_kept_memory(kKeptMemory);
   if (!instance_) throw std::runtime_error(fmt::format("the module cannot be loaded: {}", host_.last_error()));
   Dl_info info{};
   dladdr(reinterpret_cast<void*>(fn().qxsmfact), &info);

@@ -3,9 +3,6 @@
 #include <fmt/format.h>
 
 #include <algorithm>
-
-#include "bench/harness/warm_memory.hpp"
-
 namespace sm::bench {
 namespace {
 
@@ -37,13 +34,10 @@ std::vector<Outcome> run_race(const Race& race, const std::vector<Contestant>& c
       outcome.not_run = fmt::format("about {:.0f} s expected", forecast.expected(job, race.n));
     }
   }
-  WarmMemory memory;
   for (int round = 0; round < race.rounds; ++round) {
     for (std::size_t k = 0; k < contestants.size(); ++k) {
       if (round >= rounds_of(outcomes[k], race.rounds)) continue;
-      memory.before_run();
       outcomes[k].seconds.push_back(contestants[k].run());
-      memory.after_run();
       if (outcomes[k].fault.empty()) outcomes[k].fault = contestants[k].fault();
     }
   }

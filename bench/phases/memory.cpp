@@ -2,7 +2,7 @@
 // set of the process grew above that while it was factored.
 #include <cstdio>
 
-#include "bench/harness/warm_memory.hpp"
+#include "bench/harness/memory.hpp"
 #include "bench/phases/phases.hpp"
 
 namespace sm::bench {

@@ -96,8 +96,12 @@ def of_solve(run, r):
     places = product(24.0, r.facts.get("factor_entries"), r.facts.get("count"))
     moved = r.facts.get("bytes")
     touched = moved + places if None not in (moved, places) else None
-    return {"metis_fill": quotient(metis, ours), "row": row_length(r),
-            "touched": product(quotient(touched, r.ours()), 1e-9),
+    speed = quotient(touched, r.ours())
+    # One vector: on the way down every entry adds to a place of its own.
+    scattered = product(r.machine.get("scattered"), r.facts.get("factor_entries"))
+    return {"metis_fill": quotient(metis, ours), "row": row_length(r), "touched": product(speed, 1e-9),
+            "of_update": quotient(speed, r.machine.get("update")), "of_scattered": quotient(scattered, r.ours()),
+            "scattered_ns": product(r.machine.get("scattered"), 1e9),
             **rates(r, r.facts.get("flops"), r.facts.get("bytes"))}
 
 
@@ -122,7 +126,8 @@ def of_inverse(run, r):
     """Each entry of a row of U meets each other one: twice the operations of the factorization."""
     numeric = run.find(r, "numeric")
     flops = product(2.0, numeric.facts.get("flops") if numeric else None)
-    return {"row": row_length(numeric), **rates(r, flops)}
+    return {"row": row_length(numeric), "gflop": product(flops, 1e-9),
+            "dgemm_seconds": quotient(flops, r.machine["dgemm"]), **rates(r, flops)}
 
 
 def of_refactor(run, r):
@@ -163,6 +168,7 @@ COLUMNS = {
         ("fastest peer: analysis / numeric / solve", lambda m: parts(m, [f"peer_{name}" for name in STEPS_OF_PEERS])),
         ("without the ordering", "without_ordering"), ("the ordering alone", "ordering_alone")],
     "solve": [("of the copy rate", "of_copy"), ("GB/s", "gbytes"), ("with the places of x, GB/s", "touched"),
+              ("of adding vectors", "of_update"),
               ("GFLOP/s", "gflops")],
     "inverse": [("GFLOP/s", "gflops"), ("of dgemm", "of_dgemm"), ("entries of a row of U", "row")],
     "trace": [("GFLOP/s", "gflops"), ("of dgemm", "of_dgemm"), ("entries of a row of U", "row")],

@@ -28,8 +28,8 @@ PHASES = [
      "numeric phase; the supernodal one makes them and is the peer here. Bytes: an entry of A read and written, 32, "
      "the subscripts of U and four words a row."),
     ("numeric", "Numeric factorization",
-     "The module's own permutation given to all. Everybody allocates anew in each run; the module's host, as the C "
-     "library for the peers, keeps pages of moderate size from the run before. Bytes: "
+     "The module's own permutation given to all. Everybody allocates anew in each run, from memory that the run before "
+     "has freed: the module's host and the C library of the peers keep it. Bytes: "
      "16 for each entry of U, written and read, and 16 for each of A; the nearest bound is the larger share."),
     ("total", "Order, factor and solve",
      "From a closed matrix to one solution, everybody with orderings of their own. The steps of the module are timed "
@@ -65,6 +65,7 @@ def conditions(run):
         ["copy, read and written", f"{span(run, 'copy')} GB/s"],
         ["a dependent load", latencies(m)],
         ["an addition to a scattered place", f"{m['scattered'] * 1e9:.2f} ns within 256 kB" if "scattered" in m else "–"],
+        ["adding one vector to another", f"{m['update'] / 1e9:.0f} GB/s within 1 MB" if "update" in m else "–"],
         ["load when a run began", f"{span(run, 'load', 1.0)} (one minute)"],
         ["clock", clock],
     ]

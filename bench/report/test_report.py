@@ -90,7 +90,7 @@ def bounded(*records, latency=((2**20, 10e-9), (2**24, 140e-9), (2**28, 180e-9))
     """A run on a machine whose rates are easy to reckon with."""
     run = run_of(*records)
     run.machine.update(dgemm=dgemm, copy=copy, latency=[{"bytes": b, "seconds": s} for b, s in latency],
-                       scattered=0.5e-9)
+                       scattered=0.5e-9, update=10e9)
     return run
 
 
@@ -159,12 +159,16 @@ class Bounds(unittest.TestCase):
         run = bounded(record("a", "x", 9, "numeric", {OURS: 1.0}, flops=10e9),
                       record("a", "x", 9, "inverse", {OURS: 0.5}))
         self.assertAlmostEqual(numbers_of(run)["gflops"], 40.0)
+        self.assertAlmostEqual(numbers_of(run)["gflop"], 20.0)
+        self.assertAlmostEqual(numbers_of(run)["dgemm_seconds"], 0.2)
 
     def test_a_solve_touches_its_vectors_at_every_entry(self):
         numbers = numbers_of(bounded(record("a", "x", 10**6, "solve", {OURS: 0.5}, factor_entries=10**7, count=2,
                                             bytes=2e9, flops=8e7)))
         self.assertAlmostEqual(numbers["of_copy"], 0.2)
         self.assertAlmostEqual(numbers["touched"], (2.0 + 0.48) / 0.5)
+        self.assertAlmostEqual(numbers["of_update"], 0.496)
+        self.assertAlmostEqual(numbers["of_scattered"], 0.01)
         self.assertAlmostEqual(numbers["row"], 10.0)
 
     def test_refilling_is_judged_by_what_it_moves(self):

@@ -298,6 +298,40 @@ TEST_F(PoolTest, sizes_that_are_powers_of_two_are_kept_up_to_the_limits) {
   EXPECT_EQ(block[100], 0);
 }
 
+TEST_F(PoolTest, more_freed_pages_are_kept_when_the_host_is_told_so) {
+  qxhost_set_kept_memory(host, 80 * kMiB);
+  const std::int64_t before = resident_bytes();
+  std::vector<char*> blocks;
+  for (int k = 0; k < 3; ++k) {
+    blocks.push_back(take(40 * kMiB));
+    ASSERT_NE(blocks.back(), nullptr);
+    std::memset(blocks.back(), 1, 40 * kMiB);
+  }
+  for (char* block : blocks) pool->free(pool, block);
+  EXPECT_GT(resident_bytes() - before, 75 * std::int64_t{kMiB});
+  EXPECT_LT(resident_bytes() - before, 90 * std::int64_t{kMiB});
+  EXPECT_EQ(take(40 * kMiB), blocks[1]);
+  EXPECT_EQ(take(40 * kMiB), blocks[2]);
+}
+
+TEST_F(PoolTest, lowering_what_may_wait_gives_the_oldest_pages_back_at_once) {
+  qxhost_set_kept_memory(host, 60 * kMiB);
+  std::vector<char*> blocks;
+  for (int k = 0; k < 3; ++k) {
+    blocks.push_back(take(20 * kMiB));
+    ASSERT_NE(blocks.back(), nullptr);
+    std::memset(blocks.back(), 1, 20 * kMiB);
+  }
+  for (char* block : blocks) pool->free(pool, block);
+  const std::int64_t before = resident_bytes();
+  qxhost_set_kept_memory(host, 45 * kMiB);
+  EXPECT_LT(resident_bytes() - before, -15 * std::int64_t{kMiB});
+  EXPECT_GT(resident_bytes() - before, -25 * std::int64_t{kMiB});
+  qxhost_set_kept_memory(host, 0);
+  EXPECT_LT(resident_bytes() - before, -55 * std::int64_t{kMiB});
+  EXPECT_EQ(qxhost_usage(host).bytes_in_use, 0U);
+}
+
 TEST_F(PoolTest, pages_that_were_asked_for_many_zeros_are_not_kept) {
   const std::int64_t before = resident_bytes();
   for (int round = 0; round < 3; ++round) {

@@ -15,7 +15,8 @@
  * Small blocks come from chunks; from 128 KiB on a block has pages of its own, which cost nothing until they are first
  * touched. When such a block is freed its pages go back to the system at once if they are more than 32 MiB (if zeros
  * were asked for: 4 MiB); others wait for a request of about their size, at most 64 of them and 64 MiB, until younger
- * ones push them out, memory is short, or qxhost_trim or qxhost_destroy is called. Zeros up to 4 MiB are written into
+ * ones push them out, memory is short, or qxhost_trim or qxhost_destroy is called. qxhost_set_kept_memory lets more of
+ * them wait, for programs that factor large systems again and again. Zeros up to 4 MiB are written into
  * such pages. A request that cannot be met, because of a ceiling, of the system, or of a size near 2^64, is answered
  * with null. free(pool, NULL) does nothing; a block that is freed twice or in another pool is not noticed outside the
  * checking mode.
@@ -92,6 +93,10 @@ QXHOST_API void qxhost_set_memory_ceiling(QxHost* host, uint64_t bytes);
 
 /* Gives the pages of freed blocks that wait for their next use back to the system. Live blocks stay as they are. */
 QXHOST_API void qxhost_trim(QxHost* host);
+
+/* Sets how many bytes of freed blocks wait for their next use (at first 64 MiB); blocks of more than half of that do
+ * not wait, nor those of more than 4 MiB that were asked for zeros. What waits beyond it goes back, the oldest first. */
+QXHOST_API void qxhost_set_kept_memory(QxHost* host, uint64_t bytes);
 
 /* Sets a ceiling for one pool of this host (0: none). Answers 0, or -1 when the pool is not this host's. */
 QXHOST_API int32_t qxhost_set_pool_ceiling(QxHost* host, MemoryPool* pool, uint64_t bytes);

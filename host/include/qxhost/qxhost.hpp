@@ -55,6 +55,9 @@ class Host {
   void set_memory_ceiling(uint64_t bytes) noexcept {
     if (host_) qxhost_set_memory_ceiling(host_, bytes);
   }
+  void set_kept_memory(std::uint64_t bytes) noexcept {
+    if (host_) qxhost_set_kept_memory(host_, bytes);
+  }
   void trim() noexcept {
     if (host_) qxhost_trim(host_);
   }
