@@ -49,6 +49,15 @@ Json latencies() {
   return list;
 }
 
+Json scattered_additions() {
+  Json list = Json::array();
+  for (const std::size_t kilobytes : {256, 2048, 16384}) {
+    const std::size_t bytes = kilobytes << 10;
+    list.push_back({{"bytes", bytes}, {"seconds", scattered_addition(bytes)}});
+  }
+  return list;
+}
+
 }  // namespace
 
 Json describe_machine(const std::string& module_file, Clock clock) {
@@ -78,7 +87,7 @@ Json describe_machine(const std::string& module_file, Clock clock) {
             {"dgemm", rates.gemm},
             {"copy", rates.copy},
             {"latency", latencies()},
-            {"scattered", scattered_addition(std::size_t{1} << 18)},
+            {"scattered", scattered_additions()},
             {"update", vector_update(std::size_t{1} << 20)}}}};
 }
 

@@ -59,7 +59,7 @@ double scattered_addition(std::size_t bytes) {
   constexpr std::size_t kAdditions = std::size_t{1} << 20;
   constexpr int kTimes = 5;
   std::vector<double> y(bytes / sizeof(double));
-  std::vector<std::int64_t> place(std::size_t{1} << 14);
+  std::vector<std::int64_t> place(std::max(std::size_t{1} << 14, y.size() / kRun));  // about each line once
   Random random(23);
   for (auto& p : place) p = static_cast<std::int64_t>(random.bits() % y.size());
   for (auto run = place.begin(); run != place.end(); run += kRun) std::sort(run, run + kRun);

@@ -22,9 +22,13 @@ def product(*factors):
     return math.prod(factors) if None not in factors else None
 
 
-def latency(machine, size):
-    """Seconds of a dependent load over so many bytes: between the sizes that were measured, by their logarithm."""
-    points = sorted((p["bytes"], p["seconds"]) for p in machine.get("latency", []))
+NEAR = 2**18  # bytes within the second cache
+
+
+def latency(machine, size, of="latency"):
+    """Seconds of a dependent load, or of a "scattered" addition, over so many bytes: between the sizes that were
+    measured, by their logarithm."""
+    points = sorted((p["bytes"], p["seconds"]) for p in machine.get(of, []))
     if not points or not size:
         return None
     if size <= points[0][0]:
@@ -33,6 +37,11 @@ def latency(machine, size):
         if size <= high:
             return before + (after - before) * math.log(size / low) / math.log(high / low)
     return points[-1][1]
+
+
+def scattered(r, size):
+    """Seconds of an addition to a place that a list names, over so many bytes."""
+    return latency(r.machine, size, "scattered")
 
 
 def rates(r, flops=None, moved=None):
@@ -85,7 +94,7 @@ def row_length(numeric):
 def of_numeric(run, r):
     numbers = rates(r, r.facts.get("flops"), r.facts.get("bytes"))
     return {"row": row_length(r), "each_ns": quotient(2.0, numbers["gflops"]),
-            "scattered_ns": product(r.machine.get("scattered"), 1e9), **numbers}
+            "scattered_ns": product(scattered(r, NEAR), 1e9), **numbers}
 
 
 def of_solve(run, r):
@@ -98,10 +107,11 @@ def of_solve(run, r):
     touched = moved + places if None not in (moved, places) else None
     speed = quotient(touched, r.ours())
     # One vector: on the way down every entry adds to a place of its own.
-    scattered = product(r.machine.get("scattered"), r.facts.get("factor_entries"))
+    addition = scattered(r, max(NEAR, 8.0 * r.n))
+    additions = product(addition, r.facts.get("factor_entries"))
     return {"metis_fill": quotient(metis, ours), "row": row_length(r), "touched": product(speed, 1e-9),
-            "of_update": quotient(speed, r.machine.get("update")), "of_scattered": quotient(scattered, r.ours()),
-            "scattered_ns": product(r.machine.get("scattered"), 1e9),
+            "of_update": quotient(speed, r.machine.get("update")), "of_scattered": quotient(additions, r.ours()),
+            "scattered_ns": product(addition, 1e9),
             **rates(r, r.facts.get("flops"), r.facts.get("bytes"))}
 
 
@@ -141,7 +151,11 @@ def of_refactor(run, r):
 
 
 def of_moving(run, r):
-    return {"matrix_mb": 16e-6 * r.entries, "vector_mb": 8e-6 * r.n, **rates(r, moved=r.facts.get("bytes"))}
+    addition = scattered(r, 16.0 * r.n)  # an entry reads a place of x and adds to one of y
+    return {"matrix_mb": 16e-6 * r.entries, "vector_mb": 8e-6 * r.n,
+            "ns": product(quotient(r.ours(), r.entries), 1e9), "scattered_ns": product(addition, 1e9),
+            "of_scattered": quotient(product(addition, r.entries), r.ours()),
+            **rates(r, moved=r.facts.get("bytes"))}
 
 
 MEASURED = {

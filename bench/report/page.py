@@ -64,7 +64,7 @@ def conditions(run):
         ["dgemm, order 2000", f"{span(run, 'dgemm')} GFLOP/s"],
         ["copy, read and written", f"{span(run, 'copy')} GB/s"],
         ["a dependent load", latencies(m)],
-        ["an addition to a scattered place", f"{m['scattered'] * 1e9:.2f} ns within 256 kB" if "scattered" in m else "–"],
+        ["an addition to a scattered place", latencies(m, "scattered")],
         ["adding one vector to another", f"{m['update'] / 1e9:.0f} GB/s within 1 MB" if "update" in m else "–"],
         ["load when a run began", f"{span(run, 'load', 1.0)} (one minute)"],
         ["clock", clock],
@@ -79,8 +79,8 @@ def span(run, name, unit=1e9):
     return least if least == most else f"{least} to {most}"
 
 
-def latencies(machine):
-    points = [f"{p['seconds'] * 1e9:.0f} ns over {p['bytes'] / 2**20:.0f} MB" for p in machine.get("latency", [])]
+def latencies(machine, of="latency"):
+    points = [f"{p['seconds'] * 1e9:.2g} ns over {p['bytes'] / 2**20:.3g} MB" for p in machine.get(of, [])]
     return ", ".join(points) or "–"
 
 

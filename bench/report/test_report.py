@@ -1,6 +1,7 @@
 """Tests of the page: python3 test_report.py RESULTS, the JSON lines of a complete run."""
 
 import json
+import math
 import os
 import sys
 import tempfile
@@ -90,7 +91,7 @@ def bounded(*records, latency=((2**20, 10e-9), (2**24, 140e-9), (2**28, 180e-9))
     """A run on a machine whose rates are easy to reckon with."""
     run = run_of(*records)
     run.machine.update(dgemm=dgemm, copy=copy, latency=[{"bytes": b, "seconds": s} for b, s in latency],
-                       scattered=0.5e-9, update=10e9)
+                       scattered=[{"bytes": 2**18, "seconds": 0.5e-9}, {"bytes": 2**24, "seconds": 2e-9}], update=10e9)
     return run
 
 
@@ -133,6 +134,12 @@ class Bounds(unittest.TestCase):
         numbers = numbers_of(bounded(record("d", "x", 9, "numeric", {OURS: 2.0}, flops=8e9, bytes=1e9)))
         self.assertEqual((numbers["each_ns"], numbers["scattered_ns"]), (0.5, 0.5))
 
+    def test_an_entry_of_a_product_stands_beside_a_scattered_addition_over_both_vectors(self):
+        numbers = numbers_of(bounded(record("d", "x", 2**20, "product", {OURS: 3 * 2**20 * 4e-9}, bytes=1e9)))
+        self.assertAlmostEqual(numbers["ns"], 4.0)
+        self.assertAlmostEqual(numbers["scattered_ns"], 2.0)
+        self.assertAlmostEqual(numbers["of_scattered"], 0.5)
+
     def test_without_the_ordering_the_other_steps_decide(self):
         steps = {OURS: {"ordering": 0.6, "symbolic": 0.1, "numeric": 0.2, "solve": 0.1},
                  "fast": {"analysis": 1.0, "numeric": 0.5, "solve": 0.5}}
@@ -168,7 +175,9 @@ class Bounds(unittest.TestCase):
         self.assertAlmostEqual(numbers["of_copy"], 0.2)
         self.assertAlmostEqual(numbers["touched"], (2.0 + 0.48) / 0.5)
         self.assertAlmostEqual(numbers["of_update"], 0.496)
-        self.assertAlmostEqual(numbers["of_scattered"], 0.01)
+        addition = 0.5 + 1.5 * math.log2(8e6 / 2**18) / 6  # of the six doublings between the two sizes
+        self.assertAlmostEqual(numbers["scattered_ns"], addition)
+        self.assertAlmostEqual(numbers["of_scattered"], 0.02 * addition)
         self.assertAlmostEqual(numbers["row"], 10.0)
 
     def test_refilling_is_judged_by_what_it_moves(self):
