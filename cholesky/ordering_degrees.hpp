@@ -233,7 +233,7 @@ template <class Index>
 Index OrderingGraph<Index>::count_by_bits(Index v) {
   Vertex& mine = vertex(v);
   bits_.clear();
-  walk_elements(mine, [this](Element& e, Index name) { bits_.join(name, arena_ + e.begin, e.size); });
+  walk_elements(mine, [this](Element& e, Index name) { visits_ += e.size; bits_.join(name, arena_ + e.begin, e.size); });
   return bits_.count() + mine.vertices;
 }
 

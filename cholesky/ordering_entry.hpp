@@ -37,7 +37,9 @@ OrderingGraph<Index>::OrderingGraph(i64 vertices, const EdgeCount& count, std::s
       mark_(reinterpret_cast<Index*>(inv_perm)),
       head_(sizeof(Index) == 4 ? mark_ + n_ : slots_),
       lists_(graph_, head_, time_, n_),
-      bits_(spare) {
+      bits_(spare),
+      half_left_(n_ / 2),
+      visits_due_(vertices) {
   if (sizeof(Index) != 4) slots_ += n_;
   arena_ = slots_ + slots(vertices, count);
   const auto before = static_cast<std::size_t>(reinterpret_cast<std::byte*>(arena_) - memory.data());

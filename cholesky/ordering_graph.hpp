@@ -149,7 +149,7 @@ class OrderingGraph {
   Index take_minimum();
   Index count_degree(Index v, Index enough);
   Index count_by_bits(Index v);
-  bool bits_due(Index boundary) const;
+  bool bits_due(Index boundary);
   void use_bits();
   void number(Index v) {
     mark_[v] = kGone;
@@ -204,6 +204,8 @@ class OrderingGraph {
   Index* head_;  // of the degree lists; of a wide index elsewhere
   DegreeLists<Index, Node> lists_;
   BoundaryBits<Index> bits_;
+  Index half_left_;
+  i64 visits_due_;
   i64 visits_ = 0;  // vertices seen in counting, since bits were thought of
   Index ordered_ = 0;
   Index stamp_ = kGone - 1000;  // so that no ordering of some size goes without the restart
