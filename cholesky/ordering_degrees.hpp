@@ -212,7 +212,15 @@ Index OrderingGraph<Index>::count_degree(Index v, Index enough) {
   const Index stamp = stamp_;
   const Index marked = marked_stamp_;
   Index degree = first.size + mine.vertices;
-  for (Index k = mine.cells - 1; k-- > 0 && degree <= enough;) {
+  const Index most = std::min(enough, n_ - ordered_ - 1);
+  for (Index k = mine.cells - 1; k-- > 0 && degree <= most;) {
+    if (k >= 4) __builtin_prefetch(&graph_[list[k - 4]]);
+    if (k >= 2) {
+      const Index* next = arena_ + element(list[k - 2]).begin;
+      __builtin_prefetch(next);
+      __builtin_prefetch(next + 16);
+      __builtin_prefetch(next + 32);
+    }
     const Element& e = element(list[k]);
     const Index* boundary = arena_ + e.begin;
     const Index size = e.size;
