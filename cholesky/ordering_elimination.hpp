@@ -93,6 +93,7 @@ Index* OrderingGraph<Index>::add_neighbours(Index pivot, Index* end) {
     if (mark_[v] >= stamp_) continue;  // eliminated, or covered by an element of the pivot
     mark_[v] = stamp_;
     --vertex(v).vertices;
+    __builtin_prefetch(&lists_of(vertex(v)));
     --left;
     *end++ = v;
   }

@@ -199,6 +199,7 @@ void OrderingGraph<Index>::enter(const SmMatrix& m) {
   for (Index i = 0; count_.tidy && i < n_; ++i) is_hub(vertex(i)) ? enter_hub(m, i) : enter_row(m, i);
   join_hubs();
   if (count_.long_rows > static_cast<i64>(hub_count_)) own_edges(end);
+  vertex(n_) = {};
   lists_.clear();
   for (Index v = 0; v < n_; ++v) {
     mark_[v] = 0;

@@ -147,6 +147,7 @@ class OrderingGraph {
   }
   void restart_stamps();
   Index take_minimum();
+  void fetch_next(Index degree) const;
   Index count_degree(Index v, Index enough);
   Index count_by_bits(Index v);
   bool bits_due(Index boundary);
