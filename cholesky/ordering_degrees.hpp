@@ -223,7 +223,7 @@ Index OrderingGraph<Index>::count_degree(Index v, Index enough) {
   const Index stamp = stamp_;
   const Index marked = marked_stamp_;
   Index degree = first.size + mine.vertices;
-  const Index most = std::min(enough, n_ - ordered_ - 1);
+  const Index most = std::min(enough, n_ - ordered_ - 1);  // beyond it there is nobody else
   for (Index k = mine.cells - 1; k-- > 0 && degree <= most;) {
     if (k >= 4) __builtin_prefetch(&graph_[list[k - 4]]);
     if (k >= 2) {

@@ -235,12 +235,14 @@ bool OrderingGraph<Index>::bits_due(Index boundary) {
   if (left > half_left_) return counted && !bits_.in_use() && boundary >= bits_.words_for(left);
   half_left_ = left / 2;
   visits_ = 0;
+  visits_due_ = static_cast<i64>(n_);
   if (!bits_.in_use() || !bits_.outgrown(left)) return false;
   if (!counted) bits_.stop();
   return counted;
 }
 
-// After a refusal counting has to go on for twice as long before all is looked through again.
+// After a refusal counting has to go on for twice as long before all is looked through again: where many boundaries are
+// short, as those of the records of a student, there is no room for them to the end.
 template <class Index>
 void OrderingGraph<Index>::use_bits() {
   visits_ = 0;
