@@ -75,6 +75,9 @@ class DegreeLists {
     *(*link == v ? link : &at(before).sibling) = heir;
   }
 
+  // The newest vertex of this degree; the node at the end of links when there is none.
+  Index top(Index degree) const { return head_[degree - 1]; }
+
   // The newest vertex of the least degree. There must be one.
   Index first() {
     while (head_[least_ - 1] == none_) ++least_;

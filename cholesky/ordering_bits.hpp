@@ -30,6 +30,7 @@ class BoundaryBits {
         words_of_memory_(memory.size() / sizeof(std::uint64_t)) {}
 
   bool in_use() const { return words_ != 0; }
+  void stop() { words_ = 0; }
   // Half of the vertices that were there have gone.
   bool outgrown(Index left) const { return in_use() && left <= least_; }
   static Index words_for(Index left) { return left / 64 + 1; }

@@ -100,7 +100,7 @@ typename OrderingGraph<Index>::Element OrderingGraph<Index>::purge(Index pivot, 
     if (b + 2 < size) {
       const Vertex& next = vertex(boundary[b + 2]);
       const Index* ahead = elements_of(next);
-      const Index cells = std::min<Index>(next.cells, 4);
+      const Index cells = std::min<Index>(next.cells, 8);
       for (Index k = 0; k < cells; ++k) __builtin_prefetch(&graph_[ahead[k]]);
     }
     if (lists_.holds(v)) lists_.remove(v);
@@ -174,6 +174,14 @@ void OrderingGraph<Index>::update_degrees(const Index* boundary, const Element& 
   }
 }
 
+// The pivot that comes next, unless this one leaves a lower degree, and the node of the one after it.
+template <class Index>
+void OrderingGraph<Index>::fetch_next(Index degree) const {
+  const Vertex& next = vertex(lists_.top(degree));
+  __builtin_prefetch(slots_ + next.list);
+  __builtin_prefetch(&graph_[next.child]);
+}
+
 // The newest of the vertices of least degree; what is only bounded is counted on the way.
 template <class Index>
 Index OrderingGraph<Index>::take_minimum() {
@@ -181,7 +189,10 @@ Index OrderingGraph<Index>::take_minimum() {
     const Index v = lists_.first();
     const Index least = vertex(v).degree;
     lists_.remove(v);
-    if (lists_.known(v) == Known::exact) return v;
+    if (lists_.known(v) == Known::exact) {
+      fetch_next(least);
+      return v;
+    }
     const Index enough = bits_.in_use() ? n_ : 2 * least + 8;
     const Index degree = bits_.in_use() ? count_by_bits(v) : count_degree(v, enough);
     if (degree == least) {
@@ -212,7 +223,15 @@ Index OrderingGraph<Index>::count_degree(Index v, Index enough) {
   const Index stamp = stamp_;
   const Index marked = marked_stamp_;
   Index degree = first.size + mine.vertices;
-  for (Index k = mine.cells - 1; k-- > 0 && degree <= enough;) {
+  const Index most = std::min(enough, n_ - ordered_ - 1);  // beyond it there is nobody else
+  for (Index k = mine.cells - 1; k-- > 0 && degree <= most;) {
+    if (k >= 4) __builtin_prefetch(&graph_[list[k - 4]]);
+    if (k >= 2) {
+      const Index* next = arena_ + element(list[k - 2]).begin;
+      __builtin_prefetch(next);
+      __builtin_prefetch(next + 16);
+      __builtin_prefetch(next + 32);
+    }
     const Element& e = element(list[k]);
     const Index* boundary = arena_ + e.begin;
     const Index size = e.size;
@@ -233,7 +252,10 @@ template <class Index>
 Index OrderingGraph<Index>::count_by_bits(Index v) {
   Vertex& mine = vertex(v);
   bits_.clear();
-  walk_elements(mine, [this](Element& e, Index name) { bits_.join(name, arena_ + e.begin, e.size); });
+  walk_elements(mine, [this](Element& e, Index name) {
+    visits_ += e.size;
+    bits_.join(name, arena_ + e.begin, e.size);
+  });
   return bits_.count() + mine.vertices;
 }
 

@@ -93,6 +93,7 @@ Index* OrderingGraph<Index>::add_neighbours(Index pivot, Index* end) {
     if (mark_[v] >= stamp_) continue;  // eliminated, or covered by an element of the pivot
     mark_[v] = stamp_;
     --vertex(v).vertices;
+    __builtin_prefetch(&lists_of(vertex(v)));
     --left;
     *end++ = v;
   }
@@ -224,14 +225,24 @@ void OrderingGraph<Index>::cover_edges(const Index* boundary, Index size) {
   cover_hubs(last, times);
 }
 
-// Once counting has visited as many vertices as the graph had, which pays for looking through them all, and a boundary has
-// as many vertices as it would take words.
+// Once counting has visited as many vertices as the graph had, which pays for looking through them all, and a boundary
+// has as many vertices as it would take words. What was counted when twice as many vertices were left tells nothing:
+// grids have their ties to settle at the beginning, and nothing later.
 template <class Index>
-bool OrderingGraph<Index>::bits_due(Index boundary) const {
+bool OrderingGraph<Index>::bits_due(Index boundary) {
   const Index left = n_ - ordered_;
-  return bits_.in_use() ? bits_.outgrown(left) : visits_ > static_cast<i64>(n_) && boundary >= bits_.words_for(left);
+  const bool counted = visits_ > visits_due_;
+  if (left > half_left_) return counted && !bits_.in_use() && boundary >= bits_.words_for(left);
+  half_left_ = left / 2;
+  visits_ = 0;
+  visits_due_ = static_cast<i64>(n_);
+  if (!bits_.in_use() || !bits_.outgrown(left)) return false;
+  if (!counted) bits_.stop();
+  return counted;
 }
 
+// After a refusal counting has to go on for twice as long before all is looked through again: where many boundaries are
+// short, as those of the records of a student, there is no room for them to the end.
 template <class Index>
 void OrderingGraph<Index>::use_bits() {
   visits_ = 0;
@@ -247,7 +258,11 @@ void OrderingGraph<Index>::use_bits() {
   const Index left = n_ - ordered_;
   const Index words = bits_.words_for(left);
   visit_boundaries([&](Index, const Index*, Index size) { large += bits_.large(size, words); });
-  if (!bits_.start(n_, left, large)) return;
+  if (!bits_.start(n_, left, large)) {
+    visits_due_ *= 2;
+    return;
+  }
+  half_left_ = left / 2;
   for (Index v = 0; v < n_; ++v) {
     if (mark_[v] != kGone) bits_.enter(v);
   }

@@ -37,7 +37,9 @@ OrderingGraph<Index>::OrderingGraph(i64 vertices, const EdgeCount& count, std::s
       mark_(reinterpret_cast<Index*>(inv_perm)),
       head_(sizeof(Index) == 4 ? mark_ + n_ : slots_),
       lists_(graph_, head_, time_, n_),
-      bits_(spare) {
+      bits_(spare),
+      half_left_(n_ / 2),
+      visits_due_(vertices) {
   if (sizeof(Index) != 4) slots_ += n_;
   arena_ = slots_ + slots(vertices, count);
   const auto before = static_cast<std::size_t>(reinterpret_cast<std::byte*>(arena_) - memory.data());
@@ -197,6 +199,7 @@ void OrderingGraph<Index>::enter(const SmMatrix& m) {
   for (Index i = 0; count_.tidy && i < n_; ++i) is_hub(vertex(i)) ? enter_hub(m, i) : enter_row(m, i);
   join_hubs();
   if (count_.long_rows > static_cast<i64>(hub_count_)) own_edges(end);
+  vertex(n_) = {};
   lists_.clear();
   for (Index v = 0; v < n_; ++v) {
     mark_[v] = 0;

@@ -31,7 +31,8 @@
 // - Degrees are bounded: from above by the sum of these numbers, from below by their maximum and by the former bound
 //   less what has been eliminated since. Where the bounds meet the degree is known. Else the lower one enters the
 //   degree lists, with the time when the degree was due, and the count waits until it is the least of all.
-// - Late in an elimination degrees are counted by bits (ordering_bits.hpp). Hardly any list is walked then.
+// - Late in an elimination degrees are counted by bits (ordering_bits.hpp), as long as there is much to count. Hardly any
+//   list is walked then.
 // - A vertex that a prototype outmatches has at least its degree and an earlier time, so that it is never taken before
 //   the prototype, which touches it: whether it is in the lists makes no difference.
 // - Once an element bounds all that is left, only the order of its boundary matters (ordering_finish.hpp).
@@ -147,9 +148,10 @@ class OrderingGraph {
   }
   void restart_stamps();
   Index take_minimum();
+  void fetch_next(Index degree) const;
   Index count_degree(Index v, Index enough);
   Index count_by_bits(Index v);
-  bool bits_due(Index boundary) const;
+  bool bits_due(Index boundary);
   void use_bits();
   void number(Index v) {
     mark_[v] = kGone;
@@ -204,7 +206,9 @@ class OrderingGraph {
   Index* head_;  // of the degree lists; of a wide index elsewhere
   DegreeLists<Index, Node> lists_;
   BoundaryBits<Index> bits_;
-  i64 visits_ = 0;  // vertices seen in counting, since bits were thought of
+  Index half_left_;  // vertices left when it is asked whether bits still pay
+  i64 visits_due_;   // vertices that are to be seen in counting before bits are thought of
+  i64 visits_ = 0;   // those that were, since then
   Index ordered_ = 0;
   Index stamp_ = kGone - 1000;  // so that no ordering of some size goes without the restart
   Index marked_ = kGone;        // the element whose whole boundary bears the mark marked_stamp_

@@ -123,7 +123,7 @@ TYPED_TEST(OrderingBitsTest, counts_unions_of_boundaries_that_no_row_is_left_for
   EXPECT_FALSE(memory.overrun());
 }
 
-TYPED_TEST(OrderingBitsTest, does_not_start_without_memory) {
+TYPED_TEST(OrderingBitsTest, does_not_start_without_memory_and_can_be_stopped) {
   std::vector<std::uint64_t> memory(1000 * sizeof(TypeParam) / 8 + 4 * 11 - 1);
   BoundaryBits<TypeParam> bits(std::as_writable_bytes(std::span(memory)));
   EXPECT_FALSE(bits.start(1000, 640, 3));
@@ -131,6 +131,10 @@ TYPED_TEST(OrderingBitsTest, does_not_start_without_memory) {
   EXPECT_TRUE(bits.start(1000, 640, 2));
   EXPECT_FALSE(bits.start(1000, 640, 3));  // also in place of what there was
   EXPECT_FALSE(bits.in_use());
+  EXPECT_TRUE(bits.start(1000, 640, 2));
+  bits.stop();
+  EXPECT_FALSE(bits.in_use());
+  EXPECT_FALSE(bits.outgrown(0));
   BoundaryBits<TypeParam> none({});
   EXPECT_FALSE(none.start(1, 1, 0));
 }

@@ -106,6 +106,24 @@ TEST_P(OrderingRoadsTest, designs_with_long_ends_get_one_order) {
   }
 }
 
+// Late in an elimination boundaries become bits where the workspace has room for them beside the graph: from the start
+// in some of these sizes, and when half of the vertices have gone again; in others it is refused each time.
+TEST_P(OrderingRoadsTest, one_order_comes_from_a_workspace_of_any_size) {
+  Random random(7);
+  Graph graph = pedigree(random, 6000, 12);
+  const Graph beside = crossed(random, 250, 4000, 3);
+  for (const auto& [i, j] : beside.edges) graph.edges.emplace_back(graph.n + i, graph.n + j);
+  graph.n += beside.n;
+  SmMatrix* m = closed(graph);
+  const Answer plain = order_again(m, Road::plain);
+  for (std::int64_t k = 0; k < 8; ++k) {
+    const Answer narrow = order_again(m, Road::narrow, 1 + k * m->nnz / 8);
+    EXPECT_EQ(narrow.status, SM_OK);
+    EXPECT_TRUE(narrow.perm == plain.perm) << "workspace of " << narrow.capacity;
+  }
+  destroy(m);
+}
+
 TEST_P(OrderingRoadsTest, every_graph_of_up_to_four_vertices_gets_one_order) {
   Random random(1);
   for (std::int64_t n = 1; n <= 4; ++n) {
