@@ -121,7 +121,8 @@ SmStatus SymbolicRows<Index>::own_entries(i64 k, bool& is_tail) {
   return SM_OK;
 }
 
-// The chain of a row to come: its first tail, and where that of a later row begins. What is chained later comes without.
+// The chain of a row to come: its first tail, and where that of a later row begins. What is chained until then comes
+// without.
 template <class Index>
 inline void SymbolicRows<Index>::fetch_chains(i64 k) const {
   if (k + kChainAhead >= n_) return;
@@ -200,9 +201,10 @@ void SymbolicRows<Index>::collect_extras(i64 k, i64 others) {
   }
 }
 
-// Leaves the extras ascending. Many of them, unless they are few among the columns to come, are marked in a bitmap of the columns to come, together with the tail, and
-// the whole row read from there; the tail is then empty. The bitmap takes the last of the words that hold the columns
-// collected: what is written stays behind what is read, even when no column is missing.
+// Leaves the extras ascending. Many of them are marked in a bitmap of the columns to come, together with the tail, and
+// the whole row read from there; the tail is then empty. Where they are few among these columns, each goes where as many
+// are smaller. The bitmap takes the last of the words that hold the columns collected: what is written stays behind what
+// is read, even when no column is missing.
 template <class Index>
 void SymbolicRows<Index>::sort_extras(i64 k) {
   const i64 columns = n_ - k - 1;

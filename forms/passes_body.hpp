@@ -208,7 +208,7 @@ SM_PASS_INLINE double exchange_runs(const UpperRows& a, i64& p, i64 end, double 
     if (a.col_index[p + kRun - 1] != k + kRun - 1) break;
     __builtin_prefetch(a.col_index + p + kRunsAhead * kRun);
     __builtin_prefetch(a.col_index + p + kRunsAhead * kRun + kRun - 1);
-    for (i64 e = 0; e < kRun; e += 2 * kSums) {
+    for (i64 e = 0; e < kRun; e += i64{2} * kSums) {
       const double* v = a.values + p + e;
       __builtin_prefetch(v + kEntriesAhead);
       __builtin_prefetch(v + kEntriesAhead + kSums);
@@ -221,8 +221,8 @@ SM_PASS_INLINE double exchange_runs(const UpperRows& a, i64& p, i64 end, double 
   return total_of(part[0] + part[1]);
 }
 
-// Entries p to `end` of a row that reaches a part of all columns, as those of a border do. Not inlined: short rows, which
-// most are, keep the registers.
+// Entries p to `end` of a row that reaches a part of all columns, as those of a border do. Not inlined: the loop over
+// short rows, which most are, keeps the registers.
 SM_PASS_TARGET __attribute__((noinline)) double exchange_border(const UpperRows& a, i64 p, i64 end, double t,
                                                                 const double* x, double* y) {
   double sum = 0.0;
