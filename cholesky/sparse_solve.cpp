@@ -63,8 +63,8 @@ class SparseSolve {
   const SubstitutionPasses& passes_ = substitution_passes();
 };
 
-// Where a cache line begins, at `x` or before. The elements in between are the last of a vector, which unpack writes when
-// it has read all lanes.
+// Where a cache line begins, at `x` or before. The elements in between are the last of a vector, which unpack writes
+// when it has read all lanes.
 double* room_behind(double* x, i64 n) {
   if (n < i64{2} * kLanes) return x;
   return x - reinterpret_cast<std::uintptr_t>(x) % kLine / sizeof(double);

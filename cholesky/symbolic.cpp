@@ -202,9 +202,9 @@ void SymbolicRows<Index>::collect_extras(i64 k, i64 others) {
 }
 
 // Leaves the extras ascending. Many of them are marked in a bitmap of the columns to come, together with the tail, and
-// the whole row read from there; the tail is then empty. Where they are few among these columns, each goes where as many
-// are smaller. The bitmap takes the last of the words that hold the columns collected: what is written stays behind what
-// is read, even when no column is missing.
+// the whole row read from there; the tail is then empty. Where they are few among these columns, each goes where as
+// many are smaller. The bitmap takes the last of the words that hold the columns collected: what is written stays behind
+// what is read, even when no column is missing.
 template <class Index>
 void SymbolicRows<Index>::sort_extras(i64 k) {
   const i64 columns = n_ - k - 1;
