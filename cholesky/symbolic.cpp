@@ -35,7 +35,8 @@ constexpr i64 kBitmapGain = 4;  // comparing costs an extra as much as reading a
 constexpr i64 kBits = 64;
 constexpr i64 kLine = 8;  // words of a line of the cache
 
-constexpr i64 kChainAhead = 8;  // rows between what is fetched of one and its turn
+constexpr i64 kChainAhead = 8;    // rows between what is fetched of one and its turn
+constexpr i64 kNearRows = 40000;  // rows whose places stay in the second-level cache anyway
 
 // In half words where these hold 2n.
 template <class Index>
@@ -107,14 +108,14 @@ template <class Index>
 SmStatus SymbolicRows<Index>::own_entries(i64 k, bool& is_tail) {
   const i64 row = m_.perm[k];
   const Index block = columns_[k].block;
-  const auto flag = static_cast<Index>(2 * k);
+  const i64 flag = 2 * k;
   collected_ = iu_ + k + 2;
   count_ = 0;
   for (i64 p = m_.row_start[row]; p < m_.row_start[row + 1]; ++p) {
     const i64 c = m_.inv_perm[m_.col_index[p]];
     if (c <= k) continue;
     if (columns_[c].flag == flag) return SM_SYMBOLIC_FAILED;
-    columns_[c].flag = flag;
+    columns_[c].flag = static_cast<Index>(flag);
     collected_[count_++] = c;
     is_tail = is_tail && columns_[c].block == block;
   }
@@ -125,7 +126,7 @@ SmStatus SymbolicRows<Index>::own_entries(i64 k, bool& is_tail) {
 // without.
 template <class Index>
 inline void SymbolicRows<Index>::fetch_chains(i64 k) const {
-  if (k + kChainAhead >= n_) return;
+  if (n_ <= kNearRows || k + kChainAhead >= n_) return;
   if (const i64 i = jl_[k + kChainAhead]; i >= 0) {
     __builtin_prefetch(iju_ + i);
     __builtin_prefetch(iu_ + i);
@@ -161,11 +162,11 @@ template <class Index>
 template <class IsIn>
 void SymbolicRows<Index>::collect(i64 k, IsIn is_in) {
   const i64 own = count_;
-  const auto flag = static_cast<Index>(2 * k + 1);
+  const i64 flag = 2 * k + 1;  // compared as a whole word: comparing half words takes longer
   count_ = 0;
   const auto take = [&](i64 c) {
     const bool known = columns_[c].flag == flag || is_in(c);
-    columns_[c].flag = flag;
+    columns_[c].flag = static_cast<Index>(flag);
     collected_[count_] = c;
     count_ += known ? 0 : 1;
   };
@@ -203,8 +204,8 @@ void SymbolicRows<Index>::collect_extras(i64 k, i64 others) {
 
 // Leaves the extras ascending. Many of them are marked in a bitmap of the columns to come, together with the tail, and
 // the whole row read from there; the tail is then empty. Where they are few among these columns, each goes where as
-// many are smaller. The bitmap takes the last of the words that hold the columns collected: what is written stays behind
-// what is read, even when no column is missing.
+// many are smaller. The bitmap takes the last of the words that hold the columns collected: what is written stays
+// behind what is read, even when no column is missing.
 template <class Index>
 void SymbolicRows<Index>::sort_extras(i64 k) {
   const i64 columns = n_ - k - 1;
