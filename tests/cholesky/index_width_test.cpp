@@ -41,10 +41,14 @@ Graph with_long_rows(Random& random, std::int64_t n) {
   return g;
 }
 
+Graph some_graph(Random& random) {
+  return random.chance(20) ? with_long_rows(random, 60 + random.below(90)) : any_graph(random, 50);
+}
+
 TEST_P(IndexWidthTest, moves_entries_to_the_same_places_with_half_and_with_whole_words) {
   for (std::uint64_t seed = 0; seed < 300; ++seed) {
     Random random(seed);
-    const Graph graph = seed % 5 == 0 ? with_long_rows(random, 60 + random.below(90)) : any_graph(random, 50);
+    const Graph graph = some_graph(random);
     if (graph.n == 0) continue;
     const Problem problem = positive_definite(graph, random);
     const bool shuffled = random.chance(60);
@@ -64,7 +68,7 @@ TEST_P(IndexWidthTest, moves_entries_to_the_same_places_with_half_and_with_whole
 TEST_P(IndexWidthTest, finds_the_true_fill_with_half_and_with_whole_words) {
   for (std::uint64_t seed = 0; seed < 200; ++seed) {
     Random random(seed);
-    const Graph graph = seed % 5 == 0 ? with_long_rows(random, 60 + random.below(90)) : any_graph(random, 50);
+    const Graph graph = some_graph(random);
     if (graph.n == 0) continue;
     const Problem problem = positive_definite(graph, random);
     const bool shuffled = random.chance(60);
