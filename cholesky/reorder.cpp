@@ -3,7 +3,6 @@
 
 #include <algorithm>
 #include <cstdint>
-#include <limits>
 #include <utility>
 
 #include "cholesky/steps.hpp"
@@ -106,10 +105,6 @@ void for_each_entry(const SmMatrix& m, auto&& visit) {
   }
 }
 
-// As many entries, and rows, each of which has one, are counted in half words, which a random walk finds in half the
-// memory.
-constexpr i64 kHalfWord = std::numeric_limits<std::uint32_t>::max();
-
 // Through copies where the workspace has room for them: along cycles each entry waits for the memory of the one before.
 template <class Index>
 void move_entries(SmMatrix& m, Index* ends, Index* owner) {
@@ -141,12 +136,14 @@ void reorder_by_owners(SmMatrix& m) {
 
 }  // namespace
 
+void reorder_rows(SmMatrix& m, IndexWidth width) {
+  width == IndexWidth::half ? reorder_by_owners<std::uint32_t>(m) : reorder_by_owners<i64>(m);
+}
+
 SmStatus reorder(SmMatrix& m) {
   SM_PASS(may_reorder(m));
   give_back(m.pool, m.factor_reserved);  // the places that a refill found in an earlier order
-  if (!reorder_border(m)) {
-    m.nnz <= kHalfWord ? reorder_by_owners<std::uint32_t>(m) : reorder_by_owners<i64>(m);
-  }
+  if (!reorder_border(m)) reorder_rows(m, width_for<std::uint32_t>(m.nnz));  // each row has an entry
   m.state = SM_STATE_REORDERED;
   return SM_OK;
 }

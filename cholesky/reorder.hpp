@@ -1,6 +1,7 @@
 // Moving the stored rows of a symmetric sparse matrix into the factor's order, and back.
 #pragma once
 
+#include "cholesky/index_width.hpp"
 #include "frame/core.hpp"
 
 namespace sm {
@@ -9,6 +10,10 @@ namespace sm {
 // of the entries that change rows. False, with nothing changed, where there is no border of a few long rows that hold a
 // good part of the entries, where a row is different, or where the workspace has no room.
 bool reorder_border(SmMatrix& m);
+
+// The same for whatever rows there are, in the rows + nnz words of workspace that an ordered matrix has at least. Half
+// words hold nnz.
+void reorder_rows(SmMatrix& m, IndexWidth width);
 
 // Undoes reorder in the workspace that ordering left: upper triangle, columns ascending. Allocates nothing.
 void restore_order(SmMatrix& m);

@@ -6,6 +6,7 @@
 //
 // Long rows that stand together, the border of a matrix of many small blocks, each reach a large part of all rows. They
 // are walked side by side, some columns at a time: what a row receives is then put down while its memory is at hand.
+// Where the first of these have every one of those columns, only their values are taken out, as they stand.
 #include <algorithm>
 #include <array>
 #include <utility>
@@ -39,7 +40,12 @@ struct Block {
 class MovedEntries {
  public:
   explicit MovedEntries(SmMatrix& m)
-      : m_(m), n_(m.rows), next_(m.work), kept_end_(m.work + n_), moved_(reinterpret_cast<Moved*>(m.work + 2 * n_)) {}
+      : m_(m),
+        n_(m.rows),
+        next_(m.work),
+        kept_end_(m.work + n_),
+        moved_(reinterpret_cast<Moved*>(m.work + 2 * n_)),
+        first_(n_) {}
 
   // Whether a good part of all entries is in a few long rows that stand together.
   bool has_border() const;
@@ -58,12 +64,20 @@ class MovedEntries {
   bool ends_agree(const Block& block) const;
   bool all_move(const Block& block) const;
   bool is_full(const Block& block) const;
+  i64 panels() const { return (n_ - first_ + kColumns - 1) / kColumns; }
+  const double* panel_at(i64 j) const;
+  void receive(i64 j, const double* panel, i64& from, i64 to);
 
   SmMatrix& m_;
   i64 n_;
   i64* next_;      // how many entries row j receives; then where the next of them goes, in the end the end of them
   i64* kept_end_;  // behind the entries that row i keeps, which stand at its start
   Moved* moved_;
+  // The first rows side by side that have a block: the values of each of their blocks, row after row.
+  i64 first_;             // or n
+  i64 beside_ = 0;        // how many rows
+  i64* panel_ = nullptr;  // where those of a block begin, or -1
+  double* panel_values_ = nullptr;
 };
 
 // visit(i, begin, end) of parts of row i, from the left to the right; a column meets the rows in ascending order.
@@ -137,10 +151,13 @@ bool MovedEntries::has_border() const {
   return rows <= n_ / kFew && entries > m_.nnz / 3;
 }
 
+// Leaves kept_end_ at the end of rows that are kept whole, and at the start of others.
 bool MovedEntries::count() {
   std::fill_n(next_, n_, 0);
+  std::copy_n(m_.row_start, n_, kept_end_);
   bool as_closed = true;
   i64 all = 0;
+  i64 in_panels = 0;
   const auto count_part = [&](i64 i, i64 begin, i64 end) {
     const i64 place = m_.inv_perm[i];
     i64 before = i - 1;
@@ -149,41 +166,66 @@ bool MovedEntries::count() {
     } else {
       as_closed &= begin < m_.row_start[i + 1] && m_.col_index[begin] == i;
     }
+    const i64* column = m_.col_index;
+    const i64* inv_perm = m_.inv_perm;
+    i64* next = next_;
+    i64 moving = 0;
+    bool ascends = true;
     for (i64 p = begin; p < end; ++p) {
-      const i64 j = m_.col_index[p];
-      const i64 moves = m_.inv_perm[j] < place ? 1 : 0;
-      as_closed &= before < j;
+      const i64 j = column[p];
+      const i64 moves = inv_perm[j] < place ? 1 : 0;
+      ascends &= before < j;
       before = j;
-      next_[j] += moves;
-      all += moves;
+      next[j] += moves;
+      moving += moves;
     }
+    as_closed &= ascends;
+    all += moving;
+    if (moving == 0 && begin == m_.row_start[i] && end == m_.row_start[i + 1]) kept_end_[i] = end;
   };
   const auto count_block = [&](const Block& block) {
     if (!is_full(block)) return false;
     const i64 rows = block.last - block.first;
+    if (first_ == n_) {
+      first_ = block.first;
+      beside_ = rows;
+    }
+    if (block.first == first_) {
+      in_panels += rows * block.length;
+      return true;
+    }
     for (i64 t = 0; t < block.length; ++t) next_[block.column + t] += rows;
     all += rows * block.length;
     return true;
   };
   for_each_part(count_part, count_block);
-  return as_closed && m_.work_capacity - 2 * n_ >= 2 * all;
+  panel_ = reinterpret_cast<i64*>(moved_ + all);
+  panel_values_ = reinterpret_cast<double*>(panel_ + panels());
+  return as_closed && m_.work_capacity - 2 * n_ >= 2 * all + panels() + in_panels;
 }
 
 void MovedEntries::take_out() {
   i64 before = 0;
   for (i64 j = 0; j < n_; ++j) before += std::exchange(next_[j], before);
-  std::copy_n(m_.row_start, n_, kept_end_);
+  std::fill_n(panel_, panels(), -1);
+  i64 in_panels = 0;
   const auto take_part = [&](i64 i, i64 begin, i64 end) {
-    const i64 place = m_.inv_perm[i];
     i64 kept = kept_end_[i];
+    if (kept == end) return;
+    const i64 place = m_.inv_perm[i];
+    const i64* inv_perm = m_.inv_perm;
+    i64* column = m_.col_index;
+    double* value = m_.nz_values;
+    i64* next = next_;
+    Moved* moved = moved_;
     for (i64 p = begin; p < end; ++p) {
-      const i64 j = m_.col_index[p];
-      const double value = m_.nz_values[p];
-      if (m_.inv_perm[j] < place) {
-        moved_[next_[j]++] = {i, value};
+      const i64 j = column[p];
+      const double v = value[p];
+      if (inv_perm[j] < place) {
+        moved[next[j]++] = {i, v};
       } else {
-        m_.col_index[kept] = j;
-        m_.nz_values[kept] = value;
+        column[kept] = j;
+        value[kept] = v;
         ++kept;
       }
     }
@@ -191,6 +233,13 @@ void MovedEntries::take_out() {
   };
   const auto take_block = [&](const Block& block) {
     const i64 rows = block.last - block.first;
+    if (block.first == first_) {
+      panel_[(block.column - first_) / kColumns] = in_panels;
+      for (i64 r = 0; r < rows; ++r, in_panels += block.length) {
+        std::copy_n(m_.nz_values + block.at[r], block.length, panel_values_ + in_panels);
+      }
+      return true;
+    }
     for (i64 t = 0; t < block.length; ++t) {
       Moved* to = moved_ + next_[block.column + t];
       for (i64 r = 0; r < rows; ++r) to[r] = {block.first + r, m_.nz_values[block.at[r] + t]};
@@ -199,6 +248,39 @@ void MovedEntries::take_out() {
     return true;
   };
   for_each_part(take_part, take_block);
+}
+
+// The values that row j receives from the rows of the panels, as far apart as these have columns, or null.
+const double* MovedEntries::panel_at(i64 j) const {
+  if (j < first_) return nullptr;
+  const i64 column = (j - first_) % kColumns;
+  const i64 panel = panel_[(j - first_) / kColumns];
+  return panel < 0 ? nullptr : panel_values_ + panel + column;
+}
+
+// What row j receives, from slot `to` on: from rows before those of the panels, from these, and from later ones.
+void MovedEntries::receive(i64 j, const double* panel, i64& from, i64 to) {
+  i64* column = m_.col_index + to;
+  double* value = m_.nz_values + to;
+  const Moved* entry = moved_ + from;
+  const Moved* end = moved_ + next_[j];
+  from = next_[j];
+  const auto put = [&] {
+    *column++ = entry->column;
+    *value++ = entry->value;
+    ++entry;
+  };
+  if (panel) {
+    while (entry != end && entry->column < first_) put();
+    const i64 apart = std::min(kColumns, n_ - j + (j - first_) % kColumns);
+    for (i64 r = 0; r < beside_; ++r) {
+      column[r] = first_ + r;
+      value[r] = panel[r * apart];
+    }
+    column += beside_;
+    value += beside_;
+  }
+  while (entry != end) put();
 }
 
 // Where a row keeps its entries, what it receives may come to stand: they leave first, the last of them first when they
@@ -211,7 +293,8 @@ void MovedEntries::join() {
   for (i64 j = 0; j < n_; ++j) {
     const i64 old = std::exchange(m_.row_start[j], start);
     const i64 kept = kept_end_[j] - old - 1;  // behind the diagonal
-    const i64 end = start + 1 + (next_[j] - from) + kept;
+    const double* panel = panel_at(j);
+    const i64 end = start + 1 + (next_[j] - from) + (panel ? beside_ : 0) + kept;
     const i64 shift = end - kept_end_[j];
     const double diagonal = value[old];
     const auto shift_entry = [&](i64 p) {
@@ -225,10 +308,7 @@ void MovedEntries::join() {
     }
     column[start] = j;
     value[start] = diagonal;
-    for (i64 to = start + 1; from < next_[j]; ++from, ++to) {
-      column[to] = moved_[from].column;
-      value[to] = moved_[from].value;
-    }
+    receive(j, panel, from, start + 1);
     start = end;
   }
 }

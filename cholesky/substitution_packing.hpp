@@ -63,6 +63,7 @@ SM_PASS_TARGET void pack(const RowOrder& order, const double* b, double* y) {
   }
 }
 
+// The lanes may begin in the last seven elements of x: the last eight rows are read before they are written there.
 template <int kWide>
 SM_PASS_TARGET void unpack(const RowOrder& order, const double* y, double* x) {
   constexpr i64 kAll = i64{kWide} * kLanes;

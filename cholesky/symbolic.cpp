@@ -10,12 +10,16 @@
 // words: iju [0, n), iu [n, 2n], jl [2n+1, 3n+1), ju from 3n+1; and at the top, while this runs, two words for each
 // column. The words of iu whose rows are still to come hold the columns collected: behind row k there are as many as
 // columns.
+#include "cholesky/symbolic.hpp"
+
 #include <algorithm>
 #include <bit>
 #include <cmath>
 #include <cstdint>
 
+#include "cholesky/index_width.hpp"
 #include "cholesky/lookahead.hpp"
+#include "cholesky/rank_sort.hpp"
 #include "cholesky/search.hpp"
 #include "cholesky/steps.hpp"
 #include "store/checks.hpp"
@@ -29,12 +33,19 @@ constexpr i64 kSearchGain = 3;  // one search of a tail costs as much as flaggin
 constexpr i64 kFewExtras = 12;  // sorted by comparing
 constexpr i64 kBitmapGain = 4;  // comparing costs an extra as much as reading about so many words of a bitmap
 constexpr i64 kBits = 64;
+constexpr i64 kLine = 8;  // words of a line of the cache
 
+constexpr i64 kChainAhead = 8;    // rows between what is fetched of one and its turn
+constexpr i64 kNearRows = 40000;  // rows whose places stay in the second-level cache anyway
+
+// In half words where these hold 2n.
+template <class Index>
 struct ColumnState {
-  i64 block;  // the row with which the column was last stored in ju
-  i64 flag;   // row in work: 2k for an entry of A, 2k + 1 for a column of the tail or an extra
+  Index block;  // the row with which the column was last stored in ju
+  Index flag;   // row in work: 2k for an entry of A, 2k + 1 for a column of the tail or an extra
 };
 
+template <class Index>
 class SymbolicRows {
  public:
   explicit SymbolicRows(const SmMatrix& m)
@@ -45,7 +56,7 @@ class SymbolicRows {
         iu_(m.work + n_),
         jl_(m.work + 2 * n_ + 1),
         ju_(m.work + 3 * n_ + 1),
-        columns_(reinterpret_cast<ColumnState*>(m.work + m.work_capacity - 2 * n_)) {}
+        columns_(reinterpret_cast<ColumnState<Index>*>(m.work + m.work_capacity - 2 * n_)) {}
 
   // 0, 106, or 105 when the subscripts do not fit: shortfall() words are missing then.
   SmStatus run();
@@ -65,6 +76,7 @@ class SymbolicRows {
     void next() { extra == extra_end || (tail != tail_end && *tail < *extra) ? ++tail : ++extra; }
   };
 
+  [[gnu::always_inline]] void fetch_chains(i64 k) const;
   SmStatus row(i64 k);
   SmStatus own_entries(i64 k, bool& is_tail);
   i64 longest_tail(i64 k);
@@ -82,7 +94,7 @@ class SymbolicRows {
   i64 n_;
   i64 room_;  // slots of ju
   i64 *iju_, *iu_, *jl_, *ju_;
-  ColumnState* columns_;
+  ColumnState<Index>* columns_;
   i64 juptr_ = -1;             // last slot used
   i64 jumin_ = 0;              // first slot of the last block
   const i64* tail_ = nullptr;  // the longest tail that the row takes over
@@ -92,28 +104,47 @@ class SymbolicRows {
 };
 
 // Entries of row k in the new order, unsorted. is_tail: every one of them is in the block that k was stored with.
-SmStatus SymbolicRows::own_entries(i64 k, bool& is_tail) {
+template <class Index>
+SmStatus SymbolicRows<Index>::own_entries(i64 k, bool& is_tail) {
   const i64 row = m_.perm[k];
-  const i64 block = columns_[k].block;
+  const Index block = columns_[k].block;
+  const i64 flag = 2 * k;
   collected_ = iu_ + k + 2;
   count_ = 0;
   for (i64 p = m_.row_start[row]; p < m_.row_start[row + 1]; ++p) {
     const i64 c = m_.inv_perm[m_.col_index[p]];
     if (c <= k) continue;
-    if (columns_[c].flag == 2 * k) return SM_SYMBOLIC_FAILED;
-    columns_[c].flag = 2 * k;
+    if (columns_[c].flag == flag) return SM_SYMBOLIC_FAILED;
+    columns_[c].flag = static_cast<Index>(flag);
     collected_[count_++] = c;
     is_tail = is_tail && columns_[c].block == block;
   }
   return SM_OK;
 }
 
+// The chain of a row to come: its first tail, and where that of a later row begins. What is chained until then comes
+// without.
+template <class Index>
+inline void SymbolicRows<Index>::fetch_chains(i64 k) const {
+  if (n_ <= kNearRows || k + kChainAhead >= n_) return;
+  if (const i64 i = jl_[k + kChainAhead]; i >= 0) {
+    __builtin_prefetch(iju_ + i);
+    __builtin_prefetch(iu_ + i);
+    __builtin_prefetch(jl_ + i);
+  }
+  if (const i64 i = jl_[k + kChainAhead / 2]; i >= 0) __builtin_prefetch(ju_ + iju_[i] + 1);
+}
+
 // Of the tails that row k takes over, the longest; answers how many columns the others have together.
-i64 SymbolicRows::longest_tail(i64 k) {
+template <class Index>
+i64 SymbolicRows<Index>::longest_tail(i64 k) {
   iju_[k] = juptr_;
   tail_length_ = 0;
   i64 all = 0;
   for (i64 i = jl_[k]; i >= 0; i = jl_[i]) {
+    const i64* column = ju_ + iju_[i] + 1;
+    __builtin_prefetch(column);  // all but the longest are read soon
+    __builtin_prefetch(column + kLine);
     const i64 columns = length(i) - 1;
     all += columns;
     if (columns > tail_length_) {
@@ -127,13 +158,15 @@ i64 SymbolicRows::longest_tail(i64 k) {
 
 // Leaves in collected_ what is not in the tail. Whether a column is new cannot be foretold, so it is put down in any
 // case and then counted or not; there is always room, since the tail has a column at least.
+template <class Index>
 template <class IsIn>
-void SymbolicRows::collect(i64 k, IsIn is_in) {
+void SymbolicRows<Index>::collect(i64 k, IsIn is_in) {
   const i64 own = count_;
+  const i64 flag = 2 * k + 1;  // compared as a whole word: comparing half words takes longer
   count_ = 0;
   const auto take = [&](i64 c) {
-    const bool known = columns_[c].flag == 2 * k + 1 || is_in(c);
-    columns_[c].flag = 2 * k + 1;
+    const bool known = columns_[c].flag == flag || is_in(c);
+    columns_[c].flag = static_cast<Index>(flag);
     collected_[count_] = c;
     count_ += known ? 0 : 1;
   };
@@ -147,13 +180,15 @@ void SymbolicRows::collect(i64 k, IsIn is_in) {
 
 // The row with which the subscripts were stored that the tail is part of, if its first column still tells; else -2. A
 // column behind the first that tells the same row is in the tail or behind it.
-i64 SymbolicRows::block_of_tail() const {
+template <class Index>
+i64 SymbolicRows<Index>::block_of_tail() const {
   const i64 block = columns_[*tail_].block;
   const i64* first = ju_ + iju_[block];
   return first <= tail_ && tail_ + tail_length_ <= first + length(block) ? block : -2;
 }
 
-void SymbolicRows::collect_extras(i64 k, i64 others) {
+template <class Index>
+void SymbolicRows<Index>::collect_extras(i64 k, i64 others) {
   if (tail_length_ == 0) return;  // the row has its own entries only, each once
   if ((count_ + others) * kSearchGain < tail_length_) {
     const i64 block = block_of_tail();
@@ -162,19 +197,25 @@ void SymbolicRows::collect_extras(i64 k, i64 others) {
       return (columns_[c].block == block && c <= last) || find_column(tail_, tail_length_, c) < tail_length_;
     });
   } else {
-    for (const i64* c = tail_; c != tail_ + tail_length_; ++c) columns_[*c].flag = 2 * k + 1;
+    for (const i64* c = tail_; c != tail_ + tail_length_; ++c) columns_[*c].flag = static_cast<Index>(2 * k + 1);
     collect(k, [](i64) { return false; });
   }
 }
 
 // Leaves the extras ascending. Many of them are marked in a bitmap of the columns to come, together with the tail, and
-// the whole row read from there; the tail is then empty. The bitmap takes the last of the words that hold the columns
-// collected: what is written stays behind what is read, even when no column is missing.
-void SymbolicRows::sort_extras(i64 k) {
+// the whole row read from there; the tail is then empty. Where they are few among these columns, each goes where as
+// many are smaller. The bitmap takes the last of the words that hold the columns collected: what is written stays
+// behind what is read, even when no column is missing.
+template <class Index>
+void SymbolicRows<Index>::sort_extras(i64 k) {
   const i64 columns = n_ - k - 1;
   const i64 words = (columns + kBits - 1) / kBits;
   if (count_ < kFewExtras || words > kBitmapGain * count_ || count_ + words > columns) {
-    std::sort(collected_, collected_ + count_);
+    if (count_ >= kFewExtras && count_ <= kRankSorted && columns < kRankReach) {
+      sort_by_ranks(collected_, count_, k);
+    } else {
+      std::sort(collected_, collected_ + count_);
+    }
     return;
   }
   auto* bitmap = reinterpret_cast<std::uint64_t*>(collected_ + columns - words);
@@ -193,7 +234,8 @@ void SymbolicRows::sort_extras(i64 k) {
 
 // Looks for the row in the last block of subscripts. True when all of it is there; when the block ends first, the new
 // block may start inside it.
-bool SymbolicRows::found_in_last_block(i64 k) {
+template <class Index>
+bool SymbolicRows<Index>::found_in_last_block(i64 k) {
   const i64* first = ju_ + jumin_;
   const i64* last = ju_ + juptr_ + 1;
   Joined list = joined();
@@ -211,7 +253,8 @@ bool SymbolicRows::found_in_last_block(i64 k) {
 
 // Puts the row into ju. False when there is no room. A new block that starts inside the last one repeats what stands
 // there, so the tail, which may stand there too, is not disturbed.
-bool SymbolicRows::store_joined(i64 k) {
+template <class Index>
+bool SymbolicRows<Index>::store_joined(i64 k) {
   if (found_in_last_block(k)) return true;
   jumin_ = juptr_ + 1;
   juptr_ += tail_length_ + count_;
@@ -220,13 +263,14 @@ bool SymbolicRows::store_joined(i64 k) {
   for (Joined list = joined(); list.column() < n_; list.next()) {
     const i64 c = list.column();
     *slot++ = c;
-    columns_[c].block = k;
+    columns_[c].block = static_cast<Index>(k);
   }
   iju_[k] = jumin_;
   return true;
 }
 
-SmStatus SymbolicRows::row(i64 k) {
+template <class Index>
+SmStatus SymbolicRows<Index>::row(i64 k) {
   const i64 updating = jl_[k];
   bool is_tail = updating >= 0 && jl_[updating] < 0;
   SM_TRY(own_entries(k, is_tail));
@@ -251,14 +295,16 @@ SmStatus SymbolicRows::row(i64 k) {
   return SM_OK;
 }
 
-SmStatus SymbolicRows::run() {
+template <class Index>
+SmStatus SymbolicRows<Index>::run() {
   if (room_ < 0) return SM_TOO_LARGE;  // not even the columns' words fit
-  std::fill_n(columns_, n_, ColumnState{-1, -1});
+  std::fill_n(columns_, n_, ColumnState<Index>{-1, -1});
   std::fill_n(jl_, n_, -1);
   iu_[0] = 0;
   const LookAhead ahead(m_, false);
   for (i64 k = 0; k < n_; ++k) {
     ahead.past(k);
+    fetch_chains(k);
     SM_TRY(row(k));
   }
   return SM_OK;
@@ -278,9 +324,10 @@ SmStatus extend_workspace(SmMatrix& m, i64 words, i64 keep) {
   return SM_OK;
 }
 
+template <class Index>
 SmStatus find_structure(SmMatrix& m) {
   for (;;) {
-    SymbolicRows rows(m);
+    SymbolicRows<Index> rows(m);
     const SmStatus status = rows.run();
     if (status != SM_TOO_LARGE) return status;
     SM_TRY(extend_workspace(m, rows.shortfall(), 0));
@@ -308,9 +355,11 @@ Gate may_find_structure(const SmMatrix& m) {
 
 }  // namespace
 
-SmStatus factor_symbolic(SmMatrix& m) {
+SmStatus factor_symbolic(SmMatrix& m) { return factor_symbolic(m, width_for<std::int32_t>(2 * m.rows)); }
+
+SmStatus factor_symbolic(SmMatrix& m, IndexWidth width) {
   SM_PASS(may_find_structure(m));
-  SM_TRY(find_structure(m));
+  SM_TRY(width == IndexWidth::half ? find_structure<std::int32_t>(m) : find_structure<i64>(m));
   SM_TRY(make_room_for_values(m));
   m.factor_iju = m.work;
   m.factor_iu = m.work + m.rows;

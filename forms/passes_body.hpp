@@ -9,6 +9,8 @@ constexpr int kSums = 8;            // partial sums of a sweep over vectors
 constexpr i64 kAhead = 256;         // elements that are made ready together, at least; the next as many are fetched
 constexpr i64 kEntriesAhead = 384;  // of the entry at work: those that are fetched, faster than the processor would
 constexpr i64 kLongRow = 8;         // entries from which a row is summed in several partial sums
+constexpr i64 kRun = 64;            // neighbours that are taken together
+constexpr i64 kRunsAhead = 5;       // runs from the one at work to that whose ends are fetched
 
 typedef double Sums __attribute__((vector_size(kSums * sizeof(double)), aligned(sizeof(double)), may_alias));
 
@@ -197,6 +199,46 @@ SM_PASS_INLINE double exchange_long(const UpperRows& a, i64& p, i64 end, double 
   return (part[0] + part[2]) + (part[1] + part[3]);
 }
 
+// Whole runs of neighbours from entry p on, as far as they reach. Where columns ascend, the first and the last tell:
+// those between are not even read.
+SM_PASS_INLINE double exchange_runs(const UpperRows& a, i64& p, i64 end, double t, const double* x, double* y) {
+  Sums part[2] = {};
+  for (; p + kRun <= end; p += kRun) {
+    const i64 k = a.col_index[p];
+    if (a.col_index[p + kRun - 1] != k + kRun - 1) break;
+    __builtin_prefetch(a.col_index + p + kRunsAhead * kRun);
+    __builtin_prefetch(a.col_index + p + kRunsAhead * kRun + kRun - 1);
+    for (i64 e = 0; e < kRun; e += i64{2} * kSums) {
+      const double* v = a.values + p + e;
+      __builtin_prefetch(v + kEntriesAhead);
+      __builtin_prefetch(v + kEntriesAhead + kSums);
+      part[0] += sums_at(v) * sums_at(x + k + e);
+      part[1] += sums_at(v + kSums) * sums_at(x + k + e + kSums);
+      sums_at(y + k + e) += sums_at(v) * t;
+      sums_at(y + k + e + kSums) += sums_at(v + kSums) * t;
+    }
+  }
+  return total_of(part[0] + part[1]);
+}
+
+// Entries p to `end` of a row that reaches a part of all columns, as those of a border do. Not inlined: the loop over
+// short rows, which most are, keeps the registers.
+SM_PASS_TARGET __attribute__((noinline)) double exchange_border(const UpperRows& a, i64 p, i64 end, double t,
+                                                                const double* x, double* y) {
+  double sum = 0.0;
+  while (end - p >= kRun) {
+    sum += exchange_runs(a, p, end, t, x, y);
+    sum += exchange_long(a, p, std::min(end, p + 4 * kRun), t, x, y);
+  }
+  sum += exchange_long(a, p, end, t, x, y);
+  for (; p < end; ++p) {
+    const i64 k = a.col_index[p];
+    sum += a.values[p] * x[k];
+    y[k] += a.values[p] * t;
+  }
+  return sum;
+}
+
 // y += A x, with what it needs of the vectors made ready just before. Answers x'A x when asked: its terms come along.
 template <bool kForm, class Strips, class Ready>
 SM_PASS_INLINE double exchange_rows(const UpperRows& a, Strips strips, const double* x, double* y,
@@ -236,7 +278,14 @@ SM_PASS_INLINE double exchange_rows(const UpperRows& a, Strips strips, const dou
       double diagonal = 0.0;
       if (column[p] == i) diagonal = value[p++] * t;
       double sum = 0.0;
-      if (end - p >= kLongRow) sum = exchange_long(a, p, end, t, x, y);
+      if (end - p >= kLongRow) {
+        if (end - p >= kRun && a.is_ascending) {
+          sum = exchange_border(a, p, end, t, x, y);
+          p = end;
+        } else {
+          sum = exchange_long(a, p, end, t, x, y);
+        }
+      }
       for (; p < end; ++p) {
         const i64 k = column[p];
         const double v = value[p];

@@ -184,5 +184,36 @@ TEST_P(SubstitutionTest, solves_together_what_it_solves_one_by_one) {
   }
 }
 
+// Lanes begin where a cache line does, which may be in the last elements of a vector that is at work.
+TEST_P(SubstitutionTest, solves_into_an_array_that_begins_anywhere_in_a_cache_line) {
+  Random random(13);
+  for (const std::int64_t n : {1, 7, 15, 16, 17, 23, 24, 31, 50}) {
+    SmMatrix* m = new_sparse(session(), positive_definite(random_graph(random, n, 6), random));
+    ASSERT_EQ(fn().qxsmfact(m, 0), SM_OK);
+    for (const std::int64_t count : {16, 17, 24, 31, 32, 39, 40, 47, 48}) {
+      const std::vector<double> b = random.vector(n * count);
+      std::vector<double> want;
+      for (auto from = b.begin(); from != b.end(); from += n) {
+        const std::vector<double> alone = solve(m, {from, from + n});
+        want.insert(want.end(), alone.begin(), alone.end());
+      }
+      for (const TileSet set : kSets) {
+        if (!use_tiles(set)) continue;
+        for (std::size_t offset = 0; offset < 8; ++offset) {
+          std::vector<double> room(b.size() + 16, -7.5);
+          double* x = room.data() + offset;
+          ASSERT_EQ(fn().qxsmsubst(m, b.data(), x, static_cast<std::int32_t>(count)), SM_OK);
+          EXPECT_TRUE(near({x, x + b.size()}, want, 1e-12)) << n << " rows, " << count << " vectors at " << offset;
+          EXPECT_EQ(std::count(room.begin(), room.begin() + static_cast<std::ptrdiff_t>(offset), -7.5),
+                    static_cast<std::ptrdiff_t>(offset));
+          EXPECT_EQ(std::count(x + b.size(), room.data() + room.size(), -7.5),
+                    static_cast<std::ptrdiff_t>(16 - offset));
+        }
+      }
+    }
+    ASSERT_EQ(fn().qxsmDestroyMatrix(instance(), &m), SM_OK);
+  }
+}
+
 }  // namespace
 }  // namespace sm::test

@@ -172,6 +172,39 @@ TEST_F(PassesTest, one_full_row_first_or_last) {
   }
 }
 
+// Row 0 has the columns up to every length around one, two and three runs of neighbours, or misses one of them.
+TEST_F(PassesTest, a_row_of_neighbours_that_ends_anywhere_or_misses_one) {
+  Random random(10);
+  const std::int64_t n = 230;
+  for (std::int64_t length = 60; length < n; length += length % 64 < 4 || length % 64 > 60 ? 1 : 9) {
+    Pattern ends = stencil(n, {});
+    for (std::int64_t j = 1; j < length; ++j) ends[0].push_back(j);
+    expect_all(ends, random);
+    Pattern misses = stencil(n, {});
+    for (std::int64_t j = 1; j < n; ++j) {
+      if (j != length) misses[0].push_back(j);
+    }
+    expect_all(misses, random);
+  }
+}
+
+TEST_F(PassesTest, a_border_of_rows_that_miss_some_columns) {
+  for (std::uint64_t seed = 0; seed < 20; ++seed) {
+    SCOPED_TRACE(seed);
+    Random random(2000 + seed);
+    const std::int64_t n = 100 + random.below(900);
+    const std::int64_t missing = seed % 4;  // in a hundred
+    Pattern rows = stencil(n, {1, 2});
+    for (std::int64_t i = 0; i < 6; ++i) {
+      rows[i] = {i};
+      for (std::int64_t j = i + 1; j < n; ++j) {
+        if (!random.chance(missing)) rows[i].push_back(j);
+      }
+    }
+    expect_all(rows, random);
+  }
+}
+
 TEST_F(PassesTest, a_list_of_strips_covers_the_rows_and_finds_those_of_a_grid) {
   Random random(8);
   for (const auto& [pattern, least] : {std::pair(plane(100, 20), 90), std::pair(plane(12, 100), 65),
@@ -194,7 +227,11 @@ TEST_F(PassesTest, a_list_of_strips_covers_the_rows_and_finds_those_of_a_grid) {
 
 TEST_F(PassesTest, sums_that_round_have_the_same_bits_on_every_cpu_and_are_near_those_of_single_rows) {
   Random random(9);
-  for (const Pattern& pattern : {plane(60, 40), scattered(random, 700, 9), patched(random, 900)}) {
+  Pattern border = plane(40, 20);
+  for (std::int64_t j = 40; j < 800; ++j) border[3].push_back(j);
+  std::sort(border[3].begin(), border[3].end());
+  border[3].erase(std::unique(border[3].begin(), border[3].end()), border[3].end());
+  for (const Pattern& pattern : {plane(60, 40), scattered(random, 700, 9), patched(random, 900), border}) {
     Compressed a(random, pattern);
     for (double& v : a.values()) v = 1.0 / v;
     std::vector<double> x = random.vector(8 * a.n());
