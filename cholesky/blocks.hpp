@@ -6,10 +6,16 @@
 // block.
 //
 // While a factorization runs, two arrays of n words hold what is needed of the blocks; f is the first row of one:
-//   position[f]  its width, in the low bits, and above them the place in its tail where its next update begins
+//   position[f]  its width, in the low bits, whether it follows another, and above them the place in its tail where its
+//                next update begins
 //   jl[f]        until the block is finished the first of the blocks that wait for it, then the next in its own list;
 //                -1 ends a list
 //   jl[k]        for the other rows of a block -2 - f
+//
+// When a block has updated another one, what is left of its tail is part of that one's tail. If that is most of it, the
+// block follows the other from then on: the two wait in one list, the follower behind its leader, and update later
+// blocks as one source of more rows (group_panel.hpp). What follows it comes with it. Followers have not all columns of
+// their leader, and may have none in the block that the leader updates.
 #pragma once
 
 #include "cholesky/numeric.hpp"
@@ -18,6 +24,8 @@ namespace sm {
 
 inline constexpr i64 kMostBlockRows =
     128;  // wider ones are cut: a block and its target then fit the second-level cache
+
+inline constexpr i64 kMostGroupRows = 32;
 
 struct Block {
   i64 first;
@@ -42,6 +50,26 @@ struct Source {
   double* value;        // theirs in the first row
   i64 step;             // from there to the same column one row on; one less from row to row
   const double* pivot;  // reciprocals
+  bool follows;         // the source before it in its list
+  i64 done;             // columns that have been rows of the target
+};
+
+// A leader, and what follows it.
+struct SourceGroup {
+  Source* source;
+  int count;
+  i64 rows;  // of all
+
+  Source& leader() const { return *source; }
+  Source* begin() const { return source; }
+  Source* end() const { return source + count; }
+};
+
+// What will follow a block that is in work.
+struct Followers {
+  i64 rows = 0;
+  i64 first = -1;
+  i64 last = -1;
 };
 
 class Blocks {
@@ -55,40 +83,82 @@ class Blocks {
   Block at(i64 first, i64 width) const {
     return {first, width, a_.iu[first + 1] - a_.iu[first], a_.ju + a_.iju[first] + width - 1, a_.values + a_.iu[first]};
   }
-  // f(source) for every block that waits for block `first`; f makes it wait elsewhere. Sources are read some at a time,
-  // so that what they need from memory is under way before the first of them is used.
+  // f(group) for every group that waits for block `first`; f makes it wait elsewhere, or follow the block. Sources are
+  // read some at a time, so that what they need from memory is under way before the first of them is used.
   template <class F>
   void for_each_waiting(i64 first, F&& f) const {
     for (i64 i = a_.jl[first]; i >= 0;) {
-      Source batch[kBatch];
-      int count = 0;
-      for (; i >= 0 && count < kBatch; i = a_.jl[i]) {
-        batch[count] = source(i);
-        __builtin_prefetch(batch[count].column);
-        __builtin_prefetch(batch[count].value, 1);
-        ++count;
+      Source batch[kBatch + kMostGroupRows];
+      Source* end = batch;
+      do {
+        *end = source(i);
+        __builtin_prefetch(end->column);
+        __builtin_prefetch(end->value, 1);
+        ++end;
+        i = a_.jl[i];
+      } while (i >= 0 && (end < batch + kBatch || follows(i)));
+      for (Source* s = batch; s < end;) {
+        SourceGroup group = {s, 0, 0};
+        do {
+          group.rows += s->width;
+          ++group.count;
+          ++s;
+        } while (s < end && s->follows);
+        f(group);
       }
-      for (int s = 0; s < count; ++s) f(batch[s]);
     }
   }
-  // The finished block waits for the block that holds its column `done` places on.
-  void await(const Source& s, i64 done) const {
-    if (done < s.count) queue(s.first, s.width, s.place + done, s.column[done]);
+  // The group waits for the block that holds its leader's next column.
+  void await(const SourceGroup& group) const {
+    const Source& leader = group.leader();
+    if (leader.done == leader.count) return;
+    i64 last = leader.first;
+    queue(last, word_of(leader, 0), leader.column[leader.done]);
+    for (const Source* s = group.begin() + 1; s < group.end(); ++s) {
+      if (s->done == s->count) continue;
+      a_.position[s->first] = word_of(*s, kFollows);
+      a_.jl[s->first] = a_.jl[last];
+      a_.jl[last] = s->first;
+      last = s->first;
+    }
   }
-  void await(const Block& b) const {
-    if (b.tail_length() > 0) queue(b.first, b.width, 0, b.tail[0]);
+  // Whether the group is to follow the block of which `followers` are known, which it has updated.
+  bool can_follow(const SourceGroup& group, const Block& block, const Followers& followers) const {
+    const Source& leader = group.leader();
+    return block.tail_length() >= kFewestGroupColumns && (leader.count - leader.done) * 5 >= block.tail_length() * 4 &&
+           block.width + followers.rows + group.rows <= kMostGroupRows;
+  }
+  void follow(const SourceGroup& group, Followers& followers) const {
+    for (const Source& s : group) {
+      if (s.done == s.count) continue;
+      a_.position[s.first] = word_of(s, kFollows);
+      a_.jl[s.first] = followers.first;
+      followers.first = s.first;
+      if (followers.last < 0) followers.last = s.first;
+      followers.rows += s.width;
+    }
+  }
+  void await(const Block& b, const Followers& followers) const {
+    if (b.tail_length() == 0) return;
+    queue(b.first, b.width, b.tail[0]);
+    if (followers.first < 0) return;
+    a_.jl[followers.last] = a_.jl[b.first];
+    a_.jl[b.first] = followers.first;
   }
 
  private:
   static constexpr int kBatch = 16;
+  static constexpr i64 kFewestGroupColumns = 32;
   static constexpr int kWidthBits = 8;
+  static constexpr int kPlaceBit = kWidthBits + 1;
   static constexpr i64 kWidthMask = (i64{1} << kWidthBits) - 1;
+  static constexpr i64 kFollows = i64{1} << kWidthBits;
   static_assert(kMostBlockRows <= kWidthMask);
 
   Source source(i64 first) const {
     const i64 word = a_.position[first];
     const i64 width = word & kWidthMask;
-    const i64 place = word >> kWidthBits;
+    const i64 place = word >> kPlaceBit;
     const i64 length = a_.iu[first + 1] - a_.iu[first];
     return {first,
             width,
@@ -97,17 +167,21 @@ class Blocks {
             a_.ju + a_.iju[first] + width - 1 + place,
             a_.values + a_.iu[first] + width - 1 + place,
             length - 1,
-            a_.diag + first};
+            a_.diag + first,
+            (word & kFollows) != 0,
+            0};
   }
+  bool follows(i64 first) const { return (a_.position[first] & kFollows) != 0; }
+  static i64 word_of(const Source& s, i64 follows) { return (s.place + s.done) << kPlaceBit | follows | s.width; }
   bool continues(i64 k) const {
     const i64 length = a_.iu[k + 1] - a_.iu[k];
     return length > 0 && a_.iu[k + 2] - a_.iu[k + 1] == length - 1 && a_.ju[a_.iju[k]] == k + 1;
   }
   void cut(i64 first, i64 end);
-  void queue(i64 first, i64 width, i64 place, i64 column) const {
+  void queue(i64 first, i64 word, i64 column) const {
     const i64 mark = a_.jl[column];
     const i64 target = mark < -1 ? -2 - mark : column;
-    a_.position[first] = place << kWidthBits | width;
+    a_.position[first] = word;
     a_.jl[first] = a_.jl[target];
     a_.jl[target] = first;
   }

@@ -89,13 +89,15 @@ class BlockedRows {
  private:
   SmStatus single_row(i64 k);
   double load_row(i64 k);
-  double update_row(i64 k, double d);
+  double update_row(const Block& row, Followers& followers, double d);
   double add_shared_row(i64 k, double d);
   double subtract_block(const Source& s, double d);
   SmStatus block(i64 first);
   void add_shared_rows(const Target& target);
   void load_block(const Target& target);
-  void update_target(const Target& target, const Source& s);
+  void leave(const SourceGroup& group, const Block& block, Followers& followers) const;
+  void update_target(const Target& target, const SourceGroup& group);
+  void update_target(const Target& target, Source& s);
   void subtract_products(const Target& target, const Source& s, i64 rows);
 
   const NumericArrays& a_;
@@ -138,19 +140,32 @@ double BlockedRows::subtract_block(const Source& s, double d) {
   return d;
 }
 
-// Everything that waits for row k. Answers the pivot.
-double BlockedRows::update_row(i64 k, double d) {
-  blocks_.for_each_waiting(k, [&](const Source& s) {
-    if (s.width == 1) {
-      const double u = *s.value;
-      const double f = -u * *s.pivot;
-      *s.value = f;
-      d += u * f;
-      for (i64 j = 1; j < s.count; ++j) a_.diag[s.column[j]] += f * s.value[j];
-    } else {
-      d = subtract_block(s, d);
+// What becomes of a group that has updated the block.
+void BlockedRows::leave(const SourceGroup& group, const Block& block, Followers& followers) const {
+  if (blocks_.can_follow(group, block, followers)) {
+    blocks_.follow(group, followers);
+  } else {
+    blocks_.await(group);
+  }
+}
+
+// Everything that waits for the row. Answers the pivot.
+double BlockedRows::update_row(const Block& row, Followers& followers, double d) {
+  blocks_.for_each_waiting(row.first, [&](const SourceGroup& group) {
+    for (Source& s : group) {
+      if (*s.column != row.first) continue;
+      if (s.width == 1) {
+        const double u = *s.value;
+        const double f = -u * *s.pivot;
+        *s.value = f;
+        d += u * f;
+        for (i64 j = 1; j < s.count; ++j) a_.diag[s.column[j]] += f * s.value[j];
+      } else {
+        d = subtract_block(s, d);
+      }
+      s.done = 1;
     }
-    blocks_.await(s, 1);
+    leave(group, row, followers);
   });
   return d;
 }
@@ -166,11 +181,12 @@ double BlockedRows::add_shared_row(i64 k, double d) {
 SmStatus BlockedRows::single_row(i64 k) {
   const Block b = blocks_.at(k, 1);
   for (i64 j = 0; j < b.length; ++j) a_.diag[b.tail[j]] = 0.0;
-  double d = update_row(k, load_row(k));
+  Followers followers;
+  double d = update_row(b, followers, load_row(k));
   if (shared_.has_rows_before(k + 1)) d = add_shared_row(k, d);
   SM_TRY(pivots_.judge(k, d, a_.diag[k]));
   for (i64 j = 0; j < b.length; ++j) b.values[j] = a_.diag[b.tail[j]];
-  blocks_.await(b);
+  blocks_.await(b, followers);
   return SM_OK;
 }
 
@@ -207,16 +223,24 @@ void BlockedRows::subtract_products(const Target& target, const Source& s, i64 r
   }
 }
 
-void BlockedRows::update_target(const Target& target, const Source& s) {
-  const i64 end = target.block.first + target.block.width;
-  i64 rows = 1;
-  while (rows < s.count && s.column[rows] < end) ++rows;
+void BlockedRows::update_target(const Target& target, Source& s) {
+  const i64 rows = s.done = target.rows_of(s);
+  if (rows == 0) return;
   if (s.count <= kPanelColumns && s.width * rows * s.count < kFewProducts) {
     subtract_products(target, s, rows);
   } else {
-    update_block(target, s, rows, panels_);
+    update_block(target, {&s, 1, s.width}, panels_);
   }
-  blocks_.await(s, rows);
+}
+
+void BlockedRows::update_target(const Target& target, const SourceGroup& group) {
+  Source& leader = group.leader();
+  leader.done = target.rows_of(leader);
+  if (group.count > 1 && leader.done > 1 && group.rows * leader.done * leader.count >= kFewProducts) {
+    update_block(target, group, panels_);
+    return;
+  }
+  for (Source& s : group) update_target(target, s);
 }
 
 void BlockedRows::add_shared_rows(const Target& target) {
@@ -232,11 +256,15 @@ SmStatus BlockedRows::block(i64 first) {
   const Block b = blocks_.at(first, blocks_.width(first));
   const Target target = {b, place_, a_.diag};
   load_block(target);
-  blocks_.for_each_waiting(first, [&](const Source& s) { update_target(target, s); });
+  Followers followers;
+  blocks_.for_each_waiting(first, [&](const SourceGroup& group) {
+    update_target(target, group);
+    leave(group, b, followers);
+  });
   if (shared_.has_rows_before(first + b.width)) add_shared_rows(target);
   double* square = shared_.square_for(b);
   SM_TRY(factor_block(b, a_.diag, square, pivots_, panels_));
-  if (!square) blocks_.await(b);
+  if (!square) blocks_.await(b, followers);
   return SM_OK;
 }
 

@@ -19,6 +19,7 @@ add_library(qxesm_objects OBJECT
   cholesky/block_factor.cpp
   cholesky/block_tree.cpp
   cholesky/block_update.cpp
+  cholesky/group_panel.cpp
   cholesky/blocks.cpp
   cholesky/dense.cpp
   cholesky/factor.cpp
