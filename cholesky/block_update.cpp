@@ -22,7 +22,7 @@ class BlockUpdate {
         depth_(sources.rows),
         panels_(panels),
         tiles_(tile_kernels()),
-        group_(sources, tiles_.tile_columns, panels.source) {
+        group_(sources, panels.source) {
     packed_ = sources.count > 1 || (depth_ > kInPlaceWidth && rows_ > 2 * tiles_.strip_rows);
   }
   void run();
@@ -32,7 +32,7 @@ class BlockUpdate {
   void find_coefficients();
   void keep_multipliers();
   void find_places(i64 begin, i64 end);
-  void fetch_targets(int rows, i64 from, double* const* row) const;
+  void fetch_targets(int rows, i64 from, i64 columns, double* const* row) const;
   void strip(i64 first_row, i64 begin, i64 end);
   void scatter(int rows, const std::int32_t* to, i64 columns, double* const* row) const;
   i64 head_of_strip(i64 first_row, int rows, i64 end);
@@ -52,6 +52,7 @@ class BlockUpdate {
   GroupPanel group_;
   bool packed_;
   i64 runs_ = 0;
+  bool in_runs_ = false;
 };
 
 // -V D of the source's first columns, strip by strip, row s of a strip's coefficients being that of source row s.
@@ -84,23 +85,38 @@ void BlockUpdate::keep_multipliers() {
   }
 }
 
-// Places of the columns [begin, end) in the rows of the target, as they are and in runs.
+// Places of the columns [begin, end) in the rows of the target, and their runs where these are long. Places are found
+// without comparing: whether columns are neighbours cannot be guessed.
 void BlockUpdate::find_places(i64 begin, i64 end) {
+  const i64* column = s_.column + begin;
+  const i64 count = end - begin;
+  const i64 own = begin == 0 ? rows_ : 0;
+  const i64 first = target_.block.first;
+  std::int32_t* to = panels_.to;
+  for (i64 j = 0; j < own; ++j) to[j] = static_cast<std::int32_t>(column[j] - first);
+  for (i64 j = own; j < count; ++j) to[j] = static_cast<std::int32_t>(target_.place[column[j]]);
+  i64 runs = 1;
+  for (i64 j = 1; j < count; ++j) runs += to[j] != to[j - 1] + 1;
+  runs_ = runs;
+  in_runs_ = count >= kLongRun * runs;
+  if (!in_runs_) return;
   Run* run = panels_.run - 1;
-  i64 next = -1;
-  for (i64 j = begin; j < end; ++j) {
-    const i64 to = target_.place_of(s_.column[j]);
-    const auto at = static_cast<std::int32_t>(to);
-    panels_.to[j - begin] = at;
-    if (to != next) *++run = {static_cast<std::int32_t>(j - begin), at, 0};
+  std::int32_t next = -1;
+  for (std::int32_t j = 0; j < count; ++j) {
+    if (to[j] != next) *++run = {j, to[j], 0};
     ++run->length;
-    next = to + 1;
+    next = to[j] + 1;
   }
-  runs_ = run + 1 - panels_.run;
 }
 
-// Asks for what the runs behind column `from` add to, while the sums are made.
-void BlockUpdate::fetch_targets(int rows, i64 from, double* const* row) const {
+// Asks for what the columns from place `from` of the panel on add to, while the sums are made.
+void BlockUpdate::fetch_targets(int rows, i64 from, i64 columns, double* const* row) const {
+  if (!in_runs_) {
+    for (i64 j = from; j < columns; ++j) {
+      for (int i = 0; i < rows; ++i) __builtin_prefetch(row[i] + panels_.to[j], 1);
+    }
+    return;
+  }
   for (const Run* run = panels_.run; run != panels_.run + runs_; ++run) {
     if (run->from + run->length <= from) continue;
     for (i64 j = 0; j < run->length; j += 8) {
@@ -161,11 +177,11 @@ void BlockUpdate::strip(i64 first_row, i64 begin, i64 end) {
     tiles_.strip(rows, depth_, coefficients(first_row), source, end - from, row, Finish::add);
     return;
   }
-  fetch_targets(rows, from - begin, row);
+  fetch_targets(rows, from - begin, end - begin, row);
   double* sums[kMostStripRows];
   for (int i = 0; i < rows; ++i) sums[i] = panels_.sums + i * kPanelColumns;
   tiles_.strip(rows, depth_, coefficients(first_row), source, end - from, sums, Finish::store);
-  if (end - from < kLongRun * runs_) {
+  if (!in_runs_) {
     scatter(rows, panels_.to + (from - begin), end - from, row);
     return;
   }

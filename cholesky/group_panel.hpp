@@ -5,19 +5,20 @@
 #pragma once
 
 #include "cholesky/blocks.hpp"
+#include "cholesky/tiles.hpp"
 
 namespace sm {
 
 class GroupPanel {
  public:
-  GroupPanel(const SourceGroup& group, i64 tile_columns, double* panel)
-      : group_(group), tile_columns_(tile_columns), tile_step_(tile_columns * group.rows), panel_(panel) {}
+  GroupPanel(const SourceGroup& group, double* panel)
+      : group_(group), tiles_(tile_kernels()), tile_step_(tiles_.tile_columns * group.rows), panel_(panel) {}
 
   // Columns [begin, end) of the leader, for all rows; panels come in ascending order, and begin with whole tiles.
   void pack(i64 begin, i64 end);
   // Column `column` of the panel.
   const double* at(i64 column) const {
-    return panel_ + column / tile_columns_ * tile_step_ + column % tile_columns_;
+    return panel_ + column / tiles_.tile_columns * tile_step_ + column % tiles_.tile_columns;
   }
   // -V D of the first columns of the first panel, strip by strip, the rows of the group one behind the other.
   void find_coefficients(i64 columns, i64 strip_rows, double* coefficient) const;
@@ -26,10 +27,11 @@ class GroupPanel {
 
  private:
   void pack_leader(i64 begin, i64 end);
+  void fetch(const Source& s, i64 next, i64 columns) const;
   i64 pack_follower(const Source& s, i64 begin, i64 end, i64 next, double* out) const;
 
   const SourceGroup& group_;
-  const i64 tile_columns_;
+  const TileKernels& tiles_;
   const i64 tile_step_;
   double* const panel_;
   i64 next_[kMostGroupRows];  // of each source's columns
