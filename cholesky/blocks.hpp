@@ -18,6 +18,8 @@
 // their leader, and may have none in the block that the leader updates.
 #pragma once
 
+#include <algorithm>
+
 #include "cholesky/numeric.hpp"
 
 namespace sm {
@@ -83,28 +85,32 @@ class Blocks {
   Block at(i64 first, i64 width) const {
     return {first, width, a_.iu[first + 1] - a_.iu[first], a_.ju + a_.iju[first] + width - 1, a_.values + a_.iu[first]};
   }
-  // f(group) for every group that waits for block `first`; f makes it wait elsewhere, or follow the block. Sources are
-  // read some at a time, so that what they need from memory is under way before the first of them is used.
+  // f(group) for every group that waits for block `first`; f makes it wait elsewhere, or follow the block. Some sources
+  // are read ahead, so that what they need from memory is under way before they are used, and the next link too.
   template <class F>
   void for_each_waiting(i64 first, F&& f) const {
-    for (i64 i = a_.jl[first]; i >= 0;) {
-      Source batch[kBatch + kMostGroupRows];
-      Source* end = batch;
+    Source queue[kQueue];
+    Source* begin = queue;
+    Source* end = queue;
+    i64 next = a_.jl[first];
+    const auto read = [&] {
+      *end++ = source(next);
+      next = a_.jl[next];
+    };
+    for (;;) {
+      while (next >= 0 && end < begin + kAhead) read();
+      if (begin == end) return;
+      SourceGroup group = {begin, 0, 0};
       do {
-        *end = source(i);
-        __builtin_prefetch(end->column);
-        __builtin_prefetch(end->value, 1);
-        ++end;
-        i = a_.jl[i];
-      } while (i >= 0 && (end < batch + kBatch || follows(i)));
-      for (Source* s = batch; s < end;) {
-        SourceGroup group = {s, 0, 0};
-        do {
-          group.rows += s->width;
-          ++group.count;
-          ++s;
-        } while (s < end && s->follows);
-        f(group);
+        group.rows += begin->width;
+        ++group.count;
+        ++begin;
+        if (begin == end && next >= 0) read();
+      } while (begin < end && begin->follows);
+      f(group);
+      if (begin + kAhead > queue + kQueue - kMostGroupRows) {
+        end = std::copy(begin, end, queue);
+        begin = queue;
       }
     }
   }
@@ -147,7 +153,8 @@ class Blocks {
   }
 
  private:
-  static constexpr int kBatch = 16;
+  static constexpr int kAhead = 16;
+  static constexpr int kQueue = 64 + kMostGroupRows;
   static constexpr i64 kFewestGroupColumns = 32;
   static constexpr int kWidthBits = 8;
   static constexpr int kPlaceBit = kWidthBits + 1;
@@ -160,12 +167,17 @@ class Blocks {
     const i64 width = word & kWidthMask;
     const i64 place = word >> kPlaceBit;
     const i64 length = a_.iu[first + 1] - a_.iu[first];
+    const i64* column = a_.ju + a_.iju[first] + width - 1 + place;
+    double* value = a_.values + a_.iu[first] + width - 1 + place;
+    __builtin_prefetch(column);
+    __builtin_prefetch(value, 1);
+    __builtin_prefetch(a_.diag + first);
     return {first,
             width,
             place,
             length + 1 - width - place,
-            a_.ju + a_.iju[first] + width - 1 + place,
-            a_.values + a_.iu[first] + width - 1 + place,
+            column,
+            value,
             length - 1,
             a_.diag + first,
             (word & kFollows) != 0,
