@@ -114,6 +114,18 @@ class Blocks {
       }
     }
   }
+  // While block `first` is in work: what waits for rows some way on, as far as it is known, and where that is.
+  [[gnu::always_inline]] void fetch_ahead(i64 first) const {
+    if (first + 2 * kRowsAhead >= a_.n) return;
+    const i64 later = a_.jl[first + 2 * kRowsAhead];
+    if (later >= 0) fetch_words(later);
+    const i64 soon = a_.jl[first + kRowsAhead];
+    if (soon < 0) return;
+    const Source s = source(soon);
+    static_cast<void>(s);
+    const i64 second = a_.jl[soon];
+    if (second >= 0) fetch_words(second);
+  }
   // The group waits for the block that holds its leader's next column.
   void await(const SourceGroup& group) const {
     const Source& leader = group.leader();
@@ -153,6 +165,7 @@ class Blocks {
   }
 
  private:
+  static constexpr i64 kRowsAhead = 6;
   static constexpr int kAhead = 16;
   static constexpr int kQueue = 64 + kMostGroupRows;
   static constexpr i64 kFewestGroupColumns = 32;
@@ -182,6 +195,13 @@ class Blocks {
             a_.diag + first,
             (word & kFollows) != 0,
             0};
+  }
+  [[gnu::always_inline]] void fetch_words(i64 first) const {
+    __builtin_prefetch(a_.position + first);
+    __builtin_prefetch(a_.jl + first);
+    __builtin_prefetch(a_.iu + first);
+    __builtin_prefetch(a_.iju + first);
+    __builtin_prefetch(a_.diag + first);
   }
   bool follows(i64 first) const { return (a_.position[first] & kFollows) != 0; }
   static i64 word_of(const Source& s, i64 follows) { return (s.place + s.done) << kPlaceBit | follows | s.width; }

@@ -272,6 +272,7 @@ SmStatus BlockedRows::run() {
   Blocks(a_).find();
   for (i64 k = 0, width = 0; k < a_.n; k += width) {
     width = blocks_.width(k);
+    blocks_.fetch_ahead(k);
     SM_TRY(width == 1 ? single_row(k) : block(k));
   }
   return SM_OK;
