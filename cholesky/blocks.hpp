@@ -96,9 +96,10 @@ class Blocks {
     const auto read = [&] {
       *end++ = source(next);
       next = a_.jl[next];
+      if (next >= 0) fetch_words(next);
     };
     for (;;) {
-      while (next >= 0 && end < begin + kAhead) read();
+      for (int i = 0; i < 3 && next >= 0 && end < begin + kAhead; ++i) read();
       if (begin == end) return;
       SourceGroup group = {begin, 0, 0};
       do {
@@ -183,7 +184,9 @@ class Blocks {
     const i64* column = a_.ju + a_.iju[first] + width - 1 + place;
     double* value = a_.values + a_.iu[first] + width - 1 + place;
     __builtin_prefetch(column);
+    __builtin_prefetch(column + 8);
     __builtin_prefetch(value, 1);
+    __builtin_prefetch(value + 8, 1);
     __builtin_prefetch(a_.diag + first);
     return {first,
             width,
