@@ -85,16 +85,11 @@ void BlockUpdate::keep_multipliers() {
   }
 }
 
-// Places of the columns [begin, end) in the rows of the target, and their runs where these are long. Places are found
-// without comparing: whether columns are neighbours cannot be guessed.
+// Places of the columns [begin, end) in the rows of the target, and their runs where these are long.
 void BlockUpdate::find_places(i64 begin, i64 end) {
-  const i64* column = s_.column + begin;
   const i64 count = end - begin;
-  const i64 own = begin == 0 ? rows_ : 0;
-  const i64 first = target_.block.first;
   std::int32_t* to = panels_.to;
-  for (i64 j = 0; j < own; ++j) to[j] = static_cast<std::int32_t>(column[j] - first);
-  for (i64 j = own; j < count; ++j) to[j] = static_cast<std::int32_t>(target_.place[column[j]]);
+  target_.find_places(s_.column + begin, begin == 0 ? rows_ : 0, count, to);
   i64 runs = 1;
   for (i64 j = 1; j < count; ++j) runs += to[j] != to[j - 1] + 1;
   runs_ = runs;

@@ -32,6 +32,11 @@ struct Target {
     return rows;
   }
   i64 place_of(i64 column) const { return column < end() ? column - block.first : place[column]; }
+  // Of `count` columns, the first `own` of which are the block's own. No comparing: it could not be guessed.
+  void find_places(const i64* column, i64 own, i64 count, std::int32_t* to) const {
+    for (i64 j = 0; j < own; ++j) to[j] = static_cast<std::int32_t>(column[j] - block.first);
+    for (i64 j = own; j < count; ++j) to[j] = static_cast<std::int32_t>(place[column[j]]);
+  }
 };
 
 // Subtracts what the group has for the rows of its leader's first columns, `done` of them, which are rows of the target;

@@ -76,7 +76,7 @@ struct Followers {
 
 class Blocks {
  public:
-  explicit Blocks(const NumericArrays& a) : a_(a) {}
+  explicit Blocks(const NumericArrays& a) : a_(a), fetched_(a.iu[a.n] > kCached ? kFetched : 0) {}
 
   // Cuts the rows into blocks and empties all lists.
   void find();
@@ -166,6 +166,8 @@ class Blocks {
   }
 
  private:
+  static constexpr i64 kCached = 1 << 21;  // entries of U that are in the third-level cache when they are needed again
+  static constexpr i64 kFetched = 40;
   static constexpr i64 kRowsAhead = 6;
   static constexpr int kAhead = 16;
   static constexpr int kQueue = 64 + kMostGroupRows;
@@ -187,6 +189,11 @@ class Blocks {
     __builtin_prefetch(column + 8);
     __builtin_prefetch(value, 1);
     __builtin_prefetch(value + 8, 1);
+    const i64 fetched = std::min(length + 1 - width - place, fetched_);
+    for (i64 j = 16; j < fetched; j += 8) {
+      __builtin_prefetch(column + j);
+      __builtin_prefetch(value + j, 1);
+    }
     __builtin_prefetch(a_.diag + first);
     return {first,
             width,
@@ -222,6 +229,7 @@ class Blocks {
   }
 
   const NumericArrays& a_;
+  const i64 fetched_;  // entries of a source, as far as they are asked for when it is read
 };
 
 }  // namespace sm

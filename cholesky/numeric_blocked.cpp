@@ -101,7 +101,7 @@ class BlockedRows {
   SmStatus block(i64 first);
   void add_shared_rows(const Target& target);
   void load_block(const Target& target);
-  void leave(const SourceGroup& group, const Block& block, Followers& followers) const;
+  [[gnu::always_inline]] void leave(const SourceGroup& group, const Block& block, Followers& followers) const;
   void update_target(const Target& target, const SourceGroup& group);
   void update_target(const Target& target, Source& s);
   void subtract_products(const Target& target, const Source& s, i64 rows);
@@ -147,7 +147,7 @@ double BlockedRows::subtract_block(const Source& s, double d) {
 }
 
 // What becomes of a group that has updated the block.
-void BlockedRows::leave(const SourceGroup& group, const Block& block, Followers& followers) const {
+inline void BlockedRows::leave(const SourceGroup& group, const Block& block, Followers& followers) const {
   if (blocks_.can_follow(group, block, followers)) {
     blocks_.follow(group, followers);
   } else {
@@ -213,7 +213,7 @@ void BlockedRows::load_block(const Target& target) {
 
 // The update of a few products.
 void BlockedRows::subtract_products(const Target& target, const Source& s, i64 rows) {
-  for (i64 j = 0; j < s.count; ++j) panels_.to[j] = static_cast<std::int32_t>(target.place_of(s.column[j]));
+  target.find_places(s.column, rows, s.count, panels_.to);
   double factor[kMostBlockRows];
   for (i64 i = 0; i < rows; ++i) {
     double d = a_.diag[s.column[i]];
