@@ -131,15 +131,8 @@ class Blocks {
   void await(const SourceGroup& group) const {
     const Source& leader = group.leader();
     if (leader.done == leader.count) return;
-    i64 last = leader.first;
-    queue(last, word_of(leader, 0), leader.column[leader.done]);
-    for (const Source* s = group.begin() + 1; s < group.end(); ++s) {
-      if (s->done == s->count) continue;
-      a_.position[s->first] = word_of(*s, kFollows);
-      a_.jl[s->first] = a_.jl[last];
-      a_.jl[last] = s->first;
-      last = s->first;
-    }
+    queue(leader.first, word_of(leader, 0), leader.column[leader.done]);
+    if (group.count > 1) await_behind_leader(group);
   }
   // Whether the group is to follow the block of which `followers` are known, which it has updated.
   bool can_follow(const SourceGroup& group, const Block& block, const Followers& followers) const {
@@ -147,16 +140,7 @@ class Blocks {
     return block.tail_length() >= kFewestGroupColumns && (leader.count - leader.done) * 5 >= block.tail_length() * 4 &&
            block.width + followers.rows + group.rows <= kMostGroupRows;
   }
-  void follow(const SourceGroup& group, Followers& followers) const {
-    for (const Source& s : group) {
-      if (s.done == s.count) continue;
-      a_.position[s.first] = word_of(s, kFollows);
-      a_.jl[s.first] = followers.first;
-      followers.first = s.first;
-      if (followers.last < 0) followers.last = s.first;
-      followers.rows += s.width;
-    }
-  }
+  void follow(const SourceGroup& group, Followers& followers) const;
   void await(const Block& b, const Followers& followers) const {
     if (b.tail_length() == 0) return;
     queue(b.first, b.width, b.tail[0]);
@@ -220,6 +204,7 @@ class Blocks {
     return length > 0 && a_.iu[k + 2] - a_.iu[k + 1] == length - 1 && a_.ju[a_.iju[k]] == k + 1;
   }
   void cut(i64 first, i64 end);
+  void await_behind_leader(const SourceGroup& group) const;
   void queue(i64 first, i64 word, i64 column) const {
     const i64 mark = a_.jl[column];
     const i64 target = mark < -1 ? -2 - mark : column;
