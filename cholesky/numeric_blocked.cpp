@@ -241,11 +241,13 @@ void BlockedRows::update_target(const Target& target, Source& s) {
 }
 
 void BlockedRows::update_target(const Target& target, const SourceGroup& group) {
-  Source& leader = group.leader();
-  leader.done = target.rows_of(leader);
-  if (group.count > 1 && leader.done > 1 && group.rows * leader.done * leader.count >= kFewProducts) {
-    update_block(target, group, panels_);
-    return;
+  if (group.count > 1) {
+    Source& leader = group.leader();
+    leader.done = target.rows_of(leader);
+    if (leader.done > 1 && group.rows * leader.done * leader.count >= kFewProducts) {
+      update_block(target, group, panels_);
+      return;
+    }
   }
   for (Source& s : group) update_target(target, s);
 }
