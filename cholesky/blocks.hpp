@@ -179,16 +179,8 @@ class Blocks {
       __builtin_prefetch(value + j, 1);
     }
     __builtin_prefetch(a_.diag + first);
-    return {first,
-            width,
-            place,
-            length + 1 - width - place,
-            column,
-            value,
-            length - 1,
-            a_.diag + first,
-            (word & kFollows) != 0,
-            0};
+    return {first, width,      place,           length + 1 - width - place, column,
+            value, length - 1, a_.diag + first, (word & kFollows) != 0,     0};
   }
   [[gnu::always_inline]] void fetch_words(i64 first) const {
     __builtin_prefetch(a_.position + first);

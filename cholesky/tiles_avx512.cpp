@@ -78,8 +78,8 @@ SM_TILE_TARGET i64 expand(const i64* column, i64 columns, const i64* own, i64 ow
   return found;
 }
 
-const TileKernels kKernels = {"AVX-512",  X::kRows,    X::kVectors* X::kWidth, strip, pack, expand, spread, factor_small,
-                              add_square, invert_small};
+const TileKernels kKernels = {"AVX-512", X::kRows, X::kVectors* X::kWidth, strip,      pack,
+                              expand,    spread,   factor_small,           add_square, invert_small};
 
 }  // namespace
 

@@ -19,13 +19,13 @@ add_library(qxesm_objects OBJECT
   cholesky/block_factor.cpp
   cholesky/block_tree.cpp
   cholesky/block_update.cpp
-  cholesky/group_panel.cpp
   cholesky/blocks.cpp
   cholesky/dense.cpp
   cholesky/factor.cpp
   cholesky/ginverse2.cpp
   cholesky/ginverse2_blocked.cpp
   cholesky/given_order.cpp
+  cholesky/group_panel.cpp
   cholesky/inverse_columns.cpp
   cholesky/inverse_diagonal.cpp
   cholesky/inverse_gather.cpp
