@@ -1,5 +1,5 @@
 // A finished block updates rows of a later block: the dense product of a few strips of coefficients with the rows of
-// the source, added at places that are found once for the pair.
+// the source, added at places that are found once for the pair. The source may be a group of blocks (group_panel.hpp).
 #include <algorithm>
 
 #include "cholesky/block_work.hpp"

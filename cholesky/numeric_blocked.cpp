@@ -9,6 +9,7 @@
 //
 //   blocks.hpp        what a block is, and the lists
 //   block_update.cpp  a block updates a later one: strips of coefficients -V D times the rows of the source
+//   group_panel.hpp   blocks that have most of their columns in common do so together
 //   block_factor.cpp  a block is factored
 //   shared_tails.hpp  what blocks with one tail have for it, summed beforehand
 //   tiles.hpp         the kernels under all of them
