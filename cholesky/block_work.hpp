@@ -24,11 +24,24 @@ struct Target {
   const i64* place;
   double* diag;
 
-  i64 place_of(i64 column) const { return column < block.first + block.width ? column - block.first : place[column]; }
+  i64 end() const { return block.first + block.width; }
+  // How many of the source's columns are rows here.
+  i64 rows_of(const Source& s) const {
+    i64 rows = 0;
+    while (rows < s.count && s.column[rows] < end()) ++rows;
+    return rows;
+  }
+  i64 place_of(i64 column) const { return column < end() ? column - block.first : place[column]; }
+  // Of `count` columns, the first `own` of which are the block's own. No comparing: it could not be guessed.
+  void find_places(const i64* column, i64 own, i64 count, std::int32_t* to) const {
+    for (i64 j = 0; j < own; ++j) to[j] = static_cast<std::int32_t>(column[j] - block.first);
+    for (i64 j = own; j < count; ++j) to[j] = static_cast<std::int32_t>(place[column[j]]);
+  }
 };
 
-// Subtracts what block `s` has for the rows of its first `rows` columns, which are rows of the target.
-void update_block(const Target& target, const Source& s, i64 rows, Panels& panels);
+// Subtracts what the group has for the rows of its leader's first columns, `done` of them, which are rows of the target;
+// notes how many of these its followers have.
+void update_block(const Target& target, const SourceGroup& group, Panels& panels);
 
 // Factors the block, all of whose updates are in: pivots from diag, multipliers among its own rows, raw values behind.
 // With a square for its short tail (shared_tails.hpp) -V' D V of the tail is added to that, and multipliers are left.

@@ -26,4 +26,26 @@ void Blocks::cut(i64 first, i64 end) {
   }
 }
 
+void Blocks::await_behind_leader(const SourceGroup& group) const {
+  i64 last = group.leader().first;
+  for (const Source* s = group.begin() + 1; s < group.end(); ++s) {
+    if (s->done == s->count) continue;
+    a_.position[s->first] = word_of(*s, kFollows);
+    a_.jl[s->first] = a_.jl[last];
+    a_.jl[last] = s->first;
+    last = s->first;
+  }
+}
+
+void Blocks::follow(const SourceGroup& group, Followers& followers) const {
+  for (const Source& s : group) {
+    if (s.done == s.count) continue;
+    a_.position[s.first] = word_of(s, kFollows);
+    a_.jl[s.first] = followers.first;
+    followers.first = s.first;
+    if (followers.last < 0) followers.last = s.first;
+    followers.rows += s.width;
+  }
+}
+
 }  // namespace sm

@@ -9,6 +9,7 @@
 //
 //   blocks.hpp        what a block is, and the lists
 //   block_update.cpp  a block updates a later one: strips of coefficients -V D times the rows of the source
+//   group_panel.hpp   blocks that have most of their columns in common do so together
 //   block_factor.cpp  a block is factored
 //   shared_tails.hpp  what blocks with one tail have for it, summed beforehand
 //   tiles.hpp         the kernels under all of them
@@ -54,6 +55,12 @@ void add_rows(double* target, const Place* to, i64 count, const double* source, 
   }
 }
 
+// to[column[j]] += factor * value[j], the first column left out.
+[[gnu::always_inline]] inline void add_row(double* to, const i64* column, const double* value, const i64* end,
+                                           double factor) {
+  for (++column, ++value; column < end; ++column, ++value) to[*column] += factor * *value;
+}
+
 // Row k of A behind its diagonal, which is answered, into a row of U; place[j] is where column j is. Not inlined: the
 // loop needs all registers.
 [[gnu::noinline]] double enter_row(const SmMatrix& m, i64 k, const i64* place, double* row) {
@@ -89,13 +96,15 @@ class BlockedRows {
  private:
   SmStatus single_row(i64 k);
   double load_row(i64 k);
-  double update_row(i64 k, double d);
+  double update_row(const Block& row, Followers& followers, double d);
   double add_shared_row(i64 k, double d);
   double subtract_block(const Source& s, double d);
   SmStatus block(i64 first);
   void add_shared_rows(const Target& target);
   void load_block(const Target& target);
-  void update_target(const Target& target, const Source& s);
+  [[gnu::always_inline]] void leave(const SourceGroup& group, const Block& block, Followers& followers) const;
+  void update_target(const Target& target, const SourceGroup& group);
+  void update_target(const Target& target, Source& s);
   void subtract_products(const Target& target, const Source& s, i64 rows);
 
   const NumericArrays& a_;
@@ -138,19 +147,33 @@ double BlockedRows::subtract_block(const Source& s, double d) {
   return d;
 }
 
-// Everything that waits for row k. Answers the pivot.
-double BlockedRows::update_row(i64 k, double d) {
-  blocks_.for_each_waiting(k, [&](const Source& s) {
-    if (s.width == 1) {
-      const double u = *s.value;
-      const double f = -u * *s.pivot;
-      *s.value = f;
-      d += u * f;
-      for (i64 j = 1; j < s.count; ++j) a_.diag[s.column[j]] += f * s.value[j];
-    } else {
-      d = subtract_block(s, d);
+// What becomes of a group that has updated the block.
+inline void BlockedRows::leave(const SourceGroup& group, const Block& block, Followers& followers) const {
+  if (blocks_.can_follow(group, block, followers)) {
+    blocks_.follow(group, followers);
+  } else {
+    blocks_.await(group);
+  }
+}
+
+// Everything that waits for the row. Answers the pivot.
+double BlockedRows::update_row(const Block& row, Followers& followers, double d) {
+  double* const dense = a_.diag;
+  blocks_.for_each_waiting(row.first, [&](const SourceGroup& group) {
+    for (Source& s : group) {
+      if (*s.column != row.first) continue;
+      if (s.width == 1) {
+        const double u = *s.value;
+        const double f = -u * *s.pivot;
+        *s.value = f;
+        d += u * f;
+        add_row(dense, s.column, s.value, s.column + s.count, f);
+      } else {
+        d = subtract_block(s, d);
+      }
+      s.done = 1;
     }
-    blocks_.await(s, 1);
+    leave(group, row, followers);
   });
   return d;
 }
@@ -166,11 +189,12 @@ double BlockedRows::add_shared_row(i64 k, double d) {
 SmStatus BlockedRows::single_row(i64 k) {
   const Block b = blocks_.at(k, 1);
   for (i64 j = 0; j < b.length; ++j) a_.diag[b.tail[j]] = 0.0;
-  double d = update_row(k, load_row(k));
+  Followers followers;
+  double d = update_row(b, followers, load_row(k));
   if (shared_.has_rows_before(k + 1)) d = add_shared_row(k, d);
   SM_TRY(pivots_.judge(k, d, a_.diag[k]));
   for (i64 j = 0; j < b.length; ++j) b.values[j] = a_.diag[b.tail[j]];
-  blocks_.await(b);
+  blocks_.await(b, followers);
   return SM_OK;
 }
 
@@ -190,7 +214,7 @@ void BlockedRows::load_block(const Target& target) {
 
 // The update of a few products.
 void BlockedRows::subtract_products(const Target& target, const Source& s, i64 rows) {
-  for (i64 j = 0; j < s.count; ++j) panels_.to[j] = static_cast<std::int32_t>(target.place_of(s.column[j]));
+  target.find_places(s.column, rows, s.count, panels_.to);
   double factor[kMostBlockRows];
   for (i64 i = 0; i < rows; ++i) {
     double d = a_.diag[s.column[i]];
@@ -207,16 +231,26 @@ void BlockedRows::subtract_products(const Target& target, const Source& s, i64 r
   }
 }
 
-void BlockedRows::update_target(const Target& target, const Source& s) {
-  const i64 end = target.block.first + target.block.width;
-  i64 rows = 1;
-  while (rows < s.count && s.column[rows] < end) ++rows;
+void BlockedRows::update_target(const Target& target, Source& s) {
+  const i64 rows = s.done = target.rows_of(s);
+  if (rows == 0) return;
   if (s.count <= kPanelColumns && s.width * rows * s.count < kFewProducts) {
     subtract_products(target, s, rows);
   } else {
-    update_block(target, s, rows, panels_);
+    update_block(target, {&s, 1, s.width}, panels_);
   }
-  blocks_.await(s, rows);
+}
+
+void BlockedRows::update_target(const Target& target, const SourceGroup& group) {
+  if (group.count > 1) {
+    Source& leader = group.leader();
+    leader.done = target.rows_of(leader);
+    if (leader.done > 1 && group.rows * leader.done * leader.count >= kFewProducts) {
+      update_block(target, group, panels_);
+      return;
+    }
+  }
+  for (Source& s : group) update_target(target, s);
 }
 
 void BlockedRows::add_shared_rows(const Target& target) {
@@ -232,11 +266,15 @@ SmStatus BlockedRows::block(i64 first) {
   const Block b = blocks_.at(first, blocks_.width(first));
   const Target target = {b, place_, a_.diag};
   load_block(target);
-  blocks_.for_each_waiting(first, [&](const Source& s) { update_target(target, s); });
+  Followers followers;
+  blocks_.for_each_waiting(first, [&](const SourceGroup& group) {
+    update_target(target, group);
+    leave(group, b, followers);
+  });
   if (shared_.has_rows_before(first + b.width)) add_shared_rows(target);
   double* square = shared_.square_for(b);
   SM_TRY(factor_block(b, a_.diag, square, pivots_, panels_));
-  if (!square) blocks_.await(b);
+  if (!square) blocks_.await(b, followers);
   return SM_OK;
 }
 
@@ -244,6 +282,7 @@ SmStatus BlockedRows::run() {
   Blocks(a_).find();
   for (i64 k = 0, width = 0; k < a_.n; k += width) {
     width = blocks_.width(k);
+    blocks_.fetch_ahead(k);
     SM_TRY(width == 1 ? single_row(k) : block(k));
   }
   return SM_OK;

@@ -52,6 +52,11 @@ struct TileKernels {
   // Columns [0, columns) of the source's rows, tile by tile, each tile's rows one behind the other; the last tile's
   // missing columns as zeros.
   void (*pack)(i64 depth, const double* first, i64 step, i64 columns, double* panel);
+  // A row on the columns of another one, as a row of a packed panel: tile by tile, tile_step apart, values where `own` has
+  // the column, zeros elsewhere and behind the last. own: the row's columns, `own_count` of them, all of which are among
+  // `column` or behind its last. Answers how many have been found.
+  i64 (*expand)(const i64* column, i64 columns, const i64* own, i64 own_count, const double* value, double* panel,
+                i64 tile_step);
   // target[i][to + x] += sums[i * sums_step + from + x - first] for i < rows over the runs, what is before `first` of
   // them left out.
   void (*spread)(int rows, const double* sums, i64 sums_step, i64 first, const Run* run, const Run* end,

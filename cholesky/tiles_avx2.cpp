@@ -1,4 +1,6 @@
 // Tile kernels for AVX2 with FMA: strips of 4 rows, tiles of 12 columns, 12 of the 16 registers for the sums.
+#include <algorithm>
+
 #include "cholesky/blocks.hpp"
 #include "cholesky/tiles.hpp"
 
@@ -38,8 +40,8 @@ struct X {
 //
 #include "cholesky/small_inverse_body.hpp"
 
-const TileKernels kKernels = {"AVX2",     X::kRows,    X::kVectors* X::kWidth, strip, pack, spread, factor_small,
-                              add_square, invert_small};
+const TileKernels kKernels = {"AVX2",       X::kRows, X::kVectors* X::kWidth, strip,      pack,
+                              expand_plain, spread,   factor_small,           add_square, invert_small};
 
 }  // namespace
 

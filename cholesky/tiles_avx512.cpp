@@ -1,4 +1,7 @@
 // Tile kernels for AVX-512: strips of 8 rows, tiles of 24 columns, 24 of the 32 registers for the sums.
+#include <algorithm>
+#include <bit>
+
 #include "cholesky/blocks.hpp"
 #include "cholesky/tiles.hpp"
 
@@ -36,8 +39,47 @@ struct X {
 //
 #include "cholesky/small_inverse_body.hpp"
 
-const TileKernels kKernels = {"AVX-512",  X::kRows,    X::kVectors* X::kWidth, strip, pack, spread, factor_small,
-                              add_square, invert_small};
+// Which of eight columns the row has. No branch: where rows lack columns, it could not be guessed.
+SM_TILE_INLINE __mmask8 columns_found(__m512i column, const i64* own) {
+  const auto at = [&](int i) SM_TILE_TARGET { return _mm512_cmpeq_epi64_mask(column, _mm512_set1_epi64(own[i])); };
+  return static_cast<__mmask8>(((at(0) | at(1)) | (at(2) | at(3))) | ((at(4) | at(5)) | (at(6) | at(7))));
+}
+
+SM_TILE_TARGET i64 expand(const i64* column, i64 columns, const i64* own, i64 own_count, const double* value,
+                          double* panel, i64 tile_step) {
+  constexpr i64 kColumns = X::kVectors * X::kWidth;
+  i64 found = 0;
+  for (i64 j = 0; j < columns; j += kColumns, panel += tile_step) {
+    for (i64 x = 0; x < kColumns; x += X::kWidth) {
+      const i64 left = own_count - found;
+      const i64 lanes = std::min(X::kWidth, columns - j - x);
+      if (left <= 0 || lanes <= 0) {
+        X::store(panel + x, X::zero());
+        continue;
+      }
+      const __m512i none = _mm512_set1_epi64(-1);
+      const __m512i here = _mm512_mask_loadu_epi64(none, X::mask(static_cast<int>(lanes)), column + j + x);
+      alignas(64) i64 few[X::kWidth];
+      const i64* next = own + found;
+      X::Vector values;
+      if (left >= X::kWidth) {
+        values = X::load(value + found);
+      } else {
+        const __mmask8 last = X::mask(static_cast<int>(left));
+        _mm512_store_si512(few, _mm512_mask_loadu_epi64(_mm512_set1_epi64(-2), last, next));
+        next = few;
+        values = X::load(value + found, static_cast<int>(left));
+      }
+      const __mmask8 has = columns_found(here, next);
+      X::store(panel + x, _mm512_maskz_expand_pd(has, values));
+      found += std::popcount(has);
+    }
+  }
+  return found;
+}
+
+const TileKernels kKernels = {"AVX-512", X::kRows, X::kVectors* X::kWidth, strip,      pack,
+                              expand,    spread,   factor_small,           add_square, invert_small};
 
 }  // namespace
 

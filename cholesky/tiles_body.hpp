@@ -153,6 +153,24 @@ SM_TILE_TARGET void pack(i64 depth, const double* first, i64 step, i64 columns, 
   }
 }
 
+// One by one, as most vectors have no instruction for it.
+[[maybe_unused]] inline i64 expand_plain(const i64* column, i64 columns, const i64* own, i64 own_count,
+                                         const double* value, double* panel, i64 tile_step) {
+  constexpr i64 kColumns = X::kVectors * X::kWidth;
+  i64 found = 0;
+  for (i64 j = 0; j < columns; j += kColumns, panel += tile_step) {
+    const i64 end = std::min(kColumns, columns - j);
+    i64 x = 0;
+    for (; x < end && found < own_count; ++x) {
+      const bool has = own[found] == column[j + x];
+      panel[x] = has ? value[found] : 0.0;
+      found += has;
+    }
+    for (; x < kColumns; ++x) panel[x] = 0.0;
+  }
+  return found;
+}
+
 SM_TILE_TARGET void spread(int rows, const double* sums, i64 sums_step, i64 first, const Run* run, const Run* end,
                            double* const* target) {
   for (; run != end; ++run) {

@@ -1,5 +1,6 @@
 // Tile kernels for any CPU, on vectors of two: strips of 4 rows, tiles of 4 columns. No fused multiply-add, so that the
 // factor has the same bits everywhere.
+#include <algorithm>
 #include <cstring>
 
 #include "cholesky/blocks.hpp"
@@ -38,8 +39,8 @@ struct X {
 //
 #include "cholesky/small_inverse_body.hpp"
 
-const TileKernels kKernels = {"portable", X::kRows,    X::kVectors* X::kWidth, strip, pack, spread, factor_small,
-                              add_square, invert_small};
+const TileKernels kKernels = {"portable",   X::kRows, X::kVectors* X::kWidth, strip,      pack,
+                              expand_plain, spread,   factor_small,           add_square, invert_small};
 
 }  // namespace
 

@@ -25,6 +25,7 @@ add_library(qxesm_objects OBJECT
   cholesky/ginverse2.cpp
   cholesky/ginverse2_blocked.cpp
   cholesky/given_order.cpp
+  cholesky/group_panel.cpp
   cholesky/inverse_columns.cpp
   cholesky/inverse_diagonal.cpp
   cholesky/inverse_gather.cpp

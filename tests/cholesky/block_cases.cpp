@@ -54,6 +54,27 @@ Graph bordered_clique(std::int64_t width, std::int64_t gap, std::int64_t tail) {
   return g;
 }
 
+Graph growing_tails(Random& random, std::int64_t count, std::int64_t most_width, std::int64_t border) {
+  Indices first{0};
+  for (std::int64_t c = 0; c < count; ++c) first.push_back(first.back() + 1 + random.below(most_width));
+  const std::int64_t begin = first.back();
+  Graph g{begin + border, {}};
+  for (std::size_t c = 0; c < at(count); ++c) {
+    for (std::int64_t i = first[c]; i < first[c + 1]; ++i)
+      for (std::int64_t j = i + 1; j < first[c + 1]; ++j) g.edges.emplace_back(i, j);
+    for (const std::size_t next : {c + 1, c + 2}) {
+      if (next >= at(count) || !random.chance(next == c + 1 ? 80 : 30)) continue;
+      g.edges.emplace_back(first[c], first[next] + random.below(first[next + 1] - first[next]));
+    }
+    const std::int64_t share = c == 0 || random.chance(15) ? 50 + random.below(51) : 3;
+    for (std::int64_t j = begin; j < g.n; ++j)
+      if (random.chance(share)) g.edges.emplace_back(first[c + 1] - 1, j);
+  }
+  for (std::int64_t i = begin; i < g.n; ++i)
+    for (std::int64_t j = i + 1; j < g.n; ++j) g.edges.emplace_back(i, j);
+  return relabelled(g, natural_order(g.n));  // sorted
+}
+
 Graph subjects(const std::vector<Indices>& tails, std::int64_t width, std::int64_t border) {
   const auto own = static_cast<std::int64_t>(tails.size()) * width;
   Graph g{own + border, {}};

@@ -13,6 +13,10 @@ Graph any_linked_cliques(Random& random);
 std::vector<Graph> smallest_graphs();
 // A clique whose every vertex touches `tail` vertices that follow it, after `gap` others that touch those only.
 Graph bordered_clique(std::int64_t width, std::int64_t gap, std::int64_t tail);
+// Cliques of up to `most_width` vertices one behind the other, most of them touching the next one, and some the one
+// after that; some touch most of the `border` vertices, a clique behind them all, others few: rows further on have most
+// columns of those before, and some more.
+Graph growing_tails(Random& random, std::int64_t count, std::int64_t most_width, std::int64_t border);
 // Subjects of `width` vertices each, cliques of their own; subject s touches the vertices of tails[s] among the
 // `border` ones behind them all.
 Graph subjects(const std::vector<Indices>& tails, std::int64_t width, std::int64_t border);

@@ -137,6 +137,16 @@ TEST_P(BlockedTest, agrees_with_the_rows_on_grids_and_hubs) {
   compare(positive_definite(elements(random, 300, 90, 12), random), false);
 }
 
+TEST_P(BlockedTest, agrees_with_the_rows_where_blocks_follow_others_with_most_of_their_columns) {
+  for (std::uint64_t seed = 0; seed < 120; ++seed) {
+    Random random(seed);
+    const std::int64_t border = 30 + random.below(seed % 10 == 0 ? 500 : 120);
+    const Graph g = growing_tails(random, 5 + random.below(50), 1 + random.below(seed % 3 == 0 ? 6 : 1), border);
+    compare(positive_definite(g, random), random.chance(80));
+    if (HasFailure()) FAIL() << "seed " << seed;
+  }
+}
+
 TEST_P(BlockedTest, drops_what_the_rows_drop) {
   for (std::uint64_t seed = 0; seed < 300; ++seed) {
     Random random(seed);
