@@ -55,12 +55,6 @@ void add_rows(double* target, const Place* to, i64 count, const double* source, 
   }
 }
 
-// to[column[j]] += factor * value[j], the first column left out.
-[[gnu::always_inline]] inline void add_row(double* to, const i64* column, const double* value, const i64* end,
-                                           double factor) {
-  for (++column, ++value; column < end; ++column, ++value) to[*column] += factor * *value;
-}
-
 // Row k of A behind its diagonal, which is answered, into a row of U; place[j] is where column j is. Not inlined: the
 // loop needs all registers.
 [[gnu::noinline]] double enter_row(const SmMatrix& m, i64 k, const i64* place, double* row) {
@@ -159,19 +153,22 @@ inline void BlockedRows::leave(const SourceGroup& group, const Block& block, Fol
 // Everything that waits for the row. Answers the pivot.
 double BlockedRows::update_row(const Block& row, Followers& followers, double d) {
   double* const dense = a_.diag;
+  const auto subtract = [&](Source& s) {
+    if (s.width == 1) {
+      const double u = *s.value;
+      const double f = -u * *s.pivot;
+      *s.value = f;
+      d += u * f;
+      for (i64 j = 1; j < s.count; ++j) dense[s.column[j]] += f * s.value[j];
+    } else {
+      d = subtract_block(s, d);
+    }
+    s.done = 1;
+  };
   blocks_.for_each_waiting(row.first, [&](const SourceGroup& group) {
-    for (Source& s : group) {
-      if (*s.column != row.first) continue;
-      if (s.width == 1) {
-        const double u = *s.value;
-        const double f = -u * *s.pivot;
-        *s.value = f;
-        d += u * f;
-        add_row(dense, s.column, s.value, s.column + s.count, f);
-      } else {
-        d = subtract_block(s, d);
-      }
-      s.done = 1;
+    subtract(group.leader());
+    for (Source* s = group.begin() + 1; s != group.end(); ++s) {
+      if (*s->column == row.first) subtract(*s);
     }
     leave(group, row, followers);
   });
