@@ -2,6 +2,9 @@
 #include "cholesky/blocks.hpp"
 
 #include <algorithm>
+#include <bit>
+#include <cmath>
+#include <cstdint>
 
 namespace sm {
 
@@ -24,6 +27,22 @@ void Blocks::cut(i64 first, i64 end) {
     a_.jl[k] = -1;
     for (i64 row = k + 1; row < std::min(k + width, end); ++row) a_.jl[row] = -2 - k;
   }
+}
+
+// Entries that are left of the source, and their multipliers. The largest is found by its bits, whose order is that of
+// magnitudes, with NaN behind infinity: no addition waits for the one before.
+bool Blocks::is_finite(const Source& s) const {
+  constexpr std::uint64_t kMagnitude = ~std::uint64_t{0} >> 1;
+  const double* row = s.value + s.done;
+  for (i64 r = 0; r < s.width; row += s.step - r, ++r) {
+    std::uint64_t most = 0;
+    for (i64 j = 0; j < s.count - s.done; ++j) {
+      most = std::max(most, std::bit_cast<std::uint64_t>(row[j]) & kMagnitude);
+    }
+    const double largest = std::bit_cast<double>(most);
+    if (!std::isfinite(largest) || !std::isfinite(largest * s.pivot[r])) return false;
+  }
+  return true;
 }
 
 void Blocks::await_behind_leader(const SourceGroup& group) const {

@@ -15,7 +15,8 @@
 // When a block has updated another one, what is left of its tail is part of that one's tail. If that is most of it, the
 // block follows the other from then on: the two wait in one list, the follower behind its leader, and update later
 // blocks as one source of more rows (group_panel.hpp). What follows it comes with it. Followers have not all columns of
-// their leader, and may have none in the block that the leader updates.
+// their leader, and may have none in the block that the leader updates. Where a follower has no column, zeros meet its
+// entries and multipliers: these must be finite.
 #pragma once
 
 #include <algorithm>
@@ -138,7 +139,7 @@ class Blocks {
   bool can_follow(const SourceGroup& group, const Block& block, const Followers& followers) const {
     const Source& leader = group.leader();
     return block.tail_length() >= kFewestGroupColumns && (leader.count - leader.done) * 5 >= block.tail_length() * 4 &&
-           block.width + followers.rows + group.rows <= kMostGroupRows;
+           block.width + followers.rows + group.rows <= kMostGroupRows && is_finite(leader);
   }
   void follow(const SourceGroup& group, Followers& followers) const;
   void await(const Block& b, const Followers& followers) const {
@@ -196,6 +197,7 @@ class Blocks {
     return length > 0 && a_.iu[k + 2] - a_.iu[k + 1] == length - 1 && a_.ju[a_.iju[k]] == k + 1;
   }
   void cut(i64 first, i64 end);
+  bool is_finite(const Source& s) const;
   void await_behind_leader(const SourceGroup& group) const;
   void queue(i64 first, i64 word, i64 column) const {
     const i64 mark = a_.jl[column];

@@ -2,23 +2,18 @@
 
 #include <dlfcn.h>
 #include <fmt/format.h>
+#include <unistd.h>
 
 #include <stdexcept>
 
 namespace sm::bench {
-
-namespace {
-
-constexpr std::uint64_t kKeptMemory = std::uint64_t{16} << 30;
-
-}  // namespace
 
 void expect_ok(SmStatus status, const char* doing) {
   if (status != SM_OK) throw std::runtime_error(fmt::format("{} ended with status {}", doing, status));
 }
 
 Module::Module() : extension_(host_), instance_(extension_) {
-  host_.set_kept_memory(kKeptMemory);
+  keep_freed_memory(Kept::much);
   if (!instance_) throw std::runtime_error(fmt::format("the module cannot be loaded: {}", host_.last_error()));
   Dl_info info{};
   dladdr(reinterpret_cast<void*>(fn().qxsmfact), &info);
@@ -39,6 +34,12 @@ Module::Module() : extension_(host_), instance_(extension_) {
   find(exports_.qxsmorder, "qxsmorder", false);
   find(exports_.qxsmrefill, "qxsmrefill", false);
   find(exports_.qxsminvpattern, "qxsminvpattern", false);
+}
+
+void Module::keep_freed_memory(Kept kept) {
+  const auto pages = static_cast<std::uint64_t>(sysconf(_SC_PHYS_PAGES));
+  const auto page = static_cast<std::uint64_t>(sysconf(_SC_PAGESIZE));
+  host_.set_kept_memory(kept == Kept::much ? pages * page / 2 : kUsual);
 }
 
 Module::~Module() {

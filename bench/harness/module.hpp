@@ -35,12 +35,18 @@ class Module {
   [[nodiscard]] const SmFunctionTable& fn() const { return instance_.fn(); }
   [[nodiscard]] const Exports& by_name() const { return exports_; }
   [[nodiscard]] std::uint64_t bytes_in_use() const { return host_.usage().bytes_in_use; }
+  // What of the host's freed blocks waits for its next use: half as much as there is memory, as at first here, or what
+  // a host keeps unless it is told otherwise.
+  enum class Kept { much, usual };
+  void keep_freed_memory(Kept kept);
   // Freed blocks that wait for their next use go back to the system.
   void trim() { host_.trim(); }
   // The file that it came from.
   [[nodiscard]] const std::string& file() const { return file_; }
 
  private:
+  static constexpr std::uint64_t kUsual = std::uint64_t{64} << 20;
+
   qxhost::Host host_;
   qxhost::Extension extension_;
   qxhost::Instance instance_;

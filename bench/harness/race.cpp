@@ -3,6 +3,7 @@
 #include <fmt/format.h>
 
 #include <algorithm>
+
 namespace sm::bench {
 namespace {
 

@@ -1,8 +1,9 @@
 // The peak of a factorization job once the matrix is closed: what the closed matrix holds, and by how much the resident
 // set of the process grew above that while it was factored.
+#include "bench/harness/memory.hpp"
+
 #include <cstdio>
 
-#include "bench/harness/memory.hpp"
 #include "bench/phases/phases.hpp"
 
 namespace sm::bench {
@@ -16,9 +17,11 @@ void measure_memory(Workbench& bench) {
   expect_ok(bench.module().fn().qxsmclose(matrix, 0.0), "closing");
   const auto closed = static_cast<double>(bench.module().bytes_in_use() - before);
   bench.module().trim();
+  bench.module().keep_freed_memory(Module::Kept::usual);
   if (!forget_peak()) return;
   const double begin = resident("VmRSS");
   expect_ok(bench.module().fn().qxsmfact(matrix, 0), "factoring");
+  bench.module().keep_freed_memory(Module::Kept::much);
   const double peak = closed + resident("VmHWM") - begin;
   const auto factor = static_cast<double>(matrix->factor_iu[problem.n]);
   const double bound = 9.5 * factor + 60.0 * static_cast<double>(matrix->nnz) + 120.0 * problem.n;

@@ -34,7 +34,7 @@ QXESM_API SmStatus qxsmreorder(SmMatrix* matrix);
 QXESM_API SmStatus qxsmsymbfact(SmMatrix* matrix);
 
 /* Values of U and D in the room that qxsmsymbfact left; state 5; rank, log_det, definite. Allocates nothing, and takes
- * 420 kB of stack. Uses the widest vector instructions of the CPU, chosen when the module is loaded: the last bits
+ * 430 kB of stack. Uses the widest vector instructions of the CPU, chosen when the module is loaded: the last bits
  * depend on them.
  * Answers: 0 with nothing done (empty); 0 (state 5); 1; 113; 0 (state above 5); 102 (state other than 4, or not
  * symmetric sparse); 101 (the room is too small); 103 (definite 0, the state stays 4); 0. */

@@ -147,6 +147,40 @@ TEST_P(BlockedTest, agrees_with_the_rows_where_blocks_follow_others_with_most_of
   }
 }
 
+// Row 0 has most of what row 1 has and would follow it: what it lacks, column 2, must not be reached by its infinity.
+TEST_P(BlockedTest, ends_as_the_rows_do_where_an_entry_is_infinite) {
+  constexpr std::int64_t n = 43;
+  Graph graph{n, {}};
+  for (std::int64_t j = 1; j < n - 1; ++j) {
+    if (j != 2) graph.edges.emplace_back(0, j);
+    if (j > 1) graph.edges.emplace_back(1, j);
+  }
+  for (std::int64_t i = 2; i < n; ++i) {
+    for (std::int64_t j = i + 1; j < n; ++j) graph.edges.emplace_back(i, j);
+  }
+  int ended_early = 0;
+  for (const double entry : {HUGE_VAL, -HUGE_VAL, 1e308}) {
+    for (std::int64_t column = 3; column < n - 1; ++column) {
+      Random random(static_cast<std::uint64_t>(column));
+      Problem problem = positive_definite(graph, random);
+      for (auto& e : problem.upper) {
+        if (e.row == 0 && e.col == column) e.value = entry;
+      }
+      SmMatrix* m = symbolic(problem, true);
+      const Outcome want = outcome_of(m, factor_by_rows);
+      for (const TileSet set : kSets) {
+        if (!use_tiles(set)) continue;
+        const Outcome got = outcome_of(m, factor_in_blocks);
+        EXPECT_EQ(got.status, want.status) << tile_kernels().name << ", " << entry << " in column " << column;
+        EXPECT_EQ(got.rank, want.rank) << tile_kernels().name << ", " << entry << " in column " << column;
+      }
+      ended_early += want.status == SM_NOT_DEFINITE;
+      fn().qxsmDestroyMatrix(instance(), &m);
+    }
+  }
+  EXPECT_GT(ended_early, 0);
+}
+
 TEST_P(BlockedTest, drops_what_the_rows_drop) {
   for (std::uint64_t seed = 0; seed < 300; ++seed) {
     Random random(seed);
