@@ -80,7 +80,7 @@ def span(run, name, unit=1e9):
 
 
 def latencies(machine, of="latency"):
-    points = [f"{p['seconds'] * 1e9:.2g} ns over {p['bytes'] / 2**20:.3g} MB" for p in machine.get(of, [])]
+    points = [f"{text.number(p['seconds'] * 1e9)} ns over {p['bytes'] / 2**20:.3g} MB" for p in machine.get(of, [])]
     return ", ".join(points) or "–"
 
 
