@@ -48,6 +48,16 @@ class PoolTest : public ::testing::Test {
   char* take(std::uint64_t bytes, std::uint32_t flags = 0) {
     return static_cast<char*>(pool->allocate(pool, bytes, flags));
   }
+  // So many blocks, every page of them touched.
+  std::vector<char*> take_written(int count, std::uint64_t bytes) {
+    std::vector<char*> blocks;
+    for (int k = 0; k < count; ++k) {
+      blocks.push_back(take(bytes));
+      EXPECT_NE(blocks.back(), nullptr);
+      if (blocks.back()) std::memset(blocks.back(), 1, bytes);
+    }
+    return blocks;
+  }
   QxHostUsage usage() { return qxhost_usage(host); }
 
   QxHost* host = qxhost_create(nullptr);
@@ -213,12 +223,7 @@ TEST_F(PoolTest, of_kept_pages_the_smallest_that_will_do_are_taken) {
 // The bounds leave room for a sanitizer's shadow of them all.
 TEST_F(PoolTest, of_freed_pages_64_megabytes_are_kept_and_the_oldest_go) {
   const std::int64_t before = resident_bytes();
-  std::vector<char*> blocks;
-  for (int k = 0; k < 12; ++k) {
-    blocks.push_back(take(8 * kMiB));
-    ASSERT_NE(blocks.back(), nullptr);
-    std::memset(blocks.back(), 1, 8 * kMiB);
-  }
+  const std::vector<char*> blocks = take_written(12, 8 * kMiB);
   for (char* block : blocks) pool->free(pool, block);
   EXPECT_LT(resident_bytes() - before, 80 * std::int64_t{kMiB});
   EXPECT_GT(resident_bytes() - before, 60 * std::int64_t{kMiB});
@@ -228,12 +233,7 @@ TEST_F(PoolTest, of_freed_pages_64_megabytes_are_kept_and_the_oldest_go) {
 
 TEST_F(PoolTest, many_kept_blocks_do_not_grow_without_bound) {
   const std::int64_t before = resident_bytes();
-  std::vector<char*> blocks;
-  for (int k = 0; k < 200; ++k) {
-    blocks.push_back(take(kMiB / 4));
-    ASSERT_NE(blocks.back(), nullptr);
-    std::memset(blocks.back(), 1, kMiB / 4);
-  }
+  const std::vector<char*> blocks = take_written(200, kMiB / 4);
   for (char* block : blocks) pool->free(pool, block);
   EXPECT_LT(resident_bytes() - before, 20 * std::int64_t{kMiB});
   EXPECT_EQ(take(kMiB / 4, SM_POOL_ZERO)[kMiB / 8], 0);
@@ -301,12 +301,7 @@ TEST_F(PoolTest, sizes_that_are_powers_of_two_are_kept_up_to_the_limits) {
 TEST_F(PoolTest, more_freed_pages_are_kept_when_the_host_is_told_so) {
   qxhost_set_kept_memory(host, 80 * kMiB);
   const std::int64_t before = resident_bytes();
-  std::vector<char*> blocks;
-  for (int k = 0; k < 3; ++k) {
-    blocks.push_back(take(40 * kMiB));
-    ASSERT_NE(blocks.back(), nullptr);
-    std::memset(blocks.back(), 1, 40 * kMiB);
-  }
+  const std::vector<char*> blocks = take_written(3, 40 * kMiB);
   for (char* block : blocks) pool->free(pool, block);
   EXPECT_GT(resident_bytes() - before, 75 * std::int64_t{kMiB});
   EXPECT_LT(resident_bytes() - before, 90 * std::int64_t{kMiB});
@@ -316,12 +311,7 @@ TEST_F(PoolTest, more_freed_pages_are_kept_when_the_host_is_told_so) {
 
 TEST_F(PoolTest, lowering_what_may_wait_gives_the_oldest_pages_back_at_once) {
   qxhost_set_kept_memory(host, 60 * kMiB);
-  std::vector<char*> blocks;
-  for (int k = 0; k < 3; ++k) {
-    blocks.push_back(take(20 * kMiB));
-    ASSERT_NE(blocks.back(), nullptr);
-    std::memset(blocks.back(), 1, 20 * kMiB);
-  }
+  const std::vector<char*> blocks = take_written(3, 20 * kMiB);
   for (char* block : blocks) pool->free(pool, block);
   const std::int64_t before = resident_bytes();
   qxhost_set_kept_memory(host, 45 * kMiB);
