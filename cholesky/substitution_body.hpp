@@ -252,14 +252,16 @@ SM_PASS_TARGET void backward_pass(const FactorRows& given, double* y, i64 first)
   }
 }
 
-#include "cholesky/substitution_packing.hpp"
-
 #include "cholesky/substitution_leaves.hpp"
 
 template <int kWide>
-constexpr LanePasses kLanePasses = {
-    kWide* kLanes, pack<kWide>,           forward_pass<Several<kWide>>, backward_pass<Several<kWide>>,
-    unpack<kWide>, unpack_in_place<kWide>, solve_leaves<kWide>};
+constexpr LanePasses kLanePasses = {kWide* kLanes,
+                                    pack<kWide>,
+                                    forward_pass<Several<kWide>>,
+                                    backward_pass<Several<kWide>>,
+                                    unpack<kWide>,
+                                    unpack_in_place<kWide>,
+                                    solve_leaves<kWide>};
 
 constexpr SubstitutionPasses kPasses = {forward_pass<Single>, backward_pass<Single>, kLanePasses<Access::kWide>,
                                         kLanePasses<1>};

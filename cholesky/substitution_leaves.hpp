@@ -7,6 +7,8 @@
 //
 // Deliberately without an include guard.
 
+#include "cholesky/substitution_packing.hpp"
+
 constexpr i64 kLeafRows = 64;  // with lanes at a time: in the first-level cache
 static_assert(kLeafRows >= 2 * kStripRows);
 constexpr i64 kLeavesAhead = 2 * kLeafRows;  // rows of the vectors that are fetched early
@@ -18,37 +20,7 @@ struct LeafRows {
   i64 n;
   const i64* there;
 
-  // Rows r to r + 7 are i, i + 1, .. in the vectors, or these from the last to the first, when way is -1.
-  SM_PASS_INLINE void take_eight(const double* b, i64 r, i64 i, i64 way, double* lanes) const {
-    double* to = lanes + (way > 0 ? r : r + kLanes - 1) * kAll;
-    for (i64 h = 0; h < kWide; ++h) {
-      Lanes t[kLanes];
-#pragma GCC unroll 8
-      for (i64 v = 0; v < kLanes; ++v) {
-        const double* from = b + i + (h * kLanes + v) * n;
-        t[v] = lanes_at(from);
-      }
-      transpose(t);
-#pragma GCC unroll 8
-      for (i64 q = 0; q < kLanes; ++q) lanes_at(to + q * way * kAll + h * kLanes) = t[q];
-    }
-  }
-  SM_PASS_INLINE void give_eight(const double* lanes, i64 r, i64 i, i64 way, double* x) const {
-    const double* from = lanes + (way > 0 ? r : r + kLanes - 1) * kAll;
-    for (i64 h = 0; h < kWide; ++h) {
-      Lanes t[kLanes];
-#pragma GCC unroll 8
-      for (i64 q = 0; q < kLanes; ++q) t[q] = lanes_at(from + q * way * kAll + h * kLanes);
-      transpose(t);
-#pragma GCC unroll 8
-      for (i64 v = 0; v < kLanes; ++v) {
-        double* to = x + i + (h * kLanes + v) * n;
-        lanes_at(to) = t[v];
-      }
-    }
-  }
-
-  // Where the run ends that begins at row r: rows that follow each other in the vectors.
+  // Behind the last row of the run that begins at row r: of rows that follow each other in the vectors, up or down.
   SM_PASS_INLINE i64 end_of_run(i64 r, i64 count) const {
     i64 end = r + 1;
     if (end == count) return end;
@@ -57,15 +29,38 @@ struct LeafRows {
     while (end < count && there[end] - there[end - 1] == way) ++end;
     return end;
   }
+  SM_PASS_INLINE void take_eight(const double* b, i64 r, double* lanes) const {
+    const i64 way = there[r + 1] - there[r];
+    const i64 i = std::min(there[r], there[r + kLanes - 1]);
+    double* to = lanes + (way > 0 ? r : r + kLanes - 1) * kAll;
+    for (i64 h = 0; h < kWide; ++h) {
+      Lanes t[kLanes];
+#pragma GCC unroll 8
+      for (i64 v = 0; v < kLanes; ++v) t[v] = lanes_at(b + i + (h * kLanes + v) * n);
+      transpose(t);
+#pragma GCC unroll 8
+      for (i64 q = 0; q < kLanes; ++q) lanes_at(to + q * way * kAll + h * kLanes) = t[q];
+    }
+  }
+  SM_PASS_INLINE void give_eight(const double* lanes, i64 r, double* x) const {
+    const i64 way = there[r + 1] - there[r];
+    const i64 i = std::min(there[r], there[r + kLanes - 1]);
+    const double* from = lanes + (way > 0 ? r : r + kLanes - 1) * kAll;
+    for (i64 h = 0; h < kWide; ++h) {
+      Lanes t[kLanes];
+#pragma GCC unroll 8
+      for (i64 q = 0; q < kLanes; ++q) t[q] = lanes_at(from + q * way * kAll + h * kLanes);
+      transpose(t);
+#pragma GCC unroll 8
+      for (i64 v = 0; v < kLanes; ++v) lanes_at(x + i + (h * kLanes + v) * n) = t[v];
+    }
+  }
   // Runs of eight rows or more go eight at a time, the last of them perhaps for the second time.
   SM_PASS_INLINE void take(const double* b, i64 count, double* lanes) const {
     for (i64 r = 0; r < count;) {
       const i64 end = end_of_run(r, count);
       if (end - r >= kLanes) {
-        for (; r < end; r += kLanes) {
-          const i64 q = std::min(r, end - kLanes);
-          take_eight(b, q, std::min(there[q], there[q + kLanes - 1]), there[q + 1] - there[q], lanes);
-        }
+        for (; r < end; r += kLanes) take_eight(b, std::min(r, end - kLanes), lanes);
       }
       for (; r < end; ++r) {
         for (i64 v = 0; v < kAll; ++v) lanes[r * kAll + v] = b[there[r] + v * n];
@@ -77,10 +72,7 @@ struct LeafRows {
     for (i64 r = 0; r < count;) {
       const i64 end = end_of_run(r, count);
       if (end - r >= kLanes) {
-        for (; r < end; r += kLanes) {
-          const i64 q = std::min(r, end - kLanes);
-          give_eight(lanes, q, std::min(there[q], there[q + kLanes - 1]), there[q + 1] - there[q], x);
-        }
+        for (; r < end; r += kLanes) give_eight(lanes, std::min(r, end - kLanes), x);
       }
       for (; r < end; ++r) {
         for (i64 v = 0; v < kAll; ++v) x[there[r] + v * n] = lanes[r * kAll + v];
@@ -90,21 +82,19 @@ struct LeafRows {
   }
 };
 
-// A strip of leaves, its lanes at `own`; y is that of the rows behind. Functions of their own: they need all registers.
+// A strip of leaves, its lanes at `own`; y is that of the rows behind.
 template <int kWide>
 struct LeafStrip {
   double* own;
 
   template <int kRows>
-  SM_PASS_INLINE void forward(const FactorRows& f, const Strip<kRows>& s, i64 first,
-                                                        double* y) const {
+  SM_PASS_INLINE void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) const {
     Lanes w[kRows][kWide];
     Several<kWide>::descend(s, own, w);
     Several<kWide>::add_to_tail(f, s, first, w, y);
   }
   template <int kRows>
-  SM_PASS_INLINE void backward(const FactorRows& f, const Strip<kRows>& s, i64 first,
-                                                         double* y) const {
+  SM_PASS_INLINE void backward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) const {
     Lanes w[kRows][kWide];
     Several<kWide>::descend(s, own, w);
     Several<kWide>::put_scaled(f.diag + first, w, own);
@@ -112,6 +102,8 @@ struct LeafStrip {
   }
 };
 
+// Leaves with lanes at hand, some whole strips at a time. What the next ones will need of the vectors is fetched while
+// these are at work, a line of each vector at a time.
 template <int kWide>
 struct LeafPass {
   static constexpr i64 kAll = i64{kWide} * kLanes;
@@ -161,6 +153,7 @@ struct LeafPass {
   }
 };
 
+// All groups of vectors pass through the same rows before the next rows come: these are read once for all of them.
 template <int kWide>
 SM_PASS_TARGET void solve_leaves(const FactorRows& given, const RowOrder& order, const LeafBatch& batch) {
   constexpr i64 kAll = i64{kWide} * kLanes;
