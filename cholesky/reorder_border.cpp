@@ -244,7 +244,9 @@ void MovedEntries::take_out() {
     if (block.first == first_) {
       panel_[(block.column - first_) / kColumns] = in_panels;
       for (i64 r = 0; r < rows; ++r, in_panels += block.length) {
-        std::copy_n(m_.nz_values + block.at[r], block.length, panel_values_ + in_panels);
+        const double* value = m_.nz_values + block.at[r];
+        for (i64 t = kColumns; t < 2 * kColumns; t += kLine) __builtin_prefetch(value + t);  // of the next block
+        std::copy_n(value, block.length, panel_values_ + in_panels);
       }
       return true;
     }
