@@ -21,8 +21,8 @@ constexpr i64 kColumns = 256;  // of the rows walked side by side, at a time
 constexpr i64 kSideBySide = 16;
 constexpr i64 kLine = 8;         // words of a line of the cache
 constexpr i64 kPanelAhead = 24;  // columns of a panel that are fetched early
-constexpr i64 kShare = 8;  // a long row has an eighth of all columns, or more
-constexpr i64 kFew = 16;   // of that many rows, one is long: with more of them most entries go where long rows go
+constexpr i64 kShare = 8;        // a long row has an eighth of all columns, or more
+constexpr i64 kFew = 16;         // of that many rows, one is long: with more of them most entries go where long rows go
 // A block holds all columns of the rows side by side, so that one that is moved whole is none of theirs.
 static_assert(kColumns >= kSideBySide);
 
