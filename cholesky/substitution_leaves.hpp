@@ -10,7 +10,7 @@
 #include "cholesky/substitution_packing.hpp"
 
 constexpr i64 kLeafRows = 64;  // with lanes at a time: in the first-level cache
-static_assert(kLeafRows >= 2 * kStripRows);
+static_assert(kLeafRows >= kStripRows);
 constexpr i64 kLeavesAhead = 2 * kLeafRows;  // rows of the vectors that are fetched early
 
 // Rows of n that stand in the vectors where `there` says, to lanes and back.
