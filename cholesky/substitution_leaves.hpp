@@ -35,9 +35,7 @@ struct LeafRows {
     double* to = lanes + (way > 0 ? r : r + kLanes - 1) * kAll;
     for (i64 h = 0; h < kWide; ++h) {
       Lanes t[kLanes];
-#pragma GCC unroll 8
-      for (i64 v = 0; v < kLanes; ++v) t[v] = lanes_at(b + i + (h * kLanes + v) * n);
-      transpose(t);
+      read_eight(b + i + h * kLanes * n, n, t);
 #pragma GCC unroll 8
       for (i64 q = 0; q < kLanes; ++q) lanes_at(to + q * way * kAll + h * kLanes) = t[q];
     }
