@@ -20,8 +20,17 @@ EdgeCount count_tidy_edges(const SmMatrix& m, i64* degree) {
   for (i64 i = 0; i < m.rows; ++i) {
     i64 before = i;
     i64 entries = 0;
-    for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
+    const i64 end = m.row_start[i + 1];
+    const bool is_long = end - m.row_start[i] > kShort;
+    for (i64 p = m.row_start[i]; p < end; ++p) {
       const i64 j = m.col_index[p];
+      if (is_long && j > before && end - p >= kNeighbours && are_neighbours(m.col_index + p)) {
+        for (i64 q = 0; q < kNeighbours; ++q) ++degree[j + q];
+        before = j + kNeighbours - 1;
+        entries += kNeighbours;
+        p += kNeighbours - 1;
+        continue;
+      }
       if (j <= i) continue;
       count.tidy &= j > before;
       before = j;

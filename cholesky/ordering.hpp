@@ -10,6 +10,17 @@ namespace sm {
 // Vertices of more neighbours are long.
 inline constexpr i64 kShort = 32;
 
+// Columns of a long row are looked at so many at a time while each is the next one of the matrix, as in a border.
+inline constexpr i64 kNeighbours = 8;
+
+inline bool are_neighbours(const i64* column) {
+  const i64 first = *column;
+  if (column[kNeighbours - 1] != first + kNeighbours - 1) return false;
+  i64 differs = 0;
+  for (i64 q = 1; q < kNeighbours; ++q) differs |= column[q] ^ (first + q);
+  return differs == 0;
+}
+
 // The edges of a matrix's graph: entries above the diagonal, a repeated one counted once.
 struct EdgeCount {
   i64 edges = 0;

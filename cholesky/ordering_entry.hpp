@@ -139,8 +139,16 @@ void OrderingGraph<Index>::enter_row(const SmMatrix& m, Index i) {
 template <class Index>
 void OrderingGraph<Index>::enter_hub(const SmMatrix& m, Index i) {
   const std::uint64_t bit = hub_bit(i);
-  for (i64 p = m.row_start[i]; p < m.row_start[i + 1]; ++p) {
-    if (m.col_index[p] > static_cast<i64>(i)) hubs_of_[m.col_index[p]] |= bit;
+  const i64 end = m.row_start[i + 1];
+  for (i64 p = m.row_start[i]; p < end; ++p) {
+    const i64 j = m.col_index[p];
+    if (j <= static_cast<i64>(i)) continue;
+    if (end - p >= kNeighbours && are_neighbours(m.col_index + p)) {
+      for (i64 q = 0; q < kNeighbours; ++q) hubs_of_[j + q] |= bit;
+      p += kNeighbours - 1;
+    } else {
+      hubs_of_[j] |= bit;
+    }
   }
 }
 

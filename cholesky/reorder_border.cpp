@@ -19,8 +19,10 @@ namespace {
 
 constexpr i64 kColumns = 256;  // of the rows walked side by side, at a time
 constexpr i64 kSideBySide = 16;
-constexpr i64 kShare = 8;  // a long row has an eighth of all columns, or more
-constexpr i64 kFew = 16;   // of that many rows, one is long: with more of them most entries go where long rows go
+constexpr i64 kLine = 8;         // words of a line of the cache
+constexpr i64 kPanelAhead = 24;  // columns of a panel that are fetched early
+constexpr i64 kShare = 8;        // a long row has an eighth of all columns, or more
+constexpr i64 kFew = 16;         // of that many rows, one is long: with more of them most entries go where long rows go
 // A block holds all columns of the rows side by side, so that one that is moved whole is none of theirs.
 static_assert(kColumns >= kSideBySide);
 
@@ -66,6 +68,7 @@ class MovedEntries {
   bool is_full(const Block& block) const;
   i64 panels() const { return (n_ - first_ + kColumns - 1) / kColumns; }
   const double* panel_at(i64 j) const;
+  void fetch_panel(const double* panel, i64 column, i64 apart) const;
   void receive(i64 j, const double* panel, i64& from, i64 to);
 
   SmMatrix& m_;
@@ -135,7 +138,12 @@ bool MovedEntries::is_full(const Block& block) const {
   i64 differs = 0;
   for (i64 i = block.first; i < block.last; ++i) {
     const i64* column = m_.col_index + block.at[i - block.first];
-    for (i64 t = 0; t < block.length; ++t) differs |= column[t] ^ (block.column + t);
+    i64 t = 0;
+    for (; t + kLine <= block.length; t += kLine) {
+      __builtin_prefetch(column + t + kColumns);  // of the next block
+      for (i64 q = t; q < t + kLine; ++q) differs |= column[q] ^ (block.column + q);
+    }
+    for (; t < block.length; ++t) differs |= column[t] ^ (block.column + t);
   }
   return differs == 0;
 }
@@ -236,7 +244,9 @@ void MovedEntries::take_out() {
     if (block.first == first_) {
       panel_[(block.column - first_) / kColumns] = in_panels;
       for (i64 r = 0; r < rows; ++r, in_panels += block.length) {
-        std::copy_n(m_.nz_values + block.at[r], block.length, panel_values_ + in_panels);
+        const double* value = m_.nz_values + block.at[r];
+        for (i64 t = kColumns; t < 2 * kColumns; t += kLine) __builtin_prefetch(value + t);  // of the next block
+        std::copy_n(value, block.length, panel_values_ + in_panels);
       }
       return true;
     }
@@ -258,6 +268,12 @@ const double* MovedEntries::panel_at(i64 j) const {
   return panel < 0 ? nullptr : panel_values_ + panel + column;
 }
 
+// What a later column has in the panel, or in the next one, where that is as long. `panel` is at the column at hand.
+void MovedEntries::fetch_panel(const double* panel, i64 column, i64 apart) const {
+  const double* ahead = panel + kPanelAhead + (column + kPanelAhead < apart ? 0 : (beside_ - 1) * apart);
+  for (i64 r = 0; r < beside_; ++r) __builtin_prefetch(ahead + r * apart);
+}
+
 // What row j receives, from slot `to` on: from rows before those of the panels, from these, and from later ones.
 void MovedEntries::receive(i64 j, const double* panel, i64& from, i64 to) {
   i64* column = m_.col_index + to;
@@ -273,6 +289,7 @@ void MovedEntries::receive(i64 j, const double* panel, i64& from, i64 to) {
   if (panel) {
     while (entry != end && entry->column < first_) put();
     const i64 apart = std::min(kColumns, n_ - j + (j - first_) % kColumns);
+    if ((j - first_) % kLine == 0) fetch_panel(panel, (j - first_) % kColumns, apart);
     for (i64 r = 0; r < beside_; ++r) {
       column[r] = first_ + r;
       value[r] = panel[r * apart];

@@ -64,20 +64,31 @@ struct RowOrder {
   const i64 *perm, *place;
 };
 
+// `groups` times as many vectors as there are lanes, to be solved for where the first `leaves` rows are leaves: blocks to
+// which no row before them adds anything, and behind all of which are their tails. `rest` is room for the lanes of the
+// other rows.
+struct LeafBatch {
+  i64 leaves, groups;
+  const double* b;
+  double *x, *rest;
+};
+
 // For `lanes` vectors side by side: element k of vector v is y[k * lanes + v], in the order of the factor.
 struct LanePasses {
   int lanes;
   void (*pack)(const RowOrder& order, const double* b, double* y);
-  void (*forward)(const FactorRows& f, double* y);
-  void (*backward)(const FactorRows& f, double* y);
+  // The rows from `first` on, where a block begins.
+  void (*forward)(const FactorRows& f, double* y, i64 first);
+  void (*backward)(const FactorRows& f, double* y, i64 first);
   void (*unpack)(const RowOrder& order, const double* y, double* x);
   // From y to y; `spare` has room for n elements.
   void (*unpack_in_place)(const RowOrder& order, double* y, double* spare);
+  void (*solve_leaves)(const FactorRows& f, const RowOrder& order, const LeafBatch& batch);
 };
 
 struct SubstitutionPasses {
-  void (*forward)(const FactorRows& f, double* y);
-  void (*backward)(const FactorRows& f, double* y);
+  void (*forward)(const FactorRows& f, double* y, i64 first);
+  void (*backward)(const FactorRows& f, double* y, i64 first);
   LanePasses wide, eight;  // wide may be eight, too
 };
 

@@ -96,13 +96,13 @@ struct Several {
     i64 last_;
   };
 
+  // What the rows of a strip become by each other, row `first` at `own`.
   template <int kRows>
-  SM_PASS_INLINE static void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
-    Lanes w[kRows][kWide];
+  SM_PASS_INLINE static void descend(const Strip<kRows>& s, double* own, Lanes (&w)[kRows][kWide]) {
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) {
 #pragma GCC unroll 8
-      for (int h = 0; h < kWide; ++h) w[i][h] = at(y, first + i)[h];
+      for (int h = 0; h < kWide; ++h) w[i][h] = at(own, i)[h];
     }
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) {
@@ -112,6 +112,27 @@ struct Several {
         for (int h = 0; h < kWide; ++h) w[j][h] += s.at(i)[j] * w[i][h];
       }
     }
+  }
+  template <int kRows>
+  SM_PASS_INLINE static void put_scaled(const double* diag, const Lanes (&w)[kRows][kWide], double* own) {
+#pragma GCC unroll 8
+    for (int i = 0; i < kRows; ++i) {
+#pragma GCC unroll 8
+      for (int h = 0; h < kWide; ++h) at(own, i)[h] = diag[i] * w[i][h];
+    }
+  }
+
+  template <int kRows>
+  SM_PASS_INLINE static void forward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
+    Lanes w[kRows][kWide];
+    double* own = y + first * kWide * kLanes;
+    descend(s, own, w);
+    add_to_tail(f, s, first, w, y);
+    put_scaled(f.diag + first, w, own);
+  }
+  template <int kRows>
+  SM_PASS_INLINE static void add_to_tail(const FactorRows& f, const Strip<kRows>& s, i64 first,
+                                         const Lanes (&w)[kRows][kWide], double* y) {
     fetch<kRows>(f, s, first, 1);
     const Ahead ahead(f, s, first + kSinglesAhead);
     for (i64 c = 0; c < s.count; ++c) {
@@ -131,15 +152,14 @@ struct Several {
 #pragma GCC unroll 8
       for (int h = 0; h < kWide; ++h) to[h] += sum[h];
     }
-#pragma GCC unroll 8
-    for (int i = 0; i < kRows; ++i) {
-#pragma GCC unroll 8
-      for (int h = 0; h < kWide; ++h) at(y, first + i)[h] = f.diag[first + i] * w[i][h];
-    }
   }
 
   template <int kRows>
   SM_PASS_INLINE static void backward(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y) {
+    ascend(f, s, first, y, y + first * kWide * kLanes);
+  }
+  template <int kRows>
+  SM_PASS_INLINE static void ascend(const FactorRows& f, const Strip<kRows>& s, i64 first, double* y, double* own) {
     Lanes w[kRows][kWide];
 #pragma GCC unroll 8
     for (int i = 0; i < kRows; ++i) {
@@ -169,10 +189,10 @@ struct Several {
     for (int i = kRows - 1; i >= 0; --i) {
 #pragma GCC unroll 8
       for (int h = 0; h < kWide; ++h) {
-        w[i][h] += at(y, first + i)[h];
+        w[i][h] += at(own, i)[h];
 #pragma GCC unroll 8
         for (int j = kRows - 1; j > i; --j) w[i][h] += s.at(i)[j] * w[j][h];
-        at(y, first + i)[h] = w[i][h];
+        at(own, i)[h] = w[i][h];
       }
     }
   }
@@ -201,11 +221,12 @@ SM_PASS_INLINE i64 backward_strip(Road& road, const FactorRows& f, i64 end, i64 
   return kRows;
 }
 
+// The rows from `first` on, where a block begins.
 template <class Road>
-SM_PASS_TARGET void forward_pass(const FactorRows& given, double* y) {
+SM_PASS_TARGET void forward_pass(const FactorRows& given, double* y, i64 first) {
   const FactorRows f = given;
   Road road;
-  for (i64 k = 0; k < f.n;) {
+  for (i64 k = first; k < f.n;) {
     const i64 rows = f.rows_from(k);
     if (rows == 1) {
       road.forward(f, Strip<1>(f, k), k, y);
@@ -217,10 +238,10 @@ SM_PASS_TARGET void forward_pass(const FactorRows& given, double* y) {
 }
 
 template <class Road>
-SM_PASS_TARGET void backward_pass(const FactorRows& given, double* y) {
+SM_PASS_TARGET void backward_pass(const FactorRows& given, double* y, i64 first) {
   const FactorRows f = given;
   Road road;
-  for (i64 k = f.n; k > 0;) {
+  for (i64 k = f.n; k > first;) {
     const i64 rows = f.rows_to(k);
     if (rows == 1) {
       --k;
@@ -231,12 +252,16 @@ SM_PASS_TARGET void backward_pass(const FactorRows& given, double* y) {
   }
 }
 
-#include "cholesky/substitution_packing.hpp"
+#include "cholesky/substitution_leaves.hpp"
 
 template <int kWide>
-constexpr LanePasses kLanePasses = {
-    kWide* kLanes, pack<kWide>,           forward_pass<Several<kWide>>, backward_pass<Several<kWide>>,
-    unpack<kWide>, unpack_in_place<kWide>};
+constexpr LanePasses kLanePasses = {kWide* kLanes,
+                                    pack<kWide>,
+                                    forward_pass<Several<kWide>>,
+                                    backward_pass<Several<kWide>>,
+                                    unpack<kWide>,
+                                    unpack_in_place<kWide>,
+                                    solve_leaves<kWide>};
 
 constexpr SubstitutionPasses kPasses = {forward_pass<Single>, backward_pass<Single>, kLanePasses<Access::kWide>,
                                         kLanePasses<1>};

@@ -30,6 +30,13 @@ SM_PASS_INLINE void transpose(Lanes (&t)[kLanes]) {
 SM_PASS_INLINE Lanes& lanes_at(double* p) { return *reinterpret_cast<Lanes*>(p); }
 SM_PASS_INLINE const Lanes& lanes_at(const double* p) { return *reinterpret_cast<const Lanes*>(p); }
 
+// Eight elements of eight vectors, which are `apart`, as the lanes of eight rows.
+SM_PASS_INLINE void read_eight(const double* from, i64 apart, Lanes (&t)[kLanes]) {
+#pragma GCC unroll 8
+  for (i64 v = 0; v < kLanes; ++v) t[v] = lanes_at(from + v * apart);
+  transpose(t);
+}
+
 constexpr i64 kPlacesAhead = 32;  // rows whose places in the lanes are fetched early
 
 // Of the eight rows that come kPlacesAhead after row i; kWrite is 1 where they will be written.
@@ -54,9 +61,7 @@ SM_PASS_TARGET void pack(const RowOrder& order, const double* b, double* y) {
     fetch_places<kWide, 1>(order, y, i);
     for (i64 h = 0; h < kWide; ++h) {
       Lanes t[kLanes];
-#pragma GCC unroll 8
-      for (i64 v = 0; v < kLanes; ++v) t[v] = lanes_at(b + i + (h * kLanes + v) * n);
-      transpose(t);
+      read_eight(b + i + h * kLanes * n, n, t);
 #pragma GCC unroll 8
       for (i64 r = 0; r < kLanes; ++r) lanes_at(y + place[i + r] * kAll + h * kLanes) = t[r];
     }

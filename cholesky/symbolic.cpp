@@ -78,6 +78,7 @@ class SymbolicRows {
 
   [[gnu::always_inline]] void fetch_chains(i64 k) const;
   SmStatus row(i64 k);
+  bool repeats_row_before(i64 k) const;
   SmStatus own_entries(i64 k, bool& is_tail);
   i64 longest_tail(i64 k);
   i64 block_of_tail() const;
@@ -102,6 +103,22 @@ class SymbolicRows {
   i64* collected_ = nullptr;  // the row's own entries, then its extras
   i64 count_ = 0;             // how many
 };
+
+// Whether the entries of row k are those of row k - 1 but for column k: rows of a dense block are, and where all of them
+// have the same border. What was found of row k - 1 holds then.
+template <class Index>
+inline bool SymbolicRows<Index>::repeats_row_before(i64 k) const {
+  const i64 row = m_.perm[k];
+  const i64 before = m_.perm[k - 1];
+  const i64 count = m_.row_start[row + 1] - m_.row_start[row] - 1;
+  if (count < 0 || m_.row_start[before + 1] - m_.row_start[before] - 2 != count) return false;
+  const i64* column = m_.col_index + m_.row_start[row];
+  const i64* known = m_.col_index + m_.row_start[before] + 1;
+  if (*column++ != row) return false;
+  i64 same = 0;
+  while (same < count && column[same] == known[same]) ++same;
+  return known[same] == row && std::equal(column + same, column + count, known + same + 1);
+}
 
 // Entries of row k in the new order, unsorted. is_tail: every one of them is in the block that k was stored with.
 template <class Index>
@@ -273,7 +290,7 @@ template <class Index>
 SmStatus SymbolicRows<Index>::row(i64 k) {
   const i64 updating = jl_[k];
   bool is_tail = updating >= 0 && jl_[updating] < 0;
-  SM_TRY(own_entries(k, is_tail));
+  if (!is_tail || updating != k - 1 || !repeats_row_before(k)) SM_TRY(own_entries(k, is_tail));
   i64 count = 0;
   if (is_tail) {
     iju_[k] = iju_[updating] + 1;

@@ -187,6 +187,24 @@ TEST_P(OrderingRoadsTest, rows_that_are_not_tidy_get_one_order) {
   }
 }
 
+// Neighbouring columns are counted several at a time; one of them may be there twice in place of the next.
+TEST_P(OrderingRoadsTest, a_full_row_gets_one_order_wherever_a_column_is_missing_or_repeated) {
+  Random random(4);
+  Graph graph = path(60);
+  for (std::int64_t j = 2; j < graph.n; ++j) graph.edges.emplace_back(0, j);
+  graph.edges.emplace_back(1, graph.n - 1);  // a wheel: its rim begins where an edge to the centre is lacking
+  for (std::int64_t place = 2; place < graph.n; ++place) {
+    SmMatrix* m = closed(graph);
+    m->col_index[place] = m->col_index[place - 1];
+    expect_one_order(m, random);
+    destroy(m);
+    Graph lacking = graph;
+    lacking.edges.erase(std::find(lacking.edges.begin(), lacking.edges.end(), std::pair{std::int64_t{0}, place}));
+    expect_one_order(lacking, random);
+    ASSERT_FALSE(HasFailure()) << "column " << place;
+  }
+}
+
 // The narrow index needs no more than the workspace; the wide one asks the pool and gives back.
 TEST_P(OrderingRoadsTest, a_road_that_cannot_have_its_memory_leaves_the_order_to_the_plain_one) {
   Random random(2);

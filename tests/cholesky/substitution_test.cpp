@@ -13,20 +13,22 @@ namespace {
 
 constexpr TileSet kSets[] = {TileSet::avx512, TileSet::avx2, TileSet::portable};
 
-// Each with `width` coefficients of its own, joined to a border of columns: the first and the last two subjects to all
-// of it, the others to every second of them. What a subject adds has this rank.
+// Each with `width` coefficients of its own, joined to a border of columns: the first two subjects and those from the
+// fifth on to all of it, the others to every second of them. What a subject adds has this rank.
 struct Subjects {
-  static constexpr std::int64_t kCount = 6;
   std::int64_t width;
   std::int64_t border;
   std::int64_t rank;
+  std::int64_t count = 6;
+
+  [[nodiscard]] std::int64_t rows() const { return count * width + border; }
 };
 
 Problem normal_equations(Random& random, const Subjects& s) {
-  const std::int64_t first_of_border = Subjects::kCount * s.width;
-  const std::int64_t n = first_of_border + s.border;
+  const std::int64_t first_of_border = s.count * s.width;
+  const std::int64_t n = s.rows();
   std::vector<std::vector<double>> a(at(n), std::vector<double>(at(n)));
-  for (std::int64_t subject = 0; subject < Subjects::kCount; ++subject) {
+  for (std::int64_t subject = 0; subject < s.count; ++subject) {
     Indices column;
     for (std::int64_t i = 0; i < s.width; ++i) column.push_back(subject * s.width + i);
     const std::int64_t step = subject < 2 || subject >= 4 ? 1 : 2;
@@ -110,13 +112,15 @@ class SubstitutionTest : public ModuleTest {
     }
     ASSERT_EQ(fn().qxsmDestroyMatrix(instance(), &m), SM_OK);
   }
-  // The same for subjects in natural order.
+  // The same for subjects in natural order, or in another that has the border last.
   void check_subjects(Random& random, const Subjects& subjects, std::int64_t count) {
+    check_subjects(random, subjects, count, natural_order(subjects.rows()));
+  }
+  void check_subjects(Random& random, const Subjects& subjects, std::int64_t count, const Indices& order) {
     const Problem problem = normal_equations(random, subjects);
-    const Indices order = natural_order(problem.n);
     check(problem, random, count, subjects.rank >= subjects.width, &order);
     const std::int64_t dropped = std::max<std::int64_t>(0, subjects.width - subjects.rank);
-    EXPECT_EQ(rank_, problem.n - dropped * Subjects::kCount);
+    EXPECT_EQ(rank_, problem.n - dropped * subjects.count);
   }
   std::int64_t rank_ = 0;  // of the matrix checked last
 };
@@ -171,6 +175,31 @@ TEST_P(SubstitutionTest, solves_1_to_33_right_hand_sides) {
   for (std::int64_t count = 1; count <= 33; ++count) check_subjects(random, {6, 10, 6}, count);
 }
 
+// Rows of many blocks and of few behind them, in orders in which they stand behind each other in the vectors, upward,
+// downward, or for some rows only.
+TEST_P(SubstitutionTest, solves_for_many_small_blocks_with_few_rows_behind_them) {
+  Random random(15);
+  for (const Subjects& subjects :
+       {Subjects{1, 3, 1, 80}, Subjects{3, 2, 3, 29}, Subjects{3, 0, 3, 7}, Subjects{6, 6, 6, 20},
+        Subjects{7, 5, 7, 15}, Subjects{8, 4, 8, 10}, Subjects{9, 4, 9, 10}, Subjects{20, 2, 20, 4}}) {
+    const std::int64_t first_of_border = subjects.count * subjects.width;
+    const Indices natural = natural_order(subjects.rows());
+    Indices reversed = natural;
+    std::reverse(reversed.begin(), reversed.begin() + first_of_border);
+    Indices some = natural;
+    std::reverse(some.begin() + first_of_border / 3, some.begin() + first_of_border / 2);
+    Indices shuffled = natural;
+    for (std::int64_t i = first_of_border - 1; i > 0; --i)
+      std::swap(shuffled[at(i)], shuffled[at(random.below(i + 1))]);
+    for (const std::int64_t count : {8, 24, 33}) {
+      SCOPED_TRACE(std::to_string(subjects.width) + " rows, " + std::to_string(subjects.border) +
+                   " columns behind them, " + std::to_string(count) + " vectors");
+      for (const Indices& order : {natural, reversed, some, shuffled}) check_subjects(random, subjects, count, order);
+    }
+  }
+  check_subjects(random, {6, 5, 4, 20}, 33);  // two dropped pivots each
+}
+
 // Of every length that may be left over when rows are cut into chunks for 8 or 16 vectors, and into eights within them.
 TEST_P(SubstitutionTest, solves_together_what_it_solves_one_by_one) {
   Random random(11);
@@ -181,6 +210,10 @@ TEST_P(SubstitutionTest, solves_together_what_it_solves_one_by_one) {
       check(problem, random, count, true);
       check_one_by_one(problem, random.vector(n * count));
     }
+  }
+  for (const std::int64_t count : {8, 17, 32}) {
+    const Subjects subjects{6, 6, 6, 20};
+    check_one_by_one(normal_equations(random, subjects), random.vector(subjects.rows() * count));
   }
 }
 
