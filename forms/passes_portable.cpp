@@ -11,11 +11,14 @@ namespace sm {
 
 namespace {
 
+// Each needs those before it.
+// clang-format off
 #include "forms/passes_body.hpp"
+#include "forms/passes_strips_body.hpp"
 #include "forms/passes_pieces_body.hpp"
 #include "forms/passes_rows_body.hpp"
 #include "forms/passes_several_body.hpp"
-#include "forms/passes_strips_body.hpp"
+// clang-format on
 
 }  // namespace
 
