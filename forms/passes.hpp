@@ -16,7 +16,7 @@ inline constexpr int kProductLanes = 8;     // vectors that go through the matri
 inline constexpr i64 kProductReach = 2048;  // rows ahead of the one at work that they have side by side
 
 // Words of a list of rows, at most: a strip has 8 rows at least, and a batch 32, at most two pieces of 4 bytes each.
-inline i64 list_words(i64 n) { return 2 * n + 2; }
+inline i64 list_words(i64 n) { return n + n / 2 + 2; }
 
 // The diagonal preconditioner, the residual, and what they make the next direction from.
 struct Direction {
