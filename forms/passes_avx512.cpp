@@ -1,5 +1,6 @@
 // The passes of products with AVX-512 vectors.
 #include <algorithm>
+#include <cstdint>
 
 #include "forms/passes.hpp"
 
@@ -13,8 +14,14 @@ namespace sm {
 
 namespace {
 
+// Each needs those before it.
+// clang-format off
 #include "forms/passes_body.hpp"
+#include "forms/passes_strips_body.hpp"
+#include "forms/passes_pieces_body.hpp"
+#include "forms/passes_rows_body.hpp"
 #include "forms/passes_several_body.hpp"
+// clang-format on
 
 }  // namespace
 

@@ -63,126 +63,6 @@ struct Directed {
   }
 };
 
-// Rows of equal length whose columns are those of the row before moved by one, as stencils have, are a strip: `rows` of
-// them from row i on, with `length` entries each from p on.
-struct Strip {
-  i64 i;
-  i64 rows;
-  i64 p;
-  i64 length;
-};
-
-constexpr i64 kStripRows = 64;
-constexpr i64 kStripEntries = 1024;  // which stay in the first cache
-constexpr i64 kStripUnit = kSums;    // rows that are taken together
-constexpr i64 kLeastStrip = 24;      // rows that are worth looking for in every product,
-constexpr i64 kLeastListed = 8;      // and once for many
-
-// Whether v[k + step] is v[k] + more for k < count.
-SM_PASS_INLINE bool climbs(const i64* v, i64 step, i64 more, i64 count) {
-  i64 differs = 0;
-  for (i64 k = 0; k < count; ++k) differs |= v[k + step] - v[k] - more;
-  return differs == 0;
-}
-
-// How many rows from row i on, which begins at p, are a strip; 0 when it begins none.
-SM_PASS_TARGET __attribute__((noinline)) i64 strip_rows(const UpperRows& a, i64 i, i64 p, i64 least) {
-  const i64* start = a.row_start + i;
-  const i64 length = start[1] - p;
-  const i64* next = a.col_index + p + length;
-  const i64 limit = std::min(a.rows - i, kStripRows);
-  if (limit < least || length < 1 || start[least] - p != least * length || next[-length] != i ||
-      next[length - 1] != next[-1] + 1) {
-    return 0;  // most often
-  }
-  i64 rows = 0;
-  while (rows + kStripUnit <= limit && climbs(start + rows, 1, length, kStripUnit)) rows += kStripUnit;
-  rows = std::min(rows, kStripEntries / length & -kStripUnit);
-  return rows >= least && climbs(a.col_index + p, length, 1, (rows - 1) * length) ? rows : 0;
-}
-
-// What the next rows are: so many of a strip, or, negative, so many others. Either by looking, less and less often
-// where nothing is found, or from a list of that.
-struct Look {
-  static constexpr bool kReadsColumns = true;
-  i64 least;
-  i64 patience = 1;
-  SM_PASS_INLINE i64 next(const UpperRows& a, i64 i, i64 p) {
-    const i64 rows = strip_rows(a, i, p, least);
-    if (rows > 0) {
-      patience = 1;
-      return rows;
-    }
-    const i64 others = std::min(a.rows - i, patience);
-    patience = std::min<i64>(2 * patience, 32);
-    return -others;
-  }
-};
-struct Listed {
-  static constexpr bool kReadsColumns = false;
-  const i64* list;
-  SM_PASS_INLINE i64 next(const UpperRows&, i64, i64) { return *list++; }
-};
-
-SM_PASS_TARGET void list_strips(const UpperRows& a, i64* list) {
-  Look look{kLeastListed};
-  i64* end = list;
-  for (i64 i = 0; i < a.rows;) {
-    const i64 rows = look.next(a, i, a.row_start[i]);
-    if (rows < 0 && end != list && end[-1] < 0) {
-      end[-1] += rows;
-    } else {
-      *end++ = rows;
-    }
-    i += std::abs(rows);
-  }
-}
-
-// Eight values, each `l` behind the one before.
-SM_PASS_INLINE void load_strided(const double* w, i64 l, Sums& v) {
-  const double* z = w + 4 * l;
-  v = Sums{w[0], w[l], w[2 * l], w[3 * l], z[0], z[l], z[2 * l], z[3 * l]};
-}
-
-// Every slot of the rows at once: the values are strided, the vectors are not. With a list the columns are left alone
-// but for those of the first row.
-template <bool kForm, class Strips>
-SM_PASS_TARGET __attribute__((noinline)) void exchange_strip(const UpperRows& a, const Strip& s, const double* x,
-                                                             double* y, Sums& form) {
-  const double* const value = a.values + s.p;
-  const i64* const column = a.col_index + s.p;
-  const double* const xi = x + s.i;
-  double* const yi = y + s.i;
-  const i64 l = s.length;
-  const i64 rows = s.rows;
-  double sum[kStripRows];
-  for (i64 r = 0; r < rows; r += kStripUnit) sums_at(sum + r) = Sums{};
-  for (i64 e = 1; e < l; ++e) {
-    const i64 k = column[e];
-    for (i64 r = 0; r < rows; r += kStripUnit) {
-      if (Strips::kReadsColumns) __builtin_prefetch(column + e * rows + r + kEntriesAhead);
-      __builtin_prefetch(value + e * rows + r + kEntriesAhead);
-      Sums v;
-      load_strided(value + e + r * l, l, v);
-      sums_at(sum + r) += v * sums_at(x + k + r);
-      sums_at(y + k + r) += v * sums_at(xi + r);
-    }
-  }
-  Sums part{};
-  for (i64 r = 0; r < rows; r += kStripUnit) {
-    if (Strips::kReadsColumns) __builtin_prefetch(column + r + kEntriesAhead);
-    __builtin_prefetch(value + r + kEntriesAhead);
-    Sums v;
-    load_strided(value + r * l, l, v);
-    const Sums t = sums_at(xi + r);
-    const Sums diagonal = v * t;
-    const Sums others = sums_at(sum + r);
-    sums_at(yi + r) += diagonal + others;
-    if constexpr (kForm) part += t * (diagonal + 2.0 * others);
-  }
-  if constexpr (kForm) form += part;
-}
-
 // Entries p to `end` of a long row: several partial sums, so that none waits for the one before.
 SM_PASS_INLINE double exchange_long(const UpperRows& a, i64& p, i64 end, double t, const double* x, double* y) {
   double part[4] = {};
@@ -239,113 +119,18 @@ SM_PASS_TARGET __attribute__((noinline)) double exchange_border(const UpperRows&
   return sum;
 }
 
-// y += A x, with what it needs of the vectors made ready just before. Answers x'A x when asked: its terms come along.
-template <bool kForm, class Strips, class Ready>
-SM_PASS_INLINE double exchange_rows(const UpperRows& a, Strips strips, const double* x, double* y,
-                                    const Ready& make_ready) {
-  const i64* __restrict start = a.row_start;
-  const i64* __restrict column = a.col_index;
-  const double* __restrict value = a.values;
-  const i64 n = a.rows;
-  double form = 0.0;
-  Sums forms{};
-  i64 ready = 0;
-  if (!a.is_ascending) make_ready(0, ready = n);
-  for (i64 i = 0, p = start[0]; i < n;) {
-    const i64 rows = strips.next(a, i, p);
-    if (rows > 0) {
-      const i64 length = start[i + 1] - p;
-      if (const i64 last = column[p + length - 1] + rows - 1; last >= ready) {
-        const i64 from = ready;
-        ready = std::min(n, last + kAhead);
-        make_ready(from, ready);
-      }
-      exchange_strip<kForm, Strips>(a, {i, rows, p, length}, x, y, forms);
-      p += rows * length;
-      i += rows;
-      continue;
-    }
-    for (const i64 until = i - rows; i < until; ++i) {
-      const i64 end = start[i + 1];
-      if (p == end) continue;
-      if (const i64 last = column[end - 1]; last >= ready) {
-        const i64 from = ready;
-        ready = std::min(n, last + kAhead);
-        make_ready(from, ready);
-      }
-      fetch_entries(a, p);
-      const double t = x[i];
-      double diagonal = 0.0;
-      if (column[p] == i) diagonal = value[p++] * t;
-      double sum = 0.0;
-      if (end - p >= kLongRow) {
-        if (end - p >= kRun && a.is_ascending) {
-          sum = exchange_border(a, p, end, t, x, y);
-          p = end;
-        } else {
-          sum = exchange_long(a, p, end, t, x, y);
-        }
-      }
-      for (; p < end; ++p) {
-        const i64 k = column[p];
-        const double v = value[p];
-        sum += v * x[k];
-        y[k] += v * t;
-      }
-      y[i] += diagonal + sum;
-      if constexpr (kForm) form += t * (diagonal + 2.0 * sum);
-    }
+// Entries p to `end` of a row, off the diagonal: what they give the row itself.
+SM_PASS_INLINE double exchange_row(const UpperRows& a, i64 p, i64 end, double t, const double* x, double* y) {
+  double sum = 0.0;
+  if (end - p >= kLongRow) {
+    if (end - p >= kRun && a.is_ascending) return exchange_border(a, p, end, t, x, y);
+    sum = exchange_long(a, p, end, t, x, y);
   }
-  make_ready(ready, n);
-  return form + total_of(forms);
-}
-
-SM_PASS_TARGET void multiply_one(const UpperRows& a, const double* x, double* y, bool accumulate) {
-  if (accumulate) {
-    exchange_rows<false>(a, Look{kLeastStrip}, x, y, Nothing{});
-  } else {
-    exchange_rows<false>(a, Look{kLeastStrip}, x, y, Cleared{x, y});
+  for (; p < end; ++p) {
+    const i64 k = a.col_index[p];
+    const double v = a.values[p];
+    sum += v * x[k];
+    y[k] += v * t;
   }
-}
-
-SM_PASS_TARGET double direct(const UpperRows& a, const i64* strips, const Direction& d) {
-  return exchange_rows<true>(a, Listed{strips}, d.p, d.q, Directed{d});
-}
-
-SM_PASS_TARGET double advance(const Step& s) {
-  const double* __restrict p = s.p;
-  const double* __restrict q = s.q;
-  const double* __restrict inverse = s.inverse;
-  double* __restrict x = s.x;
-  double* __restrict r = s.r;
-  const double alpha = s.alpha;
-  Sums rho{};
-  i64 i = 0;
-  for (; i + kSums <= s.n; i += kSums) {
-    sums_at(x + i) += sums_at(p + i) * alpha;
-    const Sums rest = sums_at(r + i) - sums_at(q + i) * alpha;
-    sums_at(r + i) = rest;
-    rho += rest * (sums_at(inverse + i) * rest);
-  }
-  for (int lane = 0; i < s.n; ++i, ++lane) {
-    x[i] += alpha * p[i];
-    r[i] -= alpha * q[i];
-    rho[lane] += r[i] * (inverse[i] * r[i]);
-  }
-  return total_of(rho);
-}
-
-SM_PASS_TARGET double measure(i64 n, const double* b, const double* q, const double* inverse, double* r) {
-  Sums rho{};
-  i64 i = 0;
-  for (; i + kSums <= n; i += kSums) {
-    const Sums rest = sums_at(b + i) - sums_at(q + i);
-    sums_at(r + i) = rest;
-    rho += rest * (sums_at(inverse + i) * rest);
-  }
-  for (int lane = 0; i < n; ++i, ++lane) {
-    r[i] = b[i] - q[i];
-    rho[lane] += r[i] * (inverse[i] * r[i]);
-  }
-  return total_of(rho);
+  return sum;
 }

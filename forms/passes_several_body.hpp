@@ -1,5 +1,5 @@
-// The pass of passes.hpp for several vectors, and the table of all passes. Included behind passes_body.hpp, in the same
-// namespace.
+// The pass of passes.hpp for several vectors, and the table of all passes. Included behind passes_rows_body.hpp, in
+// the same namespace.
 //
 // Deliberately without an include guard.
 
@@ -169,4 +169,4 @@ SM_PASS_TARGET void multiply_several(const UpperRows& a, const double* x, double
   SeveralPass(a, x, y, count, accumulate, window).run();
 }
 
-constexpr Passes kPasses = {multiply_one, multiply_several, list_strips, direct, advance, measure};
+constexpr Passes kPasses = {multiply_one, multiply_several, list_rows, direct, advance, measure};

@@ -43,8 +43,8 @@ class ConjugateGradients {
     for (i64 i = 0; i < m_.rows; ++i) SM_TRY(invert_pivot(diagonal(i), singularity_tolerance(m_), inverse_.data()[i]));
     std::fill_n(task_.x, task_.count * m_.rows, 0.0);
     if (m_.format == SM_FORMAT_SPARSE) {
-      SM_TRY(strips_.take(m_.pool, strip_words(m_.rows)));
-      passes_.list_strips(UpperRows(m_), strips_.data());
+      SM_TRY(list_.take(m_.pool, list_words(m_.rows)));
+      passes_.list_rows(UpperRows(m_), list_.data());
     }
     SM_TRY(r_.take(m_.pool, m_.rows));
     SM_TRY(p_.take(m_.pool, m_.rows));
@@ -82,7 +82,7 @@ class ConjugateGradients {
   const IterativeTask& task_;
   const Passes& passes_ = passes();
   Scratch<double> inverse_;  // of the diagonal elements, 0 for one that has none
-  Scratch<i64> strips_;      // of the rows of A, which stay the same from step to step
+  Scratch<i64> list_;        // of the rows of A, which stay the same from step to step
   Scratch<double> r_, p_, q_;
 };
 
@@ -91,7 +91,7 @@ SmStatus ConjugateGradients::direct(double beta, double& curvature) {
   double* q = q_.data();
   const Direction direction = {inverse_.data(), r_.data(), beta, p, q};
   if (m_.format == SM_FORMAT_SPARSE) {
-    curvature = passes_.direct(UpperRows(m_), strips_.data(), direction);
+    curvature = passes_.direct(UpperRows(m_), list_.data(), direction);
     return SM_OK;
   }
   for (i64 i = 0; i < m_.rows; ++i) p[i] = direction.inverse[i] * direction.r[i] + beta * p[i];

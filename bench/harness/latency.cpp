@@ -74,6 +74,25 @@ double scattered_addition(std::size_t bytes) {
   return least / static_cast<double>(kAdditions);
 }
 
+__attribute__((noinline, optimize("no-tree-vectorize"))) double exchange(const std::int64_t* place, const double* value,
+                                                                         std::size_t count, const double* x,
+                                                                         double* y) {
+  constexpr std::size_t kSums = 4;  // so that no addition waits for the one before
+  double sum[kSums] = {};
+  std::size_t k = 0;
+  for (; k + kSums <= count; k += kSums) {
+    for (std::size_t s = 0; s < kSums; ++s) {
+      sum[s] += value[k + s] * x[place[k + s]];
+      y[place[k + s]] += 0.5 * value[k + s];
+    }
+  }
+  for (; k < count; ++k) {
+    sum[0] += value[k] * x[place[k]];
+    y[place[k]] += 0.5 * value[k];
+  }
+  return (sum[0] + sum[1]) + (sum[2] + sum[3]);
+}
+
 double vector_update(std::size_t bytes) {
   constexpr int kTimes = 5, kPasses = 20;
   const std::size_t count = bytes / (2 * sizeof(double));

@@ -18,6 +18,10 @@ double dependent_load(std::size_t bytes);
 // to others.
 double scattered_addition(std::size_t bytes);
 
+// The sum of value[k] x[place[k]], and y[place[k]] += a value[k]: what a product from one triangle asks of the memory,
+// with no rows in it.
+double exchange(const std::int64_t* place, const double* value, std::size_t count, const double* x, double* y);
+
 // Bytes a second of y += a * x, three words an element, x and y together as large.
 double vector_update(std::size_t bytes);
 

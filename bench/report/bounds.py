@@ -155,10 +155,13 @@ def of_refactor(run, r):
 
 def of_moving(run, r):
     addition = scattered(r, 16.0 * r.n)  # an entry reads a place of x and adds to one of y
-    return {"matrix_mb": 16e-6 * r.entries, "vector_mb": 8e-6 * r.n,
+    rowless = r.facts.get("without_rows")
+    moved = rates(r, moved=r.facts.get("bytes"))
+    return {"rowless_ns": product(quotient(rowless, r.entries), 1e9), "of_rowless": quotient(rowless, r.ours()),
+            "copy_at_most": quotient(moved["of_copy"], quotient(rowless, r.ours())),
+            "matrix_mb": 16e-6 * r.entries, "vector_mb": 8e-6 * r.n,
             "ns": product(quotient(r.ours(), r.entries), 1e9), "scattered_ns": product(addition, 1e9),
-            "of_scattered": quotient(product(addition, r.entries), r.ours()),
-            **rates(r, moved=r.facts.get("bytes"))}
+            "of_scattered": quotient(product(addition, r.entries), r.ours()), **moved}
 
 
 MEASURED = {
@@ -193,7 +196,8 @@ COLUMNS = {
         ("refilling, ms", "refill_ms"), ("refilling, GB/s", "refill_gbytes"),
         ("refilling, % of the time", "share_refill"), ("factoring again, ms", "numeric_ms"),
         ("factoring first, ms", "first_ms")],
-    "product": [("of the copy rate", "of_copy")],
+    "product": [("of the copy rate", "of_copy"), ("without rows, ns an entry", "rowless_ns"),
+                ("of that", "of_rowless"), ("of the copy rate at most", "copy_at_most")],
     "iteration": [("of the copy rate", "of_copy")],
 }
 

@@ -44,7 +44,8 @@ PHASES = [
      "twice those of the factorization."),
     ("trace", "Trace of an inverse product", "tr(A⁻B), B on the pattern of A."),
     ("refactor", "Refactor loop", "New values on the same pattern. Refilling moves 24 bytes an entry."),
-    ("product", "Symmetric product", "From one stored triangle. Bytes: 16 for each entry, and the vectors."),
+    ("product", "Symmetric product", "From one stored triangle. Bytes: 16 for each entry, and the vectors. "
+     "Without rows: the same loads of x and additions to y, entry by entry; a vector at a time."),
     ("iteration", "Conjugate gradients", "Time of a step; one stored triangle, diagonal preconditioner. Bytes: those "
      "of the product, and nine words a row."),
     ("dense factor", "Dense factor", "Packed here, full for dpotrf, packed for dpptrf."),

@@ -140,6 +140,17 @@ class Bounds(unittest.TestCase):
         self.assertAlmostEqual(numbers["scattered_ns"], 2.0)
         self.assertAlmostEqual(numbers["of_scattered"], 0.5)
 
+    def test_a_product_stands_beside_one_that_has_no_rows(self):
+        run = bounded(record("d", "x", 10**6, "product", {OURS: 12e-3}, bytes=24e6, without_rows=6e-3))
+        numbers = numbers_of(run)
+        self.assertAlmostEqual(numbers["rowless_ns"], 2.0)
+        self.assertAlmostEqual(numbers["of_rowless"], 0.5)
+        self.assertAlmostEqual(numbers["of_copy"], 0.1)
+        self.assertAlmostEqual(numbers["copy_at_most"], 0.2)
+        self.assertEqual(dict(bounds.columns(run, run.results[0])), {
+            "of the copy rate": "0.1", "without rows, ns an entry": "2", "of that": "0.5",
+            "of the copy rate at most": "0.2"})
+
     def test_without_the_ordering_the_other_steps_decide(self):
         steps = {OURS: {"ordering": 0.6, "symbolic": 0.1, "numeric": 0.2, "solve": 0.1},
                  "fast": {"analysis": 1.0, "numeric": 0.5, "solve": 0.5}}

@@ -17,8 +17,8 @@
  * Answers: 0 with nothing done (empty); 1; 113; 104 (x is b), all with the outputs untouched; then 124 (general) with
  * iterations 0 and residual 0; 0 (nrhs < 1) likewise; 101; 103 (a diagonal element below the negative limit), with
  * iterations 0; 109 (limit reached, told to stop, or rho not a number; x holds the last iterate, later right-hand sides
- * 0); 0. Diagonal: elements of magnitude 1.11e-12 or less give 0. Work: 4n doubles, and n/4 words for a symmetric
- * sparse A. Cost: one product with A a step, and one more every 50. */
+ * 0); 0. Diagonal: elements of magnitude 1.11e-12 or less give 0. Work: 4n doubles, and 3n/2 words for a
+ * symmetric sparse A. Cost: one product with A a step, and one more every 50. */
 QXESM_API SmStatus qxsmsolioc(SmMatrix* a, const double* b, double* x, int32_t nrhs, int64_t max_iterations,
                               int64_t* iterations, double* residual, double tolerance);
 

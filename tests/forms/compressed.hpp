@@ -82,6 +82,22 @@ inline Pattern scattered(Random& random, std::int64_t n, std::int64_t entries) {
   return rows;
 }
 
+// Rows of a pedigree: most have their diagonal only, others up to 40 entries in any order of lengths, few very many; here
+// and there one is empty or has no diagonal.
+inline Pattern pedigree(Random& random, std::int64_t n) {
+  Pattern rows;
+  for (std::int64_t i = 0; i < n; ++i) {
+    std::set<std::int64_t> row;
+    std::int64_t length = random.chance(55) ? 0 : random.below(random.chance(80) ? 10 : 41);
+    if (random.below(200) == 0) length = 300;
+    for (; length > 0; --length) row.insert(i + random.below(n - i));
+    if (random.chance(97)) row.insert(i);
+    if (random.chance(1)) row.clear();
+    rows.emplace_back(row.begin(), row.end());
+  }
+  return rows;
+}
+
 // Stencil rows of changing distances, with rows of another kind between them.
 inline Pattern patched(Random& random, std::int64_t n) {
   Pattern rows = scattered(random, n, 2);

@@ -79,6 +79,30 @@ void PassesTest::expect_products(Compressed& a, Random& random) {
   }
 }
 
+// How the turns of a list take the rows.
+struct Covered {
+  std::int64_t rows = 0, in_strips = 0, in_batches = 0;
+};
+Covered covered_by(const Indices& list, std::int64_t n) {
+  constexpr std::size_t lengths = 10;  // 0 to 8, and longer
+  Covered covered;
+  for (std::size_t word = 0; covered.rows < n;) {
+    const std::int64_t turn = list.at(word++);
+    if (turn != 0) {
+      covered.rows += std::abs(turn);
+      covered.in_strips += std::max<std::int64_t>(turn, 0);
+      continue;
+    }
+    const std::int64_t rows = list.at(word);
+    std::int64_t pieces = 0;
+    for (std::size_t length = 0; length < lengths; ++length) pieces += list.at(word + 2 + length);
+    word += 2 + lengths + at(pieces + 1) / 2;
+    covered.rows += rows;
+    covered.in_batches += rows;
+  }
+  return covered;
+}
+
 // The direction that a step takes, where it leads, and the exact residual; sums to rounding, all else to the bit.
 void PassesTest::expect_steps(Compressed& a, Random& random) {
   const std::int64_t n = a.n();
@@ -101,11 +125,11 @@ void PassesTest::expect_steps(Compressed& a, Random& random) {
   const double tolerance = static_cast<double>(scale) * 1e-11;
   std::vector<double> sums;
   for_sets([&] {
-    Indices strips(at(strip_words(n)) + 1, -77);
-    passes().list_strips(a.rows(), strips.data());
-    EXPECT_EQ(strips.back(), -77);
+    Indices list(at(list_words(n)) + 1, -77);
+    passes().list_rows(a.rows(), list.data());
+    EXPECT_EQ(list.back(), -77);
     Guarded gp(first), gq(n), gx(first), gr(residual), ge(n);
-    const double pq = passes().direct(a.rows(), strips.data(), {inverse.data(), gr.data(), beta, gp.data(), gq.data()});
+    const double pq = passes().direct(a.rows(), list.data(), {inverse.data(), gr.data(), beta, gp.data(), gq.data()});
     const double measured = passes().measure(n, first.data(), gq.data(), inverse.data(), ge.data());
     const double next = passes().advance({n, alpha, gp.data(), gq.data(), inverse.data(), gx.data(), gr.data()});
     ASSERT_TRUE(same(gp.values(), p));
@@ -205,22 +229,103 @@ TEST_F(PassesTest, a_border_of_rows_that_miss_some_columns) {
   }
 }
 
-TEST_F(PassesTest, a_list_of_strips_covers_the_rows_and_finds_those_of_a_grid) {
+TEST_F(PassesTest, a_list_covers_the_rows_and_finds_the_strips_of_a_grid_and_the_batches_of_a_pedigree) {
   Random random(8);
-  for (const auto& [pattern, least] : {std::pair(plane(100, 20), 90), std::pair(plane(12, 100), 65),
-                                       std::pair(stencil(1000, {1, 2}), 98), std::pair(scattered(random, 500, 5), 0)}) {
-    Compressed a(random, pattern);
+  struct Wanted {
+    Pattern pattern;
+    std::int64_t strips, batches;  // per cent of the rows, at least; where 0 almost none
+  };
+  for (const Wanted& wanted :
+       {Wanted{plane(100, 20), 90, 0}, Wanted{plane(12, 100), 65, 0}, Wanted{stencil(1000, {1, 2}), 98, 0},
+        Wanted{scattered(random, 500, 12), 0, 0}, Wanted{pedigree(random, 3000), 0, 80}}) {
+    Compressed a(random, wanted.pattern);
     for_sets([&] {
-      Indices strips(at(strip_words(a.n())), 0);
-      passes().list_strips(a.rows(), strips.data());
-      std::int64_t covered = 0, in_strips = 0;
-      for (const std::int64_t rows : strips) {
-        covered += std::abs(rows);
-        in_strips += std::max<std::int64_t>(rows, 0);
+      Indices list(at(list_words(a.n())), 0);
+      passes().list_rows(a.rows(), list.data());
+      const Covered covered = covered_by(list, a.n());
+      EXPECT_EQ(covered.rows, a.n());
+      EXPECT_GE(100 * covered.in_strips, wanted.strips * a.n());
+      EXPECT_LE(covered.in_strips, wanted.strips > 0 ? a.n() : a.n() / 100);
+      EXPECT_GE(100 * covered.in_batches, wanted.batches * a.n());
+      EXPECT_LE(covered.in_batches, wanted.batches > 0 ? a.n() : 0);
+    });
+  }
+}
+
+TEST_F(PassesTest, rows_of_any_lengths_as_pedigrees_have_them) {
+  for (std::uint64_t seed = 0; seed < 40; ++seed) {
+    SCOPED_TRACE(seed);
+    Random random(3000 + seed);
+    expect_all(pedigree(random, seed < 20 ? 30 + random.below(60) : 100 + random.below(900)), random);
+  }
+}
+
+// Each length alone and in turns with single diagonals, so that batches have nothing else; at the end of the arrays too.
+TEST_F(PassesTest, rows_of_every_length_up_to_40_between_single_diagonals) {
+  Random random(12);
+  for (std::int64_t length = 0; length <= 40; ++length) {
+    SCOPED_TRACE(length);
+    for (const std::int64_t n : {64, 95, 330}) {
+      Pattern rows = stencil(n, {});
+      for (std::int64_t i = 0; i < n; i += 1 + random.below(3)) {
+        std::set<std::int64_t> row = {i};
+        while (static_cast<std::int64_t>(row.size()) <= std::min(length, n - i - 1))
+          row.insert(i + random.below(n - i));
+        rows[at(i)].assign(row.begin(), row.end());
       }
-      EXPECT_EQ(covered, a.n());
-      EXPECT_GE(100 * in_strips, least * a.n());
-      EXPECT_LE(in_strips, least > 0 ? a.n() : 0);
+      expect_all(rows, random);
+    }
+  }
+}
+
+// So many that a product cuts them too, and the bits of sums that round.
+TEST_F(PassesTest, a_pedigree_that_the_processor_does_not_remember) {
+  Random random(13);
+  Compressed a(random, pedigree(random, 40'000));
+  std::vector<double> before = random.vector(a.n());
+  Guarded x(random.vector(a.n()));
+  const std::vector<double> exact = a.plain(x.values(), before);
+  for_sets([&] {
+    Guarded y(before);
+    passes().multiply(a.rows(), x.data(), y.data(), true);
+    ASSERT_TRUE(same(y.values(), exact));
+  });
+  for (double& v : a.values()) v = 1.0 / v;
+  const std::vector<double> want = a.plain(x.values(), std::vector<double>(before.size()));
+  std::vector<double> first;
+  for_sets([&] {
+    Guarded y(a.n());
+    passes().multiply(a.rows(), x.data(), y.data(), false);
+    const std::vector<double> got = y.values();
+    for (std::size_t i = 0; i < got.size(); ++i) ASSERT_NEAR(got[i], want[i], 1e-11 * (1.0 + std::fabs(want[i])));
+    if (first.empty()) first = got;
+    ASSERT_EQ(bits(got), bits(first)) << "the same bits on every CPU";
+  });
+}
+
+TEST_F(PassesTest, infinities_and_nans_reach_the_rows_they_meet_and_no_other) {
+  Random random(14);
+  for (const std::int64_t n : {300, 40'000}) {
+    Compressed a(random, pedigree(random, n));
+    std::vector<double> x = random.vector(n);
+    for (std::int64_t k = 7; k < n; k += n / 7) x[at(k)] = k % 3 == 0 ? kNan : k % 3 == 1 ? kInfinity : -kInfinity;
+    Guarded gx(x);
+    const std::vector<double> want = a.plain(x, std::vector<double>(x.size()));
+    const auto numbers = [](const std::vector<double>& v) {
+      return std::count_if(v.begin(), v.end(), [](double e) { return std::isfinite(e); });
+    };
+    ASSERT_GT(numbers(want), n / 2);
+    ASSERT_LT(numbers(want), n);
+    const std::vector<double> inverse(x.size(), 1.0);
+    for_sets([&] {
+      Guarded y(n), p(n), q(n);
+      passes().multiply(a.rows(), gx.data(), y.data(), false);
+      ASSERT_TRUE(same(y.values(), want));
+      Indices list(at(list_words(n)));
+      passes().list_rows(a.rows(), list.data());
+      std::fill_n(p.data(), n, 0.0);
+      passes().direct(a.rows(), list.data(), {inverse.data(), gx.data(), 0.0, p.data(), q.data()});
+      ASSERT_TRUE(same(q.values(), want));
     });
   }
 }
