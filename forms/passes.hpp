@@ -16,7 +16,7 @@ inline constexpr int kProductLanes = 8;     // vectors that go through the matri
 inline constexpr i64 kProductReach = 2048;  // rows ahead of the one at work that they have side by side
 
 // Words of a list of rows, at most: a strip has 8 rows at least, and a batch 32, at most two pieces of 4 bytes each.
-inline i64 list_words(i64 n) { return n + n / 2 + 2; }
+inline i64 list_words(i64 n) { return n + n / 2 + 3; }
 
 // The diagonal preconditioner, the residual, and what they make the next direction from.
 struct Direction {
@@ -43,8 +43,9 @@ struct Passes {
   void (*multiply)(const UpperRows& a, const double* x, double* y, bool accumulate);
   // The same for count <= kProductLanes vectors, n elements each; for rows that ascend.
   void (*multiply_several)(const UpperRows& a, const double* x, double* y, int count, bool accumulate);
-  // How the rows are taken by `direct`, which the pattern tells: list_words(n) words. Of each turn first a word: so many
-  // rows that continue each other; negative, so many others; 0, a batch of rows cut into pieces, and what that is.
+  // How the rows are taken by `direct`, which the pattern tells: list_words(n) words. The first tells whether there are
+  // batches. Of each turn first a word: so many rows that continue each other; negative, so many others; 0, a batch of
+  // rows cut into pieces, and what that is.
   void (*list_rows)(const UpperRows& a, i64* list);
   // p <- inverse r + beta p, element by element, and q <- A p. Answers p'q.
   double (*direct)(const UpperRows& a, const i64* list, const Direction& d);

@@ -35,9 +35,10 @@ struct Look {
     return batch_of(i, pieces);
   }
 };
+template <bool kBatches>
 struct Listed {
   static constexpr bool kReadsColumns = false;
-  static constexpr bool kHasBatches = true;
+  static constexpr bool kHasBatches = kBatches;
   const i64* list;
 
   SM_PASS_INLINE i64 next(const UpperRows&, i64, i64) { return *list++; }
@@ -51,13 +52,15 @@ struct Listed {
   }
 };
 
-// Lists the rows from i up to `until`, none of which begins a strip. Answers where the list ends.
-SM_PASS_TARGET i64* list_others(const UpperRows& a, i64 i, i64 until, Pieces& pieces, i64* list) {
+// Lists the rows from i up to `until`, none of which begins a strip, and says whether there are batches among them.
+// Answers where the list ends.
+SM_PASS_TARGET i64* list_others(const UpperRows& a, i64 i, i64 until, Pieces& pieces, i64* list, i64& has_batches) {
   while (i < until) {
     const i64 batched = a.is_ascending ? batch_rows(a, i, until) : 0;
     const i64 rows = batched > 0 ? batched : std::min(until - i, kBatchRows);
     if (batched > 0) {
       cut_rows(a, i, rows, LeaveDiagonal{}, pieces);
+      has_batches = 1;
       *list++ = 0;
       list = write_batch(batch_of(i, pieces), list);
     } else {
@@ -71,17 +74,19 @@ SM_PASS_TARGET i64* list_others(const UpperRows& a, i64 i, i64 until, Pieces& pi
 SM_PASS_TARGET void list_rows(const UpperRows& a, i64* list) {
   Pieces pieces;
   Look<false> look{kLeastListed, pieces};
+  i64& has_batches = *list++;
+  has_batches = 0;
   i64 listed = 0;
   for (i64 i = 0; i < a.rows;) {
     const i64 rows = look.next(a, i, a.row_start[i]);
     if (rows > 0) {
-      list = list_others(a, listed, i, pieces, list);
+      list = list_others(a, listed, i, pieces, list, has_batches);
       *list++ = rows;
       listed = i + rows;
     }
     i += std::abs(rows);
   }
-  list_others(a, listed, a.rows, pieces, list);
+  list_others(a, listed, a.rows, pieces, list, has_batches);
 }
 
 template <class Ready>
@@ -172,8 +177,14 @@ SM_PASS_TARGET void multiply_one(const UpperRows& a, const double* x, double* y,
   }
 }
 
+// Rows without batches have a loop of their own, whose turns are of two kinds only.
+template <bool kBatches>
+SM_PASS_TARGET __attribute__((noinline)) double direct_listed(const UpperRows& a, const i64* list, const Direction& d) {
+  return exchange_rows<true>(a, Listed<kBatches>{list}, d.p, d.q, Directed{d});
+}
+
 SM_PASS_TARGET double direct(const UpperRows& a, const i64* list, const Direction& d) {
-  return exchange_rows<true>(a, Listed{list}, d.p, d.q, Directed{d});
+  return (*list != 0 ? direct_listed<true> : direct_listed<false>)(a, list + 1, d);
 }
 
 SM_PASS_TARGET double advance(const Step& s) {

@@ -86,7 +86,7 @@ struct Covered {
 Covered covered_by(const Indices& list, std::int64_t n) {
   constexpr std::size_t lengths = 10;  // 0 to 8, and longer
   Covered covered;
-  for (std::size_t word = 0; covered.rows < n;) {
+  for (std::size_t word = 1; covered.rows < n;) {
     const std::int64_t turn = list.at(word++);
     if (turn != 0) {
       covered.rows += std::abs(turn);
@@ -248,6 +248,7 @@ TEST_F(PassesTest, a_list_covers_the_rows_and_finds_the_strips_of_a_grid_and_the
       EXPECT_LE(covered.in_strips, wanted.strips > 0 ? a.n() : a.n() / 100);
       EXPECT_GE(100 * covered.in_batches, wanted.batches * a.n());
       EXPECT_LE(covered.in_batches, wanted.batches > 0 ? a.n() : 0);
+      EXPECT_EQ(list[0], covered.in_batches > 0 ? 1 : 0);
     });
   }
 }
