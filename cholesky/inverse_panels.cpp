@@ -120,7 +120,7 @@ void PanelInversion::solve_own() {
       tiles_.strip(rows, end - a, work_.coefficient, source, u_.width - r, target, Finish::add);
     }
   }
-  solve_square(u_, diag_, own, u_.width, work_);
+  solve_square(u_, diag_, own, u_.width, nullptr, work_);
 }
 
 void PanelInversion::store_own() {
