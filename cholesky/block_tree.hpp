@@ -29,6 +29,14 @@ class BlockTree {
   // The walk, parents first; -1 at its end.
   i64 root() const { return root_; }
   i64 next(i64 first) const { return child(first) >= 0 ? child(first) : a_.jl[first]; }
+  // What at(), child() and next() read of a block.
+  void fetch_words(i64 first) const {
+    __builtin_prefetch(a_.position + first);
+    __builtin_prefetch(a_.jl + first);
+    __builtin_prefetch(a_.iu + first);
+    __builtin_prefetch(a_.iju + first);
+    __builtin_prefetch(a_.diag + first);
+  }
 
  private:
   static constexpr int kWidthBits = 8;

@@ -60,6 +60,7 @@ class Inversion {
   void invert_leaf(const Block& u, const Front* parent);
   void invert_in_front(const Block& u, const Front* parent, bool shared, Front& front, bool rows);
   void store(const Block& u, const Front& front, bool rows);
+  void fetch(i64 first) const;
 
   const InverseRows& z_;
   bool leaves_;
@@ -220,8 +221,38 @@ void Inversion::invert(i64 first) {
   if (keep) fronts_.keep(front, first, parent && z_.tree.is_last_child(first, above));
 }
 
+// What the block needs from memory, once its words are there.
+void Inversion::fetch(i64 first) const {
+  constexpr i64 kFetched = 16;
+  const Block u = z_.tree.at(first);
+  const double* out = z_.values + z_.u.iu[first];
+  for (i64 j = 0; j < std::min(u.length, kFetched); j += 8) {
+    __builtin_prefetch(u.tail + j);
+    __builtin_prefetch(u.values + j);
+    __builtin_prefetch(out + j, 1);
+  }
+}
+
+// Blocks lie anywhere in the workspace: the words of one that comes kAhead later are asked for while a block is in work,
+// and half of the way later what they lead to.
 void Inversion::run() {
-  for (i64 first = z_.tree.root(); first >= 0; first = z_.tree.next(first)) invert(first);
+  constexpr i64 kAhead = 16;
+  i64 queue[kAhead];
+  i64 end = 0;
+  i64 next = z_.tree.root();
+  const auto read = [&] {
+    if (end > 0) next = z_.tree.next(queue[(end - 1) % kAhead]);
+    if (next < 0) return;
+    z_.tree.fetch_words(next);
+    __builtin_prefetch(z_.diag + next, 1);
+    queue[end++ % kAhead] = next;
+  };
+  while (next >= 0 && end + 1 < kAhead) read();
+  for (i64 at = 0; at < end; ++at) {
+    if (next >= 0) read();
+    if (at + kAhead / 2 < end) fetch(queue[(at + kAhead / 2) % kAhead]);
+    invert(queue[at % kAhead]);
+  }
 }
 
 // Words that all fronts would take together, as far as they may be kept.
