@@ -5,17 +5,6 @@
 
 namespace sm {
 
-namespace {
-
-template <int kRows>
-void full_strip(const double* const* from, i64 columns, double* out) {
-  for (i64 c = 0; c < columns; ++c, out += kRows) {
-    for (int i = 0; i < kRows; ++i) out[i] = from[i][c];
-  }
-}
-
-}  // namespace
-
 double* strip_coefficients(const Block& u, const double* diag, i64 r, i64 rows, i64 begin, i64 end, double* out) {
   const i64 height = tile_kernels().strip_rows;
   const double* from[kMostStripRows];
@@ -24,10 +13,8 @@ double* strip_coefficients(const Block& u, const double* diag, i64 r, i64 rows, 
     from[i] = u.row(r + rows - 1 - i) + begin;
     all = all && is_accepted(diag[r + i]);
   }
-  if (all && height == 8) {
-    full_strip<8>(from, end - begin, out);
-  } else if (all && height == 4) {
-    full_strip<4>(from, end - begin, out);
+  if (all) {
+    tile_kernels().turn(from, end - begin, out, height);
   } else {
     for (i64 i = 0; i < rows; ++i) {
       const bool accepted = is_accepted(diag[r + rows - 1 - i]);

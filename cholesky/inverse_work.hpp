@@ -36,6 +36,7 @@ struct InverseWork {
   double panel[kInversePanel * kInversePanel];
   double turned[kInversePanel * kMostBlockRows];
   double coefficient[kMostBlockRows * kInversePanel];
+  double turned_coefficient[kMostBlockRows * kInversePanel];
   double square[kMostBlockRows * kMostBlockRows];
   i64 place[2 * kMostFrontOrder];
   i64 front_column[kMostFrontColumns];

@@ -1,7 +1,8 @@
 // The tile kernels, written once over a vector type. A file that defines SM_TILE_TARGET (the attribute that lets the
 // compiler use the instructions) and, in its own namespace, a struct X includes this there:
 //   X::Vector; X::kWidth lanes, X::kRows rows of a strip, X::kVectors vectors of a tile's row; zero, all(x), load(p),
-//   load(p, n) and store(p, v), store(p, v, n) for the first n lanes only, fma(a, b, c) = a * b + c, add(a, b).
+//   load(p, n) and store(p, v), store(p, v, n) for the first n lanes only, fma(a, b, c) = a * b + c, add(a, b);
+//   turn(square) of kWidth vectors, whose rows become columns.
 //
 // Deliberately without an include guard.
 
@@ -150,6 +151,25 @@ SM_TILE_TARGET void pack(i64 depth, const double* first, i64 step, i64 columns, 
     }
     first += step;
     --step;
+  }
+}
+
+// In squares of a vector's width; a strip has as many rows, or several times as many.
+SM_TILE_TARGET void turn(const double* const* row, i64 columns, double* out, i64 step) {
+  i64 c = 0;
+  for (; c + X::kWidth <= columns; c += X::kWidth, out += X::kWidth * step) {
+#pragma GCC unroll 2
+    for (i64 first = 0; first < X::kRows; first += X::kWidth) {
+      typename X::Vector square[X::kWidth];
+#pragma GCC unroll 8
+      for (i64 i = 0; i < X::kWidth; ++i) square[i] = X::load(row[first + i] + c);
+      X::turn(square);
+#pragma GCC unroll 8
+      for (i64 i = 0; i < X::kWidth; ++i) X::store(out + i * step + first, square[i]);
+    }
+  }
+  for (; c < columns; ++c, out += step) {
+    for (int i = 0; i < X::kRows; ++i) out[i] = row[i][c];
   }
 }
 
