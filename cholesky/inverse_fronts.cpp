@@ -2,6 +2,8 @@
 
 #include <algorithm>
 
+#include "cholesky/search.hpp"
+
 namespace sm {
 
 const Front* FrontStack::find(i64 parent) {
@@ -50,16 +52,12 @@ void FrontStack::keep(Front& front, i64 block, bool in_place) {
   fronts_[count_++] = front;
 }
 
-// Columns that are most of the front's are found by passing both lists without a branch on what is read.
+// Neither way branches on what is read. A few columns are looked for one by one, which searches do side by side.
 void find_places(const Front& front, const i64* column, i64 count, i64* place) {
   constexpr i64 kMany = 8;
   if (count == 0) return;
   if (count * kMany < front.order) {
-    i64 at = -1;
-    for (i64 j = 0; j < count; ++j) {
-      at = std::lower_bound(front.column + at + 1, front.column + front.order, column[j]) - front.column;
-      place[j] = at;
-    }
+    for (i64 j = 0; j < count; ++j) place[j] = find_column(front.column, front.order, column[j]);
     return;
   }
   i64 j = 0;

@@ -31,7 +31,6 @@ namespace sm {
 namespace {
 
 constexpr i64 kMostFrontValues = 3 << 19;  // 12 MB
-constexpr i64 kShortTail = 12;             // below, a kernel's overhead is larger than its gain
 constexpr i64 kLongLeaf = 100;             // above, a row without a front to read is better off with a square
 
 // Whether a block with this tail is better off in the front of its parent than in a smaller one of its own: it would
@@ -91,20 +90,7 @@ void Inversion::invert_row(const Block& u, const Front& front) {
   const i64* place = work_.place;
   const Square& z = front.z;
   double* y = z.first + 1;
-  if (tail < kShortTail) {
-    std::fill_n(y, behind, 0.0);
-    for (i64 i = 0; i < tail; ++i) {
-      const double v = u.values[i];
-      const double* from = z.row(place[i] + 1) + 1;
-      for (i64 j = 0; j < behind; ++j) y[j] += v * from[j];
-    }
-  } else {
-    const TileKernels& tiles = tile_kernels();
-    double* coefficient = work_.coefficient;
-    std::fill_n(coefficient, behind * tiles.strip_rows, 0.0);
-    for (i64 i = 0; i < tail; ++i) coefficient[place[i] * tiles.strip_rows] = u.values[i];
-    tiles.strip(1, behind, coefficient, {z.row(1) + 1, z.step, 0, tiles.tile_columns}, behind, &y, Finish::store);
-  }
+  tile_kernels().multiply_rows(tail, place, u.values, z.row(1) + 1, z.step, behind, y);
   double sum = 0.0;
   for (i64 i = 0; i < tail; ++i) sum += u.values[i] * y[place[i]];
   z.first[0] = z_.u.diag[u.first] + sum;

@@ -48,8 +48,9 @@ struct X {
 //
 #include "cholesky/small_inverse_body.hpp"
 
-const TileKernels kKernels = {"AVX2",       X::kRows, X::kVectors* X::kWidth, strip,      pack,        turn,
-                              expand_plain, spread,   factor_small,           add_square, invert_small};
+const TileKernels kKernels = {"AVX2",        X::kRows,    X::kVectors* X::kWidth, strip,  pack,
+                              multiply_rows, turn,        expand_plain,           spread, factor_small,
+                              add_square,    invert_small};
 
 }  // namespace
 

@@ -103,7 +103,7 @@ SM_TILE_TARGET i64 expand(const i64* column, i64 columns, const i64* own, i64 ow
   return found;
 }
 
-const TileKernels kKernels = {"AVX-512", X::kRows, X::kVectors* X::kWidth, strip,      pack,        turn,
+const TileKernels kKernels = {"AVX-512", X::kRows, X::kVectors* X::kWidth, strip,      pack,        multiply_rows, turn,
                               expand,    spread,   factor_small,           add_square, invert_small};
 
 }  // namespace

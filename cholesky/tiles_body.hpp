@@ -154,6 +154,45 @@ SM_TILE_TARGET void pack(i64 depth, const double* first, i64 step, i64 columns, 
   }
 }
 
+template <int kTogether>
+SM_TILE_TARGET void multiply_few_rows(const i64* place, const double* v, const double* first, i64 step, i64 columns,
+                                      double* y, bool add) {
+  using V = typename X::Vector;
+  V factor[kTogether];
+  const double* row[kTogether];
+#pragma GCC unroll 4
+  for (int i = 0; i < kTogether; ++i) {
+    factor[i] = X::all(v[i]);
+    row[i] = first + place[i] * step;
+  }
+  i64 c = 0;
+  for (; c + X::kWidth <= columns; c += X::kWidth) {
+    V sum = add ? X::load(y + c) : X::zero();
+#pragma GCC unroll 4
+    for (int i = 0; i < kTogether; ++i) sum = X::fma(factor[i], X::load(row[i] + c), sum);
+    X::store(y + c, sum);
+  }
+  if (c == columns) return;
+  const int last = static_cast<int>(columns - c);
+  V sum = add ? X::load(y + c, last) : X::zero();
+#pragma GCC unroll 4
+  for (int i = 0; i < kTogether; ++i) sum = X::fma(factor[i], X::load(row[i] + c, last), sum);
+  X::store(y + c, sum, last);
+}
+
+// The rows one behind the other, in the order in which they lie in memory, four at a time.
+SM_TILE_TARGET void multiply_rows(i64 rows, const i64* place, const double* v, const double* first, i64 step,
+                                  i64 columns, double* y) {
+  if (rows == 0) std::fill_n(y, columns, 0.0);
+  i64 i = 0;
+  for (; i + 4 <= rows; i += 4) multiply_few_rows<4>(place + i, v + i, first, step, columns, y, i > 0);
+  if (i + 2 <= rows) {
+    multiply_few_rows<2>(place + i, v + i, first, step, columns, y, i > 0);
+    i += 2;
+  }
+  if (i < rows) multiply_few_rows<1>(place + i, v + i, first, step, columns, y, i > 0);
+}
+
 // In squares of a vector's width; a strip has as many rows, or several times as many.
 SM_TILE_TARGET void turn(const double* const* row, i64 columns, double* out, i64 step) {
   i64 c = 0;

@@ -44,8 +44,9 @@ struct X {
 //
 #include "cholesky/small_inverse_body.hpp"
 
-const TileKernels kKernels = {"portable",   X::kRows, X::kVectors* X::kWidth, strip,      pack,        turn,
-                              expand_plain, spread,   factor_small,           add_square, invert_small};
+const TileKernels kKernels = {"portable",    X::kRows,    X::kVectors* X::kWidth, strip,  pack,
+                              multiply_rows, turn,        expand_plain,           spread, factor_small,
+                              add_square,    invert_small};
 
 }  // namespace
 
