@@ -9,10 +9,11 @@
 //
 // As in the factorization the unit is a block of rows with one tail (blocks.hpp): Z on the tail, as a full square,
 // times -U of the block, by the tile kernels. Blocks are walked down their tree. The columns of a block's tail are
-// among the columns of its parent, so that the square is copied from the parent's one, the front, which is kept until
-// the last child has been served; where it was too large to keep, it is collected from the rows.
+// among the columns of its parent, whose square, the front, is kept until the last child has been served: a block uses
+// it as it stands, or copies its part of it; where it was too large to keep, Z is collected from the rows.
 //
 //   block_tree.hpp      the tree, and the walk
+//   inverse_fronts.hpp  the squares, and who shares them
 //   inverse_gather.cpp  Z on a tail from its rows
 //   inverse_square.cpp  the rows of a block from the square behind them
 //   small_inverse_body.hpp  the rows of a small leaf
