@@ -1,9 +1,10 @@
 // Z in full squares for the blocks whose children are still to come.
 //
-// The columns of a block's tail are among the columns of its parent: Z on the tail is a part of the parent's square, its
-// front. Where it is most of it, nothing is copied: the block's own rows and columns are put before the front's, which
-// has room for some more, and the front then serves the block too, with columns that it has not. What stands there is
-// Z as well, so that it may be multiplied by zeros. When the next child of the parent comes, its front is what it was.
+// The columns of a block's tail are among the columns of its parent: Z on the tail is a part of the parent's square,
+// its front. Where it is most of it, nothing is copied: the block's own rows and columns are put before the front's,
+// which has room for some more, and the front then serves the block too, with columns that it has not. What stands
+// there is Z as well, so that it may be multiplied by zeros. When the next child of the parent comes, its front is what
+// it was.
 #pragma once
 
 #include "cholesky/inverse_work.hpp"

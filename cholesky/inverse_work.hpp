@@ -58,8 +58,8 @@ struct DensePart {
 void gather(const InverseRows& z, const DensePart& part, const Square& out, i64* place);
 
 // Completes Z on a block's own rows and columns [0, order) of them in a full square, which holds Z behind the block's
-// own columns, and in the block's rows what columns from `order` on add. place: where the columns of the tail are behind
-// its own ones when there are others between them, or null.
+// own columns, and in the block's rows what columns from `order` on add. place: where the columns of the tail are
+// behind its own ones when there are others between them, or null.
 void solve_square(const Block& u, const double* diag, const Square& z, i64 order, const i64* place, InverseWork& work);
 
 // Z of a block, from finished rows, in panels.

@@ -153,7 +153,8 @@ void Inversion::store(const Block& u, const Front& front, bool rows) {
   }
 }
 
-// Columns of a new front, and Z behind the block's own ones, unless they are the parent's. work_.place: where the tail is.
+// Columns of a new front, and Z behind the block's own ones, unless they are the parent's; notes in work_.place where
+// the columns of the tail are.
 void Inversion::enter(const Block& u, const Front* parent, bool shared, const Front& front) {
   const i64 tail = u.tail_length();
   std::iota(front.column, front.column + u.width, u.first);
@@ -220,8 +221,8 @@ void Inversion::fetch(i64 first) const {
   }
 }
 
-// Blocks lie anywhere in the workspace: the words of one that comes kAhead later are asked for while a block is in work,
-// and half of the way later what they lead to.
+// Blocks lie anywhere in the workspace: the words of one that comes kAhead later are asked for while a block is in
+// work, and half of the way later what they lead to.
 void Inversion::run() {
   constexpr i64 kAhead = 16;
   i64 queue[kAhead];
