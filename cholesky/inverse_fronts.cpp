@@ -17,8 +17,7 @@ const Front* FrontStack::find(i64 parent) {
 
 bool FrontStack::open(i64 order, Front& front) {
   const i64 step = step_of(order);
-  if (count_ == kMostFronts || capacity_ - used_ < step * step || kMostFrontColumns - columns_used_ < step)
-    return false;
+  if (!has_place() || capacity_ - used_ < step * step || kMostFrontColumns - columns_used_ < step) return false;
   const i64 before = step - order;
   front = {-1, {values_ + used_ + before * (step + 1), step}, columns_ + columns_used_ + before, order, before, step};
   return true;

@@ -28,6 +28,8 @@ class FrontStack {
   static i64 size(i64 order) { return step_of(order) * step_of(order); }
   // The front of block `parent`, or null; those of finished blocks are dropped.
   const Front* find(i64 parent);
+  // Whether one more can be kept that is not in place of another.
+  bool has_place() const { return count_ < kMostFronts; }
   // A new one, of which neither columns nor values are there; false when there is no room.
   bool open(i64 order, Front& front);
   // `width` more columns before those of another one, none of them there yet.

@@ -198,7 +198,7 @@ void Inversion::invert(i64 first) {
     return;
   }
   Front front;
-  const bool shared = parent && is_worth_sharing(*parent, u);
+  const bool shared = parent && fronts_.has_place() && is_worth_sharing(*parent, u);
   if (shared) {
     front = FrontStack::grown(*parent, u.width);
   } else if (order > kMostFrontOrder || !fronts_.open(order, front)) {

@@ -109,6 +109,21 @@ TEST_F(FrontStackTest, refuses_what_it_has_no_room_for) {
   EXPECT_TRUE(fronts_.open(60, front));
 }
 
+TEST_F(FrontStackTest, has_no_place_for_endlessly_many_fronts) {
+  Front front = opened(40, 1e6);
+  fronts_.keep(front, 100000, false);
+  std::int64_t count = 1;
+  for (; fronts_.has_place(); ++count) {
+    ASSERT_LT(count, kCapacity);
+    Front same = FrontStack::grown(*fronts_.find(100001 - count), 0);
+    fronts_.keep(same, 100000 - count, false);
+  }
+  EXPECT_FALSE(fronts_.open(1, front));
+  EXPECT_NE(fronts_.find(100001 - count + 1), nullptr);
+  EXPECT_TRUE(fronts_.has_place());
+  EXPECT_TRUE(fronts_.open(1, front));
+}
+
 TEST(FindPlaces, finds_few_and_many_columns_of_a_front) {
   for (std::uint64_t seed = 0; seed < 400; ++seed) {
     Random random(seed);

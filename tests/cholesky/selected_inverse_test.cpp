@@ -215,6 +215,18 @@ TEST_P(SelectedInverseTest, agrees_with_solves_on_chains_longer_than_the_room_of
   check(positive_definite(chain(random, 620, kMostFrontOrder + 20, 100), random), true);
 }
 
+// Of the two rows that hang on a row of the chain the other one comes last: every front is still needed below.
+TEST_P(SelectedInverseTest, agrees_with_solves_below_more_fronts_than_are_kept) {
+  Random random(9);
+  constexpr std::int64_t kLevels = 540;
+  Graph g{2 * kLevels, {}};
+  for (std::int64_t i = 0; i + 2 < g.n; ++i) {
+    if (i % 2 == 1) g.edges.emplace_back(i, i + 1);
+    for (std::int64_t j = i + 2; i % 2 == 0 && j <= std::min(i + 6, g.n - 2); j += 2) g.edges.emplace_back(i, j);
+  }
+  check(positive_definite(g, random), true);
+}
+
 TEST_P(SelectedInverseTest, leaves_zeros_for_pivots_that_were_dropped_in_shared_fronts) {
   for (std::uint64_t seed = 0; seed < 40; ++seed) {
     Random random(seed);
