@@ -51,7 +51,7 @@ Json latencies() {
 
 Json scattered_additions() {
   Json list = Json::array();
-  for (const std::size_t kilobytes : {256, 2048, 16384}) {
+  for (const std::size_t kilobytes : {256, 2048, 16384, 262144}) {
     const std::size_t bytes = kilobytes << 10;
     list.push_back({{"bytes", bytes}, {"seconds", scattered_addition(bytes)}});
   }

@@ -14,6 +14,7 @@ add_library(qxesm_objects OBJECT
   store/lifecycle.cpp
   store/nodes.cpp
   store/sizing.cpp
+  store/waiting.cpp
   cholesky/api.cpp
   cholesky/band_solver.cpp
   cholesky/block_factor.cpp

@@ -100,7 +100,7 @@ SmStatus add_pair(SmMatrix& m, const i64* index, i64 i, i64 j, double value) {
 // An entry that is served without a second look: inside an open symmetric sparse matrix with room.
 inline bool is_plain_entry(const SmMatrix& m, i64 row, i64 col) {
   return is_symmetric_sparse(m) && m.state == SM_STATE_OPEN && 0 <= row && row <= col && col < m.rows && m.tree &&
-         m.spare_node && m.sym_roots && m.nnz < SM_MAX_ELEMENTS;
+         m.spare_node && m.sym_roots && m.nnz < SM_MAX_ELEMENTS - kMostWaiting;
 }
 
 [[gnu::noinline]] SmStatus assign_any(SmMatrix& m, i64 row, i64 col, bool add, double value) {
@@ -116,9 +116,11 @@ inline bool is_plain_entry(const SmMatrix& m, i64 row, i64 col) {
 
 SmStatus assign(SmMatrix& m, i64 row, i64 col, bool add, double value) {
   if (!is_plain_entry(m, row, col)) return assign_any(m, row, col, add, value);
+  OpenRows& open = open_rows(m);
   // In random order the row's diagonal is as far away as its root word, and is wanted right after it.
-  __builtin_prefetch(seeded_diagonal(m).slab + row);
-  SM_TRY(enter_covered(m, m.sym_roots + row, col, add, value));
+  __builtin_prefetch(open.diagonal + row);
+  SM_TRY(--open.waiting.until < 0 ? enter_or_wait(m, {row, col, value, add})
+                                  : enter_covered(m, m.sym_roots + row, col, add, value));
   void_results(m);
   return SM_OK;
 }

@@ -62,11 +62,15 @@ class RowWalk {
 // diagonal before it is there, and its third when the second is.
 class RowStarts {
  public:
-  explicit RowStarts(SmMatrix& m) : m_(m), seeded_(is_symmetric_sparse(m) ? seeded_diagonal(m) : SeededDiagonal{}) {}
+  explicit RowStarts(SmMatrix& m) : m_(m) {
+    if (!is_symmetric_sparse(m)) return;
+    diagonal_ = open_rows(m).diagonal;
+    seeded_ = open_rows(m).seeded;
+  }
   NonzeroNode* of(i64 row) {
-    if (row >= seeded_.rows) return first_node(m_, row);
-    NonzeroNode* diagonal = seeded_.slab + row;
-    if (row + kFar < seeded_.rows) {
+    if (row >= seeded_) return first_node(m_, row);
+    NonzeroNode* diagonal = diagonal_ + row;
+    if (row + kFar < seeded_) {
       __builtin_prefetch(target(diagonal[kFar].right));
       if (const NonzeroNode* second = target(diagonal[kNear].right)) __builtin_prefetch(target(second->right));
     }
@@ -77,7 +81,8 @@ class RowStarts {
   static constexpr i64 kNear = 8;
   static constexpr i64 kFar = 16;
   SmMatrix& m_;
-  const SeededDiagonal seeded_;
+  NonzeroNode* diagonal_ = nullptr;
+  i64 seeded_ = 0;
 };
 
 // Unlinks what is small and answers how many rows have no diagonal: those that came in by growth may have none, and it
@@ -113,7 +118,7 @@ void drop_small_values(double* values, i64 count, double tolerance) {
 // The same count where nothing is dropped.
 i64 rows_without_diagonal(SmMatrix& m) {
   i64 count = 0;
-  for (i64 row = seeded_diagonal(m).rows; row < m.rows; ++row) {
+  for (i64 row = open_rows(m).seeded; row < m.rows; ++row) {
     const NonzeroNode* node = first_node(m, row);
     if (!node || node->key != row) ++count;
   }
@@ -175,6 +180,7 @@ SmStatus close(SmMatrix& m, double tolerance) {
   } else if (has_value_array(m)) {
     if (drops) drop_small_values(m.values, static_cast<i64>(m.value_count), tolerance);
   } else if (is_symmetric_sparse(m)) {
+    SM_TRY(link_waiting(m));
     SM_TRY(compress(m, drops ? drop_small_nodes(m, tolerance) : rows_without_diagonal(m)));
   } else {
     return SM_UNAVAILABLE;

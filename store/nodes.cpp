@@ -12,11 +12,11 @@ namespace {
 
 constexpr i64 kRootSlack = 21;  // a root array that grows reaches this many words past the row that made it grow
 
-constexpr i64 kSeededWords = sizeof(SeededDiagonal) / sizeof(uint64_t);
+constexpr i64 kOpenWords = sizeof(OpenRows) / sizeof(uint64_t);
 
-// Behind the root words there is room for seeded_diagonal().
+// Behind the root words there is room for open_rows().
 SmStatus take_roots(SmMatrix& m, i64 capacity, uint64_t*& roots) {
-  return allocate(tree_pool(m), capacity + kSeededWords, Fill::zero, roots);
+  return allocate(tree_pool(m), capacity + kOpenWords, Fill::zero, roots);
 }
 
 SmStatus grow_roots(SmMatrix& m, i64 row) {
@@ -25,7 +25,7 @@ SmStatus grow_roots(SmMatrix& m, i64 row) {
   SM_TRY(take_roots(m, row + kRootSlack, grown));
   uint64_t*& roots = roots_of(m);
   std::copy_n(roots, m.row_capacity, grown);
-  std::copy_n(roots + m.row_capacity, kSeededWords, grown + row + kRootSlack);
+  std::copy_n(roots + m.row_capacity, kOpenWords, grown + row + kRootSlack);
   give_back(tree_pool(m), roots);
   roots = grown;
   m.row_capacity = row + kRootSlack;
@@ -71,6 +71,7 @@ SmStatus start_trees(SmMatrix& m, i64 slab_nodes) {
 
 SmStatus enter_node(SmMatrix& m, i64 row, i64 col, bool add, double value) {
   if (!m.tree || !m.spare_node || !roots_of(m)) return SM_NO_MEMORY;
+  if (is_symmetric_sparse(m)) SM_TRY(link_waiting(m));
   SM_TRY(is_symmetric_sparse(m) ? cover_symmetric(m, col) : cover_general(m, row, col));
   uint64_t* root = roots_of(m) + row;
   if (m.nnz >= SM_MAX_ELEMENTS && !m.tree->find(m.tree, root, &col)) return SM_TOO_LARGE;
@@ -83,7 +84,8 @@ SmStatus seed_diagonal(SmMatrix& m) {
     if (!m.spare_node) return SM_NO_MEMORY;
     SM_TRY(enter_covered(m, m.sym_roots + i, i, false, 0.0));
   }
-  seeded_diagonal(m) = {slab, std::min(m.rows, m.slab_nodes)};
+  open_rows(m).diagonal = slab;
+  open_rows(m).seeded = std::min(m.rows, m.slab_nodes);
   return SM_OK;
 }
 

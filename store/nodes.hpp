@@ -3,6 +3,7 @@
 
 #include "frame/core.hpp"
 #include "store/layouts.hpp"
+#include "store/waiting.hpp"
 
 namespace sm {
 
@@ -45,16 +46,16 @@ inline i64 node_stride(const SmMatrix& m) { return (m.node_size + 7) & ~i64{7}; 
   return SM_OK;
 }
 
-// What an open symmetric sparse matrix keeps behind its root words: where the zeros of its diagonal were entered. The
-// node of row i is slab + i for every row below `rows`. It is the first of its row for as long as the matrix is open,
-// because nothing left of the diagonal is taken and nothing is removed but by closing, which spares the diagonal.
-struct SeededDiagonal {
-  NonzeroNode* slab;
-  i64 rows;
+// What an open symmetric sparse matrix keeps behind its root words: where the zeros of its diagonal were entered, and the
+// entries that wait. The node of row i is diagonal + i for every row below `seeded`. It is the first of its row for as
+// long as the matrix is open, because nothing left of the diagonal is taken and nothing is removed but by closing, which
+// spares the diagonal.
+struct OpenRows {
+  NonzeroNode* diagonal;
+  i64 seeded;
+  WaitingEntries waiting;
 };
-inline SeededDiagonal& seeded_diagonal(const SmMatrix& m) {
-  return *reinterpret_cast<SeededDiagonal*>(m.sym_roots + m.row_capacity);
-}
+inline OpenRows& open_rows(const SmMatrix& m) { return *reinterpret_cast<OpenRows*>(m.sym_roots + m.row_capacity); }
 
 inline NonzeroNode* first_node(SmMatrix& m, i64 row) {
   uint64_t* roots = roots_of(m);

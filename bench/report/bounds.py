@@ -67,8 +67,11 @@ def of_assembly(run, r):
     numbers = loads(r, count, r.facts.get("tree_bytes"))
     if r.variant != "random order":
         numbers["loads"] = None  # what comes next is near by, and fetched ahead
+    addition = scattered(r, r.facts.get("tree_bytes"))
     return {"million": quotient(product(count, 1e-6), r.ours()), "map_ns": map_ns, "map_fifth": product(map_ns, 0.2),
-            "near_load_ns": product(latency(r.machine, 2**20), 1e9), "twenty_ns": 50.0 * machine_scale(r), **numbers}
+            "near_load_ns": product(latency(r.machine, 2**20), 1e9), "twenty_ns": 50.0 * machine_scale(r),
+            "call_ns": product(r.facts.get("call"), 1e9), "scattered_ns": product(addition, 1e9),
+            "additions": quotient(quotient(r.ours(), count), addition), **numbers}
 
 
 def of_ordering(run, r):
@@ -168,7 +171,7 @@ MEASURED = {
 COLUMNS = {
     "assembly": [
         ("million/s", "million"), ("ns an entry", "ns"), ("std::map, ns", "map_ns"),
-        ("loads of memory an entry", "loads")],
+        ("loads of memory an entry", "loads"), ("a call alone, ns", "call_ns")],
     "ordering": [
         ("Gflop of the factor: " + ", ".join(ORDERINGS),
          lambda m: ", ".join(text.number(m[f"gflop_{name.lower()}"]) for name in ORDERINGS)),

@@ -17,7 +17,8 @@ FAMILIES = {
 IN_STEPS = f"{OURS}, in steps"  # the module once more, for the shares of its steps
 PHASES = [
     ("assembly", "Assembly",
-     "Every contribution entered by itself; Eigen takes them all at once. A load is one whose address the load "
+     "Every contribution entered by itself, up to 64 of which wait for each other in a large matrix; Eigen takes "
+     "them all at once. A load is one whose address the load "
      "before gave, over a memory as large as the trees."),
     ("closing", "Closing", "From trees, or from the maps, to compressed rows."),
     ("ordering", "Ordering",

@@ -154,9 +154,11 @@ class Bounds(unittest.TestCase):
 
     def test_an_entry_takes_so_many_loads(self):
         numbers = numbers_of(bounded(record("e", "x", 9, "assembly", {OURS: 0.7, "std::map": 1.4}, "random order",
-                                            contributions=10**6, tree_bytes=2**24)))
+                                            contributions=10**6, tree_bytes=2**24, call=3e-9)))
         self.assertAlmostEqual(numbers["loads"], 5.0)
         self.assertAlmostEqual(numbers["map_ns"], 1400.0)
+        self.assertAlmostEqual(numbers["call_ns"], 3.0)
+        self.assertAlmostEqual(numbers["additions"], 350.0)
         natural = numbers_of(bounded(record("e", "x", 9, "assembly", {OURS: 0.7}, "natural order",
                                             contributions=10**6, tree_bytes=2**24)))
         self.assertAlmostEqual(natural["ns"], 700.0)

@@ -19,7 +19,8 @@ struct SmMatrix {
   NonzeroNode* next_node;    /* the slab position behind spare_node */
   int64_t rows;
   int64_t cols;
-  int64_t nnz;            /* stored entries: nodes, compressed entries, or value slots */
+  int64_t nnz;            /* stored entries: nodes, compressed entries, or value slots; of a large open symmetric sparse
+                           * matrix without the up to 64 entries that wait to be linked in */
   int64_t rank;           /* accepted pivots; -1 on creation, 0 after a change of entries */
   int64_t row_capacity;   /* words of the root array */
   int64_t registry_index; /* 1-based place in the instance's registry */
