@@ -3,7 +3,8 @@
 
 namespace sm {
 
-// Blocks go to the head of their parent's list from the last one to the first.
+// Blocks go to the head of their parent's list from the last one to the first: where the walk goes behind the parent is
+// known by then.
 void BlockTree::build() {
   Blocks(a_).find();
   root_ = -1;
@@ -15,16 +16,10 @@ void BlockTree::build() {
       a_.jl[first] = root_;
       root_ = first;
     } else {
-      a_.jl[first] = child(above);
+      a_.jl[first] = child(above) >= 0 ? child(above) : a_.jl[above];
       a_.position[above] = (first + 1) << kWidthBits | (a_.position[above] & kWidthMask);
     }
   }
-}
-
-i64 BlockTree::next(i64 first) const {
-  if (child(first) >= 0) return child(first);
-  while (first >= 0 && sibling(first) < 0) first = parent(at(first));
-  return first < 0 ? -1 : sibling(first);
 }
 
 }  // namespace sm

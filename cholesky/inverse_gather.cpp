@@ -41,7 +41,13 @@ void gather(const InverseRows& z, const DensePart& part, const Square& out, i64*
       if (in_one_run && begin < count) {
         std::copy_n(from + place[begin], count - begin, to + begin);
       } else {
-        for (i64 j = begin; j < count; ++j) to[j] = from[place[j]];
+        // Most of the elements are in cache lines of their own: those of the next row are under way meanwhile.
+        const bool more = i + 1 < part.end && part.column[i + 1] < b.first + b.width;
+        const double* next = more ? b.row(part.column[i + 1] - b.first) : from;
+        for (i64 j = begin; j < count; ++j) {
+          __builtin_prefetch(next + place[j]);
+          to[j] = from[place[j]];
+        }
       }
       if (!symmetric) continue;
       const i64 own = i - part.from;

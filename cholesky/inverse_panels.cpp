@@ -23,7 +23,9 @@ class PanelInversion {
  private:
   i64 last_strip() const { return (u_.width - 1) / height_ * height_; }
   i64 rows_of(i64 r) const { return std::min(height_, u_.width - r); }
-  void add_product(i64 begin, i64 end, const double* panel, i64 to, i64 columns);
+  void turn();
+  void find_coefficients(i64 begin, i64 end, double* out) const;
+  void add_product(const double* coefficient, i64 depth, const double* panel, i64 to, i64 columns);
   void multiply_tail();
   void solve_tail();
   void solve_own();
@@ -38,29 +40,30 @@ class PanelInversion {
   i64 height_;
 };
 
-// In squares as wide as a line of the cache.
-void turn(const double* panel, i64 rows, i64 columns, double* turned) {
-  constexpr i64 kWidth = 8;
-  for (i64 i = 0; i < rows; i += kWidth) {
-    for (i64 j = 0; j < columns; j += kWidth) {
-      const i64 i_end = std::min(i + kWidth, rows);
-      const i64 j_end = std::min(j + kWidth, columns);
-      for (i64 t = j; t < j_end; ++t) {
-        for (i64 s = i; s < i_end; ++s) turned[t * kInversePanel + s] = panel[s * kInversePanel + t];
-      }
-    }
+// A full panel.
+void PanelInversion::turn() {
+  const double* row[kMostStripRows];
+  for (i64 i = 0; i < kInversePanel; i += height_) {
+    for (i64 s = 0; s < height_; ++s) row[s] = work_.panel + (i + s) * kInversePanel;
+    tiles_.turn(row, kInversePanel, work_.turned + i, kInversePanel);
   }
 }
 
-// The rows' places from `to` on += -U in tail columns [begin, end) times the panel.
-void PanelInversion::add_product(i64 begin, i64 end, const double* panel, i64 to, i64 columns) {
-  const TileSource source = {panel, kInversePanel, 0, tiles_.tile_columns};
+// -U in tail columns [begin, end), strip by strip.
+void PanelInversion::find_coefficients(i64 begin, i64 end, double* out) const {
   for (i64 r = 0; r < u_.width; r += height_) {
+    out = strip_coefficients(u_, diag_, r, rows_of(r), u_.width + begin, u_.width + end, out);
+  }
+}
+
+// The rows' places from `to` on += the coefficients times the panel.
+void PanelInversion::add_product(const double* coefficient, i64 depth, const double* panel, i64 to, i64 columns) {
+  const TileSource source = {panel, kInversePanel, 0, tiles_.tile_columns};
+  for (i64 r = 0; r < u_.width; r += height_, coefficient += depth * height_) {
     const int rows = static_cast<int>(rows_of(r));
-    strip_coefficients(u_, diag_, r, rows, u_.width + begin, u_.width + end, work_.coefficient);
     double* target[kMostStripRows];
     for (int i = 0; i < rows; ++i) target[i] = out_.row(r + rows - 1 - i) + u_.width + to;
-    tiles_.strip(rows, end - begin, work_.coefficient, source, columns, target, Finish::add);
+    tiles_.strip(rows, depth, coefficient, source, columns, target, Finish::add);
   }
 }
 
@@ -71,13 +74,15 @@ void PanelInversion::multiply_tail() {
   const Square panel = {work_.panel, kInversePanel};
   for (i64 a = 0; a < tail; a += kInversePanel) {
     const i64 a_end = std::min(a + kInversePanel, tail);
+    find_coefficients(a, a_end, work_.coefficient);
     for (i64 b = a; b < tail; b += kInversePanel) {
       const i64 b_end = std::min(b + kInversePanel, tail);
       gather(z_, {u_.tail, a, a_end, b, b_end}, panel, work_.place);
-      add_product(a, a_end, work_.panel, b, b_end - b);
+      add_product(work_.coefficient, a_end - a, work_.panel, b, b_end - b);
       if (a == b) continue;
-      turn(work_.panel, a_end - a, b_end - b, work_.turned);
-      add_product(b, b_end, work_.turned, a, a_end - a);
+      turn();
+      find_coefficients(b, b_end, work_.turned_coefficient);
+      add_product(work_.turned_coefficient, b_end - b, work_.turned, a, a_end - a);
     }
   }
 }
@@ -120,7 +125,7 @@ void PanelInversion::solve_own() {
       tiles_.strip(rows, end - a, work_.coefficient, source, u_.width - r, target, Finish::add);
     }
   }
-  solve_square(u_, diag_, own, u_.width, work_);
+  solve_square(u_, diag_, own, u_.width, nullptr, work_);
 }
 
 void PanelInversion::store_own() {

@@ -5,17 +5,6 @@
 
 namespace sm {
 
-namespace {
-
-template <int kRows>
-void full_strip(const double* const* from, i64 columns, double* out) {
-  for (i64 c = 0; c < columns; ++c, out += kRows) {
-    for (int i = 0; i < kRows; ++i) out[i] = from[i][c];
-  }
-}
-
-}  // namespace
-
 double* strip_coefficients(const Block& u, const double* diag, i64 r, i64 rows, i64 begin, i64 end, double* out) {
   const i64 height = tile_kernels().strip_rows;
   const double* from[kMostStripRows];
@@ -24,10 +13,8 @@ double* strip_coefficients(const Block& u, const double* diag, i64 r, i64 rows, 
     from[i] = u.row(r + rows - 1 - i) + begin;
     all = all && is_accepted(diag[r + i]);
   }
-  if (all && height == 8) {
-    full_strip<8>(from, end - begin, out);
-  } else if (all && height == 4) {
-    full_strip<4>(from, end - begin, out);
+  if (all) {
+    tile_kernels().turn(from, end - begin, out, height);
   } else {
     for (i64 i = 0; i < rows; ++i) {
       const bool accepted = is_accepted(diag[r + rows - 1 - i]);
@@ -65,11 +52,28 @@ void solve_corner(const Block& u, const double* diag, const Square& z, i64 begin
   }
 }
 
+// The coefficients of a strip in columns [end, order) of the square.
+double* square_coefficients(const Block& u, const double* diag, i64 r, i64 end, i64 order, const i64* place,
+                            double* out) {
+  const i64 rows = end - r;
+  if (!place) return strip_coefficients(u, diag, r, rows, end, order, out);
+  const i64 height = tile_kernels().strip_rows;
+  out = strip_coefficients(u, diag, r, rows, end, u.width, out);
+  std::fill_n(out, (order - u.width) * height, 0.0);
+  for (i64 i = 0; i < rows; ++i) {
+    const i64 row = end - 1 - i;
+    if (!is_accepted(diag[row])) continue;
+    const double* from = u.row(row) + u.width;
+    for (i64 j = 0; j < u.tail_length(); ++j) out[place[j] * height + i] = from[j];
+  }
+  return out + (order - u.width) * height;
+}
+
 }  // namespace
 
 // Strips of rows from the last to the first: a strip's rows behind it are -U times the square there, and then each of
 // them takes the ones below it.
-void solve_square(const Block& u, const double* diag, const Square& z, i64 order, InverseWork& work) {
+void solve_square(const Block& u, const double* diag, const Square& z, i64 order, const i64* place, InverseWork& work) {
   const TileKernels& tiles = tile_kernels();
   const i64 height = tiles.strip_rows;
   for (i64 r = (u.width - 1) / height * height; r >= 0; r -= height) {
@@ -77,7 +81,7 @@ void solve_square(const Block& u, const double* diag, const Square& z, i64 order
     const int rows = static_cast<int>(end - r);
     const i64 depth = order - end;
     if (depth > 0) {
-      double* own = strip_coefficients(u, diag, r, rows, end, order, work.coefficient);
+      double* own = square_coefficients(u, diag, r, end, order, place, work.coefficient);
       triangle_coefficients(u, diag, r, rows, own);
       double* target[kMostStripRows];
       for (int i = 0; i < rows; ++i) target[i] = z.row(end - 1 - i) + end;

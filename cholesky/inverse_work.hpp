@@ -8,6 +8,7 @@ namespace sm {
 
 inline constexpr i64 kInversePanel = 120;    // a multiple of every tile
 inline constexpr i64 kMostFrontOrder = 384;  // larger ones are worked on in panels
+inline constexpr i64 kMostFrontColumns = 40000;
 
 // Z on the pattern of U, rows as in factor_values, and its diagonal.
 struct InverseRows {
@@ -35,8 +36,10 @@ struct InverseWork {
   double panel[kInversePanel * kInversePanel];
   double turned[kInversePanel * kMostBlockRows];
   double coefficient[kMostBlockRows * kInversePanel];
+  double turned_coefficient[kMostBlockRows * kInversePanel];
   double square[kMostBlockRows * kMostBlockRows];
-  i64 place[kMostFrontOrder];
+  i64 place[2 * kMostFrontOrder];
+  i64 front_column[kMostFrontColumns];
   // Z on the last short tail that was asked for: leaves that follow each other often have the same.
   const i64* tail;
   i64 tail_length;
@@ -55,8 +58,9 @@ struct DensePart {
 void gather(const InverseRows& z, const DensePart& part, const Square& out, i64* place);
 
 // Completes Z on a block's own rows and columns [0, order) of them in a full square, which holds Z behind the block's
-// own columns, and in the block's rows what columns from `order` on add.
-void solve_square(const Block& u, const double* diag, const Square& z, i64 order, InverseWork& work);
+// own columns, and in the block's rows what columns from `order` on add. place: where the columns of the tail are
+// behind its own ones when there are others between them, or null.
+void solve_square(const Block& u, const double* diag, const Square& z, i64 order, const i64* place, InverseWork& work);
 
 // Z of a block, from finished rows, in panels.
 void invert_in_panels(const InverseRows& z, i64 first, InverseWork& work);

@@ -9,10 +9,11 @@
 //
 // As in the factorization the unit is a block of rows with one tail (blocks.hpp): Z on the tail, as a full square,
 // times -U of the block, by the tile kernels. Blocks are walked down their tree. The columns of a block's tail are
-// among the columns of its parent, so that the square is copied from the parent's one, the front, which is kept until
-// the last child has been served; where it was too large to keep, it is collected from the rows.
+// among the columns of its parent, whose square, the front, is kept until the last child has been served: a block uses
+// it as it stands, or copies its part of it; where it was too large to keep, Z is collected from the rows.
 //
 //   block_tree.hpp      the tree, and the walk
+//   inverse_fronts.hpp  the squares, and who shares them
 //   inverse_gather.cpp  Z on a tail from its rows
 //   inverse_square.cpp  the rows of a block from the square behind them
 //   small_inverse_body.hpp  the rows of a small leaf
@@ -20,66 +21,25 @@
 #include "cholesky/selected_inverse.hpp"
 
 #include <algorithm>
+#include <cmath>
+#include <numeric>
 
-#include "cholesky/inverse_work.hpp"
+#include "cholesky/inverse_fronts.hpp"
 #include "cholesky/search.hpp"
 
 namespace sm {
 
 namespace {
 
-constexpr i64 kMostFronts = 512;
 constexpr i64 kMostFrontValues = 3 << 19;  // 12 MB
-constexpr i64 kShortTail = 12;             // below, a kernel's overhead is larger than its gain
 constexpr i64 kLongLeaf = 100;             // above, a row without a front to read is better off with a square
 
-// Z on the columns of a block, its own ones first.
-struct Front {
-  i64 block;
-  Square z;
-  i64 order;
-};
-
-// Fronts of the blocks above the one in work, with room behind them for that one's.
-class FrontStack {
- public:
-  FrontStack(double* values, i64 capacity) : values_(values), capacity_(capacity) {}
-
-  // The front of block `parent`, or null; those of finished blocks are dropped.
-  const Front* find(i64 parent);
-  // Null when there is no room.
-  double* room(i64 order) {
-    return count_ < kMostFronts && capacity_ - used_ >= order * order ? values_ + used_ : nullptr;
-  }
-  void push(i64 block, i64 order) {
-    fronts_[count_++] = {block, {values_ + used_, order}, order};
-    used_ += order * order;
-  }
-  // In place of the last one.
-  void replace(i64 block, i64 order);
-
- private:
-  double* values_;
-  i64 capacity_;
-  i64 used_ = 0;
-  i64 count_ = 0;
-  Front fronts_[kMostFronts];
-};
-
-const Front* FrontStack::find(i64 parent) {
-  while (count_ > 0 && (parent < 0 || fronts_[count_ - 1].block < parent)) {
-    --count_;
-    used_ -= fronts_[count_].order * fronts_[count_].order;
-  }
-  return count_ > 0 && fronts_[count_ - 1].block == parent ? fronts_ + count_ - 1 : nullptr;
-}
-
-void FrontStack::replace(i64 block, i64 order) {
-  const double* from = values_ + used_;
-  Front& last = fronts_[--count_];
-  used_ -= last.order * last.order;
-  std::copy_n(from, order * order, values_ + used_);
-  push(block, order);
+// Whether a block with this tail is better off in the front of its parent than in a smaller one of its own: it would
+// be copied once, where all strips of the block multiply by columns that the block has not.
+bool is_worth_sharing(const Front& parent, const Block& u) {
+  const i64 strips = (u.width + 7) / 8;
+  const i64 tail = u.tail_length();
+  return parent.room >= u.width && parent.order * parent.order * strips <= tail * tail * (strips + 2);
 }
 
 class Inversion {
@@ -95,9 +55,12 @@ class Inversion {
   void invert(i64 first);
   void copy_tail(const Block& u, const Front* parent, const Square& behind);
   void invert_small_leaf(const Block& u, const Front* parent);
-  void invert_row(const Block& u, const Square& z);
+  void enter(const Block& u, const Front* parent, bool shared, const Front& front);
+  void invert_row(const Block& u, const Front& front);
   void invert_leaf(const Block& u, const Front* parent);
-  void store(const Block& u, const Square& z, bool rows);
+  void invert_in_front(const Block& u, const Front* parent, bool shared, Front& front, bool rows);
+  void store(const Block& u, const Front& front, bool rows);
+  void fetch(i64 first) const;
 
   const InverseRows& z_;
   bool leaves_;
@@ -113,7 +76,7 @@ void Inversion::copy_tail(const Block& u, const Front* parent, const Square& beh
     return;
   }
   i64* place = work_.place;
-  find_places(z_.tree.at(parent->block), u.tail, 0, tail, place);
+  find_places(*parent, u.tail, tail, place);
   for (i64 i = 0; i < tail; ++i) {
     const double* from = parent->z.row(place[i]);
     double* to = behind.row(i);
@@ -121,26 +84,18 @@ void Inversion::copy_tail(const Block& u, const Front* parent, const Square& beh
   }
 }
 
-// The only row of a block.
-void Inversion::invert_row(const Block& u, const Square& z) {
+// The only row of a block: the columns of its tail, as work_.place has them, among those behind it.
+void Inversion::invert_row(const Block& u, const Front& front) {
   const i64 tail = u.length;
-  const double d = z_.u.diag[u.first];
+  const i64 behind = front.order - 1;
+  const i64* place = work_.place;
+  const Square& z = front.z;
   double* y = z.first + 1;
+  tile_kernels().multiply_rows(tail, place, u.values, z.row(1) + 1, z.step, behind, y);
   double sum = 0.0;
-  if (tail < kShortTail) {
-    for (i64 i = 0; i < tail; ++i) {
-      const double v = u.values[i];
-      const double* from = z.row(i + 1) + 1;
-      for (i64 j = 0; j < tail; ++j) y[j] += v * from[j];
-    }
-  } else {
-    const TileKernels& tiles = tile_kernels();
-    strip_coefficients(u, z_.u.diag + u.first, 0, 1, 1, tail + 1, work_.coefficient);
-    tiles.strip(1, tail, work_.coefficient, {z.row(1) + 1, z.step, 0, tiles.tile_columns}, tail, &y, Finish::store);
-  }
-  for (i64 i = 0; i < tail; ++i) sum += u.values[i] * y[i];
-  z.first[0] = d + sum;
-  for (i64 i = 0; i < tail; ++i) z.row(i + 1)[0] = y[i];
+  for (i64 i = 0; i < tail; ++i) sum += u.values[i] * y[place[i]];
+  z.first[0] = z_.u.diag[u.first] + sum;
+  for (i64 i = 0; i < behind; ++i) z.row(i + 1)[0] = y[i];
 }
 
 // A single row without children, straight from its parent's front, or else from the rows of its columns.
@@ -149,7 +104,7 @@ void Inversion::invert_leaf(const Block& u, const Front* parent) {
   const double* v = u.values;
   double* y = leaves_ ? z_.values + z_.u.iu[u.first] : work_.panel;
   i64* place = work_.place;
-  if (parent) find_places(z_.tree.at(parent->block), u.tail, 0, tail, place);
+  if (parent) find_places(*parent, u.tail, tail, place);
   Block b = {-1, 0, 0, nullptr, nullptr};
   std::fill_n(y, tail, 0.0);
   double diagonal = 0.0;
@@ -185,19 +140,53 @@ void Inversion::invert_small_leaf(const Block& u, const Front* parent) {
   tile_kernels().invert_small(u, z_.u.diag + u.first, work_.behind, leaves_ ? &out : nullptr, z_.diag + u.first);
 }
 
-void Inversion::store(const Block& u, const Square& z, bool rows) {
+void Inversion::store(const Block& u, const Front& front, bool rows) {
   const Block out = z_.at(u.first);
+  const i64 tail = u.tail_length();
   for (i64 r = 0; r < u.width; ++r) {
-    const double* from = z.row(r);
-    if (rows) std::copy(from + r + 1, from + u.length + 1, out.row(r) + r + 1);
+    const double* from = front.z.row(r);
     z_.diag[u.first + r] = from[r];
+    if (!rows) continue;
+    double* to = std::copy(from + r + 1, from + u.width, out.row(r) + r + 1);
+    from += u.width;
+    for (i64 j = 0; j < tail; ++j) to[j] = from[work_.place[j]];
   }
+}
+
+// Columns of a new front, and Z behind the block's own ones, unless they are the parent's; notes in work_.place where
+// the columns of the tail are.
+void Inversion::enter(const Block& u, const Front* parent, bool shared, const Front& front) {
+  const i64 tail = u.tail_length();
+  std::iota(front.column, front.column + u.width, u.first);
+  if (shared) {
+    find_places(*parent, u.tail, tail, work_.place);
+    return;
+  }
+  std::copy_n(u.tail, tail, front.column + u.width);
+  copy_tail(u, parent, {front.z.row(u.width) + u.width, front.z.step});
+  std::iota(work_.place, work_.place + tail, 0);
+}
+
+void Inversion::invert_in_front(const Block& u, const Front* parent, bool shared, Front& front, bool rows) {
+  enter(u, parent, shared, front);
+  if (u.width == 1 && is_accepted(z_.u.diag[u.first])) {
+    invert_row(u, front);
+  } else {
+    for (i64 r = 0; r < u.width; ++r) std::fill_n(front.z.row(r), front.order, 0.0);
+    solve_square(u, z_.u.diag + u.first, front.z, front.order, shared ? work_.place : nullptr, work_);
+  }
+  store(u, front, rows);
+  // No element is larger than the largest of the diagonal.
+  bool finite = true;
+  for (i64 r = 0; r < (shared ? u.width : front.order); ++r) finite = finite && std::isfinite(front.z.row(r)[r]);
+  if (!finite) front.room = 0;
 }
 
 void Inversion::invert(i64 first) {
   const Block u = z_.tree.at(first);
   const i64 order = u.length + 1;
-  const Front* parent = fronts_.find(z_.tree.parent(u));
+  const i64 above = z_.tree.parent(u);
+  const Front* parent = fronts_.find(above);
   const bool keep = z_.tree.child(first) >= 0;
   const bool single = u.width == 1 && is_accepted(z_.u.diag[first]);
   if (single && !keep && order <= kMostFrontOrder && (parent || u.length <= kLongLeaf)) {
@@ -208,30 +197,50 @@ void Inversion::invert(i64 first) {
     invert_small_leaf(u, parent);
     return;
   }
-  double* room = order <= kMostFrontOrder ? fronts_.room(order) : nullptr;
-  if (!room) {
+  Front front;
+  const bool shared = parent && fronts_.has_place() && is_worth_sharing(*parent, u);
+  if (shared) {
+    front = FrontStack::grown(*parent, u.width);
+  } else if (order > kMostFrontOrder || !fronts_.open(order, front)) {
     invert_in_panels(z_, first, work_);
     return;
   }
-  const Square z = {room, order};
-  std::fill_n(room, u.width * order, 0.0);
-  copy_tail(u, parent, {z.row(u.width) + u.width, z.step});
-  if (single) {
-    invert_row(u, z);
-  } else {
-    solve_square(u, z_.u.diag + first, z, order, work_);
-  }
-  store(u, z, keep || leaves_);
-  if (!keep) return;
-  if (parent && z_.tree.sibling(first) < 0) {
-    fronts_.replace(first, order);
-  } else {
-    fronts_.push(first, order);
+  invert_in_front(u, parent, shared, front, keep || leaves_);
+  if (keep) fronts_.keep(front, first, parent && z_.tree.is_last_child(first, above));
+}
+
+// What the block needs from memory, once its words are there.
+void Inversion::fetch(i64 first) const {
+  constexpr i64 kFetched = 16;
+  const Block u = z_.tree.at(first);
+  const double* out = z_.values + z_.u.iu[first];
+  for (i64 j = 0; j < std::min(u.length, kFetched); j += 8) {
+    __builtin_prefetch(u.tail + j);
+    __builtin_prefetch(u.values + j);
+    __builtin_prefetch(out + j, 1);
   }
 }
 
+// Blocks lie anywhere in the workspace: the words of one that comes kAhead later are asked for while a block is in
+// work, and half of the way later what they lead to.
 void Inversion::run() {
-  for (i64 first = z_.tree.root(); first >= 0; first = z_.tree.next(first)) invert(first);
+  constexpr i64 kAhead = 16;
+  i64 queue[kAhead];
+  i64 end = 0;
+  i64 next = z_.tree.root();
+  const auto read = [&] {
+    if (end > 0) next = z_.tree.next(queue[(end - 1) % kAhead]);
+    if (next < 0) return;
+    z_.tree.fetch_words(next);
+    __builtin_prefetch(z_.diag + next, 1);
+    queue[end++ % kAhead] = next;
+  };
+  while (next >= 0 && end + 1 < kAhead) read();
+  for (i64 at = 0; at < end; ++at) {
+    if (next >= 0) read();
+    if (at + kAhead / 2 < end) fetch(queue[(at + kAhead / 2) % kAhead]);
+    invert(queue[at % kAhead]);
+  }
 }
 
 // Words that all fronts would take together, as far as they may be kept.
@@ -239,7 +248,7 @@ i64 front_values(const BlockTree& tree) {
   i64 sum = 0;
   for (i64 first = tree.root(); first >= 0 && sum < kMostFrontValues; first = tree.next(first)) {
     const i64 order = tree.at(first).length + 1;
-    if (order <= kMostFrontOrder) sum += order * order;
+    if (order <= kMostFrontOrder) sum += FrontStack::size(order);
   }
   return std::min(sum, kMostFrontValues);
 }
@@ -258,7 +267,7 @@ SmStatus SelectedInverse::compute(Wanted wanted) {
   Scratch<InverseWork> work;
   SM_TRY(room.take(m_.pool, capacity));
   SM_TRY(work.take(m_.pool, 1));
-  FrontStack fronts(room.data(), capacity);
+  FrontStack fronts(room.data(), capacity, work.data()->front_column);
   Inversion({u, tree, values_.data(), diag_.data()}, wanted == Wanted::pattern, fronts, *work.data()).run();
   return SM_OK;
 }

@@ -52,6 +52,11 @@ struct TileKernels {
   // Columns [0, columns) of the source's rows, tile by tile, each tile's rows one behind the other; the last tile's
   // missing columns as zeros.
   void (*pack)(i64 depth, const double* first, i64 step, i64 columns, double* panel);
+  // y[c] <- sum over i < rows of v[i] * first[place[i] * step + c], c < columns.
+  void (*multiply_rows)(i64 rows, const i64* place, const double* v, const double* first, i64 step, i64 columns,
+                        double* y);
+  // out[c * step + i] <- row[i][c] for i < strip_rows, c < columns.
+  void (*turn)(const double* const* row, i64 columns, double* out, i64 step);
   // A row on the columns of another one, as a row of a packed panel: tile by tile, tile_step apart, values where `own` has
   // the column, zeros elsewhere and behind the last. own: the row's columns, `own_count` of them, all of which are among
   // `column` or behind its last. Answers how many have been found.

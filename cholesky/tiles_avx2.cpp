@@ -30,6 +30,14 @@ struct X {
   SM_TILE_INLINE static Vector load(const double* p, int n) { return _mm256_maskload_pd(p, mask(n)); }
   SM_TILE_INLINE static void store(double* p, Vector v) { _mm256_storeu_pd(p, v); }
   SM_TILE_INLINE static void store(double* p, Vector v, int n) { _mm256_maskstore_pd(p, mask(n), v); }
+  SM_TILE_INLINE static void turn(Vector (&t)[kWidth]) {
+    const Vector a = _mm256_unpacklo_pd(t[0], t[1]), b = _mm256_unpackhi_pd(t[0], t[1]);
+    const Vector c = _mm256_unpacklo_pd(t[2], t[3]), d = _mm256_unpackhi_pd(t[2], t[3]);
+    t[0] = _mm256_permute2f128_pd(a, c, 0x20);
+    t[1] = _mm256_permute2f128_pd(b, d, 0x20);
+    t[2] = _mm256_permute2f128_pd(a, c, 0x31);
+    t[3] = _mm256_permute2f128_pd(b, d, 0x31);
+  }
   SM_TILE_INLINE static Vector add(Vector a, Vector b) { return _mm256_add_pd(a, b); }
   SM_TILE_INLINE static Vector fma(Vector a, Vector b, Vector c) { return _mm256_fmadd_pd(a, b, c); }
 };
@@ -40,8 +48,9 @@ struct X {
 //
 #include "cholesky/small_inverse_body.hpp"
 
-const TileKernels kKernels = {"AVX2",       X::kRows, X::kVectors* X::kWidth, strip,      pack,
-                              expand_plain, spread,   factor_small,           add_square, invert_small};
+const TileKernels kKernels = {"AVX2",        X::kRows,    X::kVectors* X::kWidth, strip,  pack,
+                              multiply_rows, turn,        expand_plain,           spread, factor_small,
+                              add_square,    invert_small};
 
 }  // namespace
 

@@ -29,6 +29,31 @@ struct X {
   SM_TILE_INLINE static Vector load(const double* p, int n) { return _mm512_maskz_loadu_pd(mask(n), p); }
   SM_TILE_INLINE static void store(double* p, Vector v) { _mm512_storeu_pd(p, v); }
   SM_TILE_INLINE static void store(double* p, Vector v, int n) { _mm512_mask_storeu_pd(p, mask(n), v); }
+  // Pairs of elements, then of pairs, then halves. GCC 12 warns of its own unmasked shuffles.
+  SM_TILE_INLINE static void turn(Vector (&t)[kWidth]) {
+    constexpr __mmask8 kAll = 0xff;
+    Vector s[kWidth];
+#pragma GCC unroll 4
+    for (int i = 0; i < kWidth; i += 2) {
+      s[i] = _mm512_maskz_unpacklo_pd(kAll, t[i], t[i + 1]);
+      s[i + 1] = _mm512_maskz_unpackhi_pd(kAll, t[i], t[i + 1]);
+    }
+#pragma GCC unroll 2
+    for (int i = 0; i < kWidth; i += 4) {
+#pragma GCC unroll 2
+      for (int j = i; j < i + 2; ++j) {
+        t[j] = _mm512_maskz_shuffle_f64x2(kAll, s[j], s[j + 2], 0x88);
+        t[j + 2] = _mm512_maskz_shuffle_f64x2(kAll, s[j], s[j + 2], 0xdd);
+      }
+    }
+#pragma GCC unroll 4
+    for (int i = 0; i < kWidth / 2; ++i) {
+      s[i] = _mm512_maskz_shuffle_f64x2(kAll, t[i], t[i + 4], 0x88);
+      s[i + 4] = _mm512_maskz_shuffle_f64x2(kAll, t[i], t[i + 4], 0xdd);
+    }
+#pragma GCC unroll 8
+    for (int i = 0; i < kWidth; ++i) t[i] = s[i];
+  }
   SM_TILE_INLINE static Vector add(Vector a, Vector b) { return _mm512_add_pd(a, b); }
   SM_TILE_INLINE static Vector fma(Vector a, Vector b, Vector c) { return _mm512_fmadd_pd(a, b, c); }
 };
@@ -78,7 +103,7 @@ SM_TILE_TARGET i64 expand(const i64* column, i64 columns, const i64* own, i64 ow
   return found;
 }
 
-const TileKernels kKernels = {"AVX-512", X::kRows, X::kVectors* X::kWidth, strip,      pack,
+const TileKernels kKernels = {"AVX-512", X::kRows, X::kVectors* X::kWidth, strip,      pack,        multiply_rows, turn,
                               expand,    spread,   factor_small,           add_square, invert_small};
 
 }  // namespace

@@ -1,7 +1,8 @@
 // The tile kernels, written once over a vector type. A file that defines SM_TILE_TARGET (the attribute that lets the
 // compiler use the instructions) and, in its own namespace, a struct X includes this there:
 //   X::Vector; X::kWidth lanes, X::kRows rows of a strip, X::kVectors vectors of a tile's row; zero, all(x), load(p),
-//   load(p, n) and store(p, v), store(p, v, n) for the first n lanes only, fma(a, b, c) = a * b + c, add(a, b).
+//   load(p, n) and store(p, v), store(p, v, n) for the first n lanes only, fma(a, b, c) = a * b + c, add(a, b);
+//   turn(square) of kWidth vectors, whose rows become columns.
 //
 // Deliberately without an include guard.
 
@@ -150,6 +151,64 @@ SM_TILE_TARGET void pack(i64 depth, const double* first, i64 step, i64 columns, 
     }
     first += step;
     --step;
+  }
+}
+
+template <int kTogether>
+SM_TILE_TARGET void multiply_few_rows(const i64* place, const double* v, const double* first, i64 step, i64 columns,
+                                      double* y, bool add) {
+  using V = typename X::Vector;
+  V factor[kTogether];
+  const double* row[kTogether];
+#pragma GCC unroll 4
+  for (int i = 0; i < kTogether; ++i) {
+    factor[i] = X::all(v[i]);
+    row[i] = first + place[i] * step;
+  }
+  i64 c = 0;
+  for (; c + X::kWidth <= columns; c += X::kWidth) {
+    V sum = add ? X::load(y + c) : X::zero();
+#pragma GCC unroll 4
+    for (int i = 0; i < kTogether; ++i) sum = X::fma(factor[i], X::load(row[i] + c), sum);
+    X::store(y + c, sum);
+  }
+  if (c == columns) return;
+  const int last = static_cast<int>(columns - c);
+  V sum = add ? X::load(y + c, last) : X::zero();
+#pragma GCC unroll 4
+  for (int i = 0; i < kTogether; ++i) sum = X::fma(factor[i], X::load(row[i] + c, last), sum);
+  X::store(y + c, sum, last);
+}
+
+// The rows one behind the other, in the order in which they lie in memory, four at a time.
+SM_TILE_TARGET void multiply_rows(i64 rows, const i64* place, const double* v, const double* first, i64 step,
+                                  i64 columns, double* y) {
+  if (rows == 0) std::fill_n(y, columns, 0.0);
+  i64 i = 0;
+  for (; i + 4 <= rows; i += 4) multiply_few_rows<4>(place + i, v + i, first, step, columns, y, i > 0);
+  if (i + 2 <= rows) {
+    multiply_few_rows<2>(place + i, v + i, first, step, columns, y, i > 0);
+    i += 2;
+  }
+  if (i < rows) multiply_few_rows<1>(place + i, v + i, first, step, columns, y, i > 0);
+}
+
+// In squares of a vector's width; a strip has as many rows, or several times as many.
+SM_TILE_TARGET void turn(const double* const* row, i64 columns, double* out, i64 step) {
+  i64 c = 0;
+  for (; c + X::kWidth <= columns; c += X::kWidth, out += X::kWidth * step) {
+#pragma GCC unroll 2
+    for (i64 first = 0; first < X::kRows; first += X::kWidth) {
+      typename X::Vector square[X::kWidth];
+#pragma GCC unroll 8
+      for (i64 i = 0; i < X::kWidth; ++i) square[i] = X::load(row[first + i] + c);
+      X::turn(square);
+#pragma GCC unroll 8
+      for (i64 i = 0; i < X::kWidth; ++i) X::store(out + i * step + first, square[i]);
+    }
+  }
+  for (; c < columns; ++c, out += step) {
+    for (int i = 0; i < X::kRows; ++i) out[i] = row[i][c];
   }
 }
 

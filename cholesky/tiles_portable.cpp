@@ -29,6 +29,11 @@ struct X {
   SM_TILE_INLINE static Vector load(const double* p, int n) { return n == kWidth ? load(p) : Vector{*p, 0.0}; }
   SM_TILE_INLINE static void store(double* p, Vector v) { std::memcpy(p, &v, sizeof v); }
   SM_TILE_INLINE static void store(double* p, Vector v, int n) { std::memcpy(p, &v, sizeof(double) * n); }
+  SM_TILE_INLINE static void turn(Vector (&t)[kWidth]) {
+    const Vector first = {t[0][0], t[1][0]};
+    t[1] = Vector{t[0][1], t[1][1]};
+    t[0] = first;
+  }
   SM_TILE_INLINE static Vector add(Vector a, Vector b) { return a + b; }
   SM_TILE_INLINE static Vector fma(Vector a, Vector b, Vector c) { return a * b + c; }
 };
@@ -39,8 +44,9 @@ struct X {
 //
 #include "cholesky/small_inverse_body.hpp"
 
-const TileKernels kKernels = {"portable",   X::kRows, X::kVectors* X::kWidth, strip,      pack,
-                              expand_plain, spread,   factor_small,           add_square, invert_small};
+const TileKernels kKernels = {"portable",    X::kRows,    X::kVectors* X::kWidth, strip,  pack,
+                              multiply_rows, turn,        expand_plain,           spread, factor_small,
+                              add_square,    invert_small};
 
 }  // namespace
 

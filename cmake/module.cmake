@@ -29,6 +29,7 @@ add_library(qxesm_objects OBJECT
   cholesky/group_panel.cpp
   cholesky/inverse_columns.cpp
   cholesky/inverse_diagonal.cpp
+  cholesky/inverse_fronts.cpp
   cholesky/inverse_gather.cpp
   cholesky/inverse_panels.cpp
   cholesky/inverse_pattern.cpp

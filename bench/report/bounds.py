@@ -139,7 +139,8 @@ def of_inverse(run, r):
     """Each entry of a row of U meets each other one: twice the operations of the factorization."""
     numeric = run.find(r, "numeric")
     flops = product(2.0, numeric.facts.get("flops") if numeric else None)
-    return {"row": row_length(numeric), "gflop": product(flops, 1e-9),
+    row = row_length(numeric)
+    return {"row": row, "gflop": product(flops, 1e-9), "inverse_mb": product(8e-6 * r.n, row),
             "dgemm_seconds": quotient(flops, r.machine["dgemm"]), **rates(r, flops)}
 
 

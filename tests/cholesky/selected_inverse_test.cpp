@@ -163,6 +163,82 @@ TEST(FindColumnAtEnds, answers_as_a_search_from_the_front) {
   }
 }
 
+// Row i touches the `width` rows behind it: every tail is that of the row above but for one column at either end. Some
+// edges are missing, and some rows are touched by others that come before all.
+Graph chain(Random& random, std::int64_t n, std::int64_t width, std::int64_t percent) {
+  const std::int64_t before = n / 8;
+  Graph g{before + n, {}};
+  for (std::int64_t i = 0; i < before; ++i) {
+    const std::int64_t touched = before + random.below(n);
+    for (std::int64_t j = touched; j < std::min(touched + 1 + random.below(6), g.n); ++j) g.edges.emplace_back(i, j);
+  }
+  for (std::int64_t i = before; i < g.n; ++i)
+    for (std::int64_t j = i + 1; j <= std::min(i + width, g.n - 1); ++j)
+      if (j == i + 1 || random.chance(percent)) g.edges.emplace_back(i, j);
+  return g;
+}
+
+// Every row one to three times: the rank is that of the problem.
+Problem repeated(const Problem& problem, Random& random) {
+  std::vector<Indices> copies(at(problem.n));
+  Problem result{"repeated", 0, {}};
+  for (Indices& list : copies)
+    for (std::int64_t c = random.chance(60) ? 1 : 1 + random.below(3); c > 0; --c) list.push_back(result.n++);
+  for (const Entry& e : problem.upper)
+    for (const std::int64_t i : copies[at(e.row)])
+      for (const std::int64_t j : copies[at(e.col)])
+        if (i <= j) result.upper.push_back({i, j, e.value});
+  std::sort(result.upper.begin(), result.upper.end(),
+            [](const Entry& a, const Entry& b) { return std::pair(a.row, a.col) < std::pair(b.row, b.col); });
+  return result;
+}
+
+TEST_P(SelectedInverseTest, agrees_with_solves_where_tails_are_nearly_those_of_their_parents) {
+  for (std::uint64_t seed = 0; seed < 60; ++seed) {
+    Random random(seed);
+    const Graph g =
+        growing_tails(random, 5 + random.below(60), 1 + random.below(seed % 3 == 0 ? 6 : 1), 10 + random.below(50));
+    check(positive_definite(g, random), random.chance(70));
+    if (HasFailure()) FAIL() << "seed " << seed;
+  }
+}
+
+// A front has room for a quarter of its order: chains are longer than that, and end in fronts of every size.
+TEST_P(SelectedInverseTest, agrees_with_solves_on_chains_longer_than_the_room_of_a_front) {
+  Random random(8);
+  for (const std::int64_t width : {1, 2, 7, 8, 9, 24, 60})
+    for (const std::int64_t percent : {100, 60, 10}) {
+      check(positive_definite(chain(random, 150, width, percent), random), true);
+      if (HasFailure()) FAIL() << "width " << width << " percent " << percent;
+    }
+  check(positive_definite(chain(random, 620, kMostFrontOrder - 2, 100), random), true);
+  check(positive_definite(chain(random, 620, kMostFrontOrder + 20, 100), random), true);
+}
+
+// Of the two rows that hang on a row of the chain the other one comes last: every front is still needed below.
+TEST_P(SelectedInverseTest, agrees_with_solves_below_more_fronts_than_are_kept) {
+  Random random(9);
+  constexpr std::int64_t kLevels = 540;
+  Graph g{2 * kLevels, {}};
+  for (std::int64_t i = 0; i + 2 < g.n; ++i) {
+    if (i % 2 == 1) g.edges.emplace_back(i, i + 1);
+    for (std::int64_t j = i + 2; i % 2 == 0 && j <= std::min(i + 6, g.n - 2); j += 2) g.edges.emplace_back(i, j);
+  }
+  check(positive_definite(g, random), true);
+}
+
+TEST_P(SelectedInverseTest, leaves_zeros_for_pivots_that_were_dropped_in_shared_fronts) {
+  for (std::uint64_t seed = 0; seed < 40; ++seed) {
+    Random random(seed);
+    const Graph g = seed % 2 == 0
+                        ? chain(random, 20 + random.below(60), 1 + random.below(30), 30 + random.below(71))
+                        : growing_tails(random, 5 + random.below(40), 1 + random.below(4), 10 + random.below(30));
+    const Problem problem = positive_definite(g, random);
+    EXPECT_EQ(check(repeated(problem, random), true, 1e-9), problem.n);
+    if (HasFailure()) FAIL() << "seed " << seed;
+  }
+}
+
 TEST_P(SelectedInverseTest, leaves_zeros_where_pivots_were_dropped) {
   for (std::uint64_t seed = 0; seed < 150; ++seed) {
     Random random(seed);
