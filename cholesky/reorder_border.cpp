@@ -1,8 +1,9 @@
 // Moving rows as closing left them into the factor's order, each entry that changes rows by way of one copy.
 //
-// An entry of row i only ever moves to a later row j > i. Row j of the new order is its diagonal, what came from earlier
-// rows, and what stays; it ends no later than the old row j did, so the rows can be written one behind the other where
-// they are, as soon as what moves has been taken out. What moves is sorted by counting how many each row receives.
+// An entry of row i only ever moves to a later row j > i. Row j of the new order is its diagonal, what came from
+// earlier rows, and what stays; it ends no later than the old row j did, so the rows can be written one behind the
+// other where they are, as soon as what moves has been taken out. What moves is sorted by counting how many each row
+// receives.
 //
 // Long rows that stand together, the border of a matrix of many small blocks, each reach a large part of all rows. They
 // are walked side by side, some columns at a time: what a row receives is then put down while its memory is at hand.

@@ -64,9 +64,9 @@ struct RowOrder {
   const i64 *perm, *place;
 };
 
-// `groups` times as many vectors as there are lanes, to be solved for where the first `leaves` rows are leaves: blocks to
-// which no row before them adds anything, and behind all of which are their tails. `rest` is room for the lanes of the
-// other rows.
+// `groups` times as many vectors as there are lanes, to be solved for where the first `leaves` rows are leaves: blocks
+// to which no row before them adds anything, and behind all of which are their tails. `rest` is room for the lanes of
+// the other rows.
 struct LeafBatch {
   i64 leaves, groups;
   const double* b;

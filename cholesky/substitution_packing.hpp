@@ -112,10 +112,10 @@ SM_PASS_INLINE void rows_to_segments(const double* from, i64 rows, double* to) {
 }
 
 // The rows are cut into as many chunks as there are lanes, so that the spare room takes a chunk. Each becomes segments,
-// one for a lane: segment v of chunk j is in place (j, v) of a square. Column v of the square is what vector v needs: from
-// the last on it is gathered in the spare room, in the order of x; then what row v has left moves to the places of the
-// segments taken, which mirror its own, and the vector goes to where row v began, or a little behind. The few rows behind
-// the chunks wait on the side.
+// one for a lane: segment v of chunk j is in place (j, v) of a square. Column v of the square is what vector v needs:
+// from the last on it is gathered in the spare room, in the order of x; then what row v has left moves to the places of
+// the segments taken, which mirror its own, and the vector goes to where row v began, or a little behind. The few rows
+// behind the chunks wait on the side.
 template <int kWide>
 SM_PASS_TARGET void unpack_in_place(const RowOrder& order, double* y, double* spare) {
   constexpr i64 kAll = i64{kWide} * kLanes;

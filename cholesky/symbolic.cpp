@@ -104,8 +104,8 @@ class SymbolicRows {
   i64 count_ = 0;             // how many
 };
 
-// Whether the entries of row k are those of row k - 1 but for column k: rows of a dense block are, and where all of them
-// have the same border. What was found of row k - 1 holds then.
+// Whether the entries of row k are those of row k - 1 but for column k: rows of a dense block are, and where all of
+// them have the same border. What was found of row k - 1 holds then.
 template <class Index>
 inline bool SymbolicRows<Index>::repeats_row_before(i64 k) const {
   const i64 row = m_.perm[k];

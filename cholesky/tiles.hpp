@@ -57,9 +57,9 @@ struct TileKernels {
                         double* y);
   // out[c * step + i] <- row[i][c] for i < strip_rows, c < columns.
   void (*turn)(const double* const* row, i64 columns, double* out, i64 step);
-  // A row on the columns of another one, as a row of a packed panel: tile by tile, tile_step apart, values where `own` has
-  // the column, zeros elsewhere and behind the last. own: the row's columns, `own_count` of them, all of which are among
-  // `column` or behind its last. Answers how many have been found.
+  // A row on the columns of another one, as a row of a packed panel: tile by tile, tile_step apart, values where `own`
+  // has the column, zeros elsewhere and behind the last. own: the row's columns, `own_count` of them, all of which are
+  // among `column` or behind its last. Answers how many have been found.
   i64 (*expand)(const i64* column, i64 columns, const i64* own, i64 own_count, const double* value, double* panel,
                 i64 tile_step);
   // target[i][to + x] += sums[i * sums_step + from + x - first] for i < rows over the runs, what is before `first` of

@@ -2,8 +2,8 @@
 // passes_body.hpp, in the same namespace.
 //
 // Row by row, the processor guesses the end of nearly every second such row wrongly, and a wrong guess costs as much as
-// ten entries. So a batch of rows is cut into pieces of at most eight entries first, without a branch on the length of a
-// row, and then the pieces of a length follow each other.
+// ten entries. So a batch of rows is cut into pieces of at most eight entries first, without a branch on the length of
+// a row, and then the pieces of a length follow each other.
 //
 // Deliberately without an include guard.
 

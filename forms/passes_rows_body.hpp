@@ -1,5 +1,5 @@
-// The passes of passes.hpp for one vector. Included behind passes_strips_body.hpp and passes_pieces_body.hpp, in the same
-// namespace.
+// The passes of passes.hpp for one vector. Included behind passes_strips_body.hpp and passes_pieces_body.hpp, in the
+// same namespace.
 //
 // Deliberately without an include guard.
 

@@ -27,7 +27,6 @@ SmStatus accumulate_values(SmMatrix& a, const SmMatrix& b, i64 count, double s) 
 
 // An open matrix added to itself: closing it as the operand would close the target.
 SmStatus scale_open(SmMatrix& a, double s) {
-  SM_TRY(link_waiting(a));
   for_each_node(a, [&](i64, NonzeroNode& node) { node.value += scaled(s, node.value); });
   void_results(a);
   return SM_OK;

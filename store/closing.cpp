@@ -180,7 +180,7 @@ SmStatus close(SmMatrix& m, double tolerance) {
   } else if (has_value_array(m)) {
     if (drops) drop_small_values(m.values, static_cast<i64>(m.value_count), tolerance);
   } else if (is_symmetric_sparse(m)) {
-    SM_TRY(link_waiting(m));
+    link_waiting(m);
     SM_TRY(compress(m, drops ? drop_small_nodes(m, tolerance) : rows_without_diagonal(m)));
   } else {
     return SM_UNAVAILABLE;

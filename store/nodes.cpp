@@ -12,11 +12,13 @@ namespace {
 
 constexpr i64 kRootSlack = 21;  // a root array that grows reaches this many words past the row that made it grow
 
-constexpr i64 kOpenWords = sizeof(OpenRows) / sizeof(uint64_t);
+// Behind the root words of a symmetric matrix there is room for open_rows().
+i64 words_behind_roots(const SmMatrix& m) {
+  return is_symmetric_sparse(m) ? static_cast<i64>(sizeof(OpenRows) / sizeof(uint64_t)) : 0;
+}
 
-// Behind the root words there is room for open_rows().
 SmStatus take_roots(SmMatrix& m, i64 capacity, uint64_t*& roots) {
-  return allocate(tree_pool(m), capacity + kOpenWords, Fill::zero, roots);
+  return allocate(tree_pool(m), capacity + words_behind_roots(m), Fill::zero, roots);
 }
 
 SmStatus grow_roots(SmMatrix& m, i64 row) {
@@ -25,7 +27,7 @@ SmStatus grow_roots(SmMatrix& m, i64 row) {
   SM_TRY(take_roots(m, row + kRootSlack, grown));
   uint64_t*& roots = roots_of(m);
   std::copy_n(roots, m.row_capacity, grown);
-  std::copy_n(roots + m.row_capacity, kOpenWords, grown + row + kRootSlack);
+  std::copy_n(roots + m.row_capacity, words_behind_roots(m), grown + row + kRootSlack);
   give_back(tree_pool(m), roots);
   roots = grown;
   m.row_capacity = row + kRootSlack;
@@ -71,7 +73,7 @@ SmStatus start_trees(SmMatrix& m, i64 slab_nodes) {
 
 SmStatus enter_node(SmMatrix& m, i64 row, i64 col, bool add, double value) {
   if (!m.tree || !m.spare_node || !roots_of(m)) return SM_NO_MEMORY;
-  if (is_symmetric_sparse(m)) SM_TRY(link_waiting(m));
+  if (is_symmetric_sparse(m)) link_waiting(m);
   SM_TRY(is_symmetric_sparse(m) ? cover_symmetric(m, col) : cover_general(m, row, col));
   uint64_t* root = roots_of(m) + row;
   if (m.nnz >= SM_MAX_ELEMENTS && !m.tree->find(m.tree, root, &col)) return SM_TOO_LARGE;
@@ -80,10 +82,15 @@ SmStatus enter_node(SmMatrix& m, i64 row, i64 col, bool add, double value) {
 
 SmStatus seed_diagonal(SmMatrix& m) {
   NonzeroNode* slab = m.spare_node;
+  bool leads_to_top = true;
   for (i64 i = 0; i < m.rows; ++i) {
     if (!m.spare_node) return SM_NO_MEMORY;
+    const NonzeroNode* node = m.spare_node;
     SM_TRY(enter_covered(m, m.sym_roots + i, i, false, 0.0));
+    // A host's own trees may keep something else in a root word than where the top node is.
+    leads_to_top = leads_to_top && (m.sym_roots[i] & ~SM_LINK_TAGS) == reinterpret_cast<uintptr_t>(node);
   }
+  if (!leads_to_top) never_wait(open_rows(m).waiting);
   open_rows(m).diagonal = slab;
   open_rows(m).seeded = std::min(m.rows, m.slab_nodes);
   return SM_OK;

@@ -46,10 +46,10 @@ inline i64 node_stride(const SmMatrix& m) { return (m.node_size + 7) & ~i64{7}; 
   return SM_OK;
 }
 
-// What an open symmetric sparse matrix keeps behind its root words: where the zeros of its diagonal were entered, and the
-// entries that wait. The node of row i is diagonal + i for every row below `seeded`. It is the first of its row for as
-// long as the matrix is open, because nothing left of the diagonal is taken and nothing is removed but by closing, which
-// spares the diagonal.
+// What an open symmetric sparse matrix keeps behind its root words: where the zeros of its diagonal were entered, and
+// the entries that wait. The node of row i is diagonal + i for every row below `seeded`. It is the first of its row for
+// as long as the matrix is open, because nothing left of the diagonal is taken and nothing is removed but by closing,
+// which spares the diagonal.
 struct OpenRows {
   NonzeroNode* diagonal;
   i64 seeded;
@@ -65,6 +65,7 @@ inline NonzeroNode* first_node(SmMatrix& m, i64 row) {
 // Calls f(row, node) for every stored node, rows and columns ascending. f may unlink the node it is given.
 template <class F>
 void for_each_node(SmMatrix& m, F&& f) {
+  if (is_symmetric_sparse(m) && m.state == SM_STATE_OPEN) link_waiting(m);
   for (i64 row = 0; row < m.rows; ++row) {
     for (NonzeroNode* node = first_node(m, row); node;) {
       NonzeroNode* next = sm_node_next(node);

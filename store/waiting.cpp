@@ -1,7 +1,8 @@
 #include "store/waiting.hpp"
 
+#include <time.h>
+
 #include <algorithm>
-#include <chrono>
 
 #include "store/nodes.hpp"
 
@@ -44,15 +45,16 @@ i64 most_waiting(const SmMatrix& m) { return std::min(kMostWaiting, (m.slab_byte
       const NonzeroNode* next = target(link);
       __builtin_prefetch(next);
       ways[left] = {next, way.key};
-      left += way.key != way.node->key && !(link & SM_LINK_THREAD);
+      left += way.key != way.node->key && !(link & SM_LINK_THREAD) && next;
     }
     count = left;
   }
 }
 
 i64 now() {
-  using std::chrono::steady_clock;
-  return std::chrono::duration_cast<std::chrono::nanoseconds>(steady_clock::now().time_since_epoch()).count();
+  timespec time{};
+  clock_gettime(CLOCK_MONOTONIC, &time);
+  return time.tv_sec * i64{1'000'000'000} + time.tv_nsec;
 }
 
 void go_at_once(WaitingEntries& waiting, i64 entries) {
@@ -111,18 +113,19 @@ void look(SmMatrix& m, WaitingEntries& waiting) {
 
 }  // namespace
 
-SmStatus link_waiting(SmMatrix& m) {
-  if (!m.sym_roots || open_rows(m).waiting.count == 0) return SM_OK;
+void never_wait(WaitingEntries& waiting) { go_at_once(waiting, INT64_MAX); }
+
+void link_waiting(SmMatrix& m) {
+  if (!m.sym_roots || open_rows(m).waiting.count == 0) return;
   WaitingEntries& waiting = open_rows(m).waiting;
   ask_for_ways(m, waiting);
   const i64 count = waiting.count;
   waiting.count = 0;
   for (i64 k = 0; k < count; ++k) {
     const WaitingEntry& entry = waiting.entry[k];
-    SM_TRY(enter_covered(m, m.sym_roots + entry.row, entry.col, entry.add, entry.value));
+    (void)enter_covered(m, m.sym_roots + entry.row, entry.col, entry.add, entry.value);  // takes no slab
   }
   entered(m, waiting, count);
-  return SM_OK;
 }
 
 SmStatus enter_or_wait(SmMatrix& m, const WaitingEntry& entry) {
@@ -134,7 +137,8 @@ SmStatus enter_or_wait(SmMatrix& m, const WaitingEntry& entry) {
   }
   __builtin_prefetch(m.sym_roots + entry.row);
   waiting.entry[waiting.count++] = entry;
-  return waiting.count < waiting.limit ? SM_OK : link_waiting(m);
+  if (waiting.count == waiting.limit) link_waiting(m);
+  return SM_OK;
 }
 
 }  // namespace sm

@@ -1,8 +1,8 @@
 // Entries that wait to be linked into the trees of an open symmetric sparse matrix.
 //
-// Entered in no order, each entry waits for its row's root word and for the nodes on the way down, whose addresses stand
-// in one another: a chain of misses for each call, where the memory could serve many at once. Entries may therefore wait
-// until there are kMostWaiting of them. They are then looked for together, level by level (S. Chen, A. Ailamaki,
+// Entered in no order, each entry waits for its row's root word and for the nodes on the way down, whose addresses are
+// in one another: a chain of misses for each call, where the memory could serve many at once. Entries may therefore
+// wait until there are kMostWaiting of them. They are then looked for together, level by level (S. Chen, A. Ailamaki,
 // P. B. Gibbons and T. C. Mowry, "Improving hash join performance through prefetching", ACM Transactions on Database
 // Systems 32 (2007), article 17: group prefetching), and linked in one after the other in the order in which they came,
 // so that trees and sums are those of entering them at once.
@@ -38,12 +38,15 @@ struct WaitingEntries {
   WaitingEntry entry[kMostWaiting];
 };
 
-// Links in what waits. Every operation that reads the trees of an open symmetric sparse matrix, or lets it grow, asks
-// for this first. 0: there are nodes for all that waits.
-[[nodiscard]] SmStatus link_waiting(SmMatrix& m);
+// Links in what waits. Whatever walks the trees of an open symmetric sparse matrix, or lets it grow, asks for this
+// first. It cannot fail: there are nodes for all that waits.
+void link_waiting(SmMatrix& m);
 
-// Enters an entry into an open symmetric sparse matrix that covers it, has a spare node and room for kMostWaiting entries
-// more; or lets it wait. 101 or 0.
+// Entries of this matrix never wait.
+void never_wait(WaitingEntries& waiting);
+
+// Enters an entry into an open symmetric sparse matrix that covers it, has a spare node and room for kMostWaiting
+// entries more; or lets it wait. 101 or 0.
 [[nodiscard]] SmStatus enter_or_wait(SmMatrix& m, const WaitingEntry& entry);
 
 }  // namespace sm

@@ -1,5 +1,5 @@
-// What bounds a job that copying and dgemm do not: a load whose address the load before it gave, adding to places that a
-// list names, and adding vectors that are in the caches.
+// What bounds a job that copying and dgemm do not: a load whose address the load before it gave, adding to places that
+// a list names, and adding vectors that are in the caches.
 #pragma once
 
 #include <cstddef>
@@ -14,8 +14,8 @@ std::vector<std::uint32_t> random_cycle(std::uint32_t count);
 // Seconds a load over `bytes` of memory, one load a line of the cache.
 double dependent_load(std::size_t bytes);
 
-// Seconds for y[place[k]] += a * x[k], in runs of a few ascending places over `bytes` of y, as thin rows of a factor add
-// to others.
+// Seconds for y[place[k]] += a * x[k], in runs of a few ascending places over `bytes` of y, as thin rows of a factor
+// add to others.
 double scattered_addition(std::size_t bytes);
 
 // The sum of value[k] x[place[k]], and y[place[k]] += a value[k]: what a product from one triangle asks of the memory,

@@ -100,7 +100,7 @@ QXESM_API SmStatus qxsmsoldirect(SmMatrix* matrix, const double* b, double* x, i
  * stands.
  * Answers: 0 with nothing done (empty); 1; 113; 111; then, with x cleared: 124 (general); qxsmfact's; 101 (packed: n
  * doubles of work); 0. Cost of a sparse matrix: that of factoring its values, up to three times, with as many doubles
- * as U has, n more and up to 13.1 MB while it runs; where that memory cannot be had, n partial back substitutions
+ * as U has, n more and up to 13.6 MB while it runs; where that memory cannot be had, n partial back substitutions
  * without any. Uses the record's factor_scratch. */
 QXESM_API SmStatus qxsminvdiag(SmMatrix* matrix, double* x);
 

@@ -82,8 +82,8 @@ inline Pattern scattered(Random& random, std::int64_t n, std::int64_t entries) {
   return rows;
 }
 
-// Rows of a pedigree: most have their diagonal only, others up to 40 entries in any order of lengths, few very many; here
-// and there one is empty or has no diagonal.
+// Rows of a pedigree: most have their diagonal only, others up to 40 entries in any order of lengths, few very many;
+// here and there one is empty or has no diagonal.
 inline Pattern pedigree(Random& random, std::int64_t n) {
   Pattern rows;
   for (std::int64_t i = 0; i < n; ++i) {

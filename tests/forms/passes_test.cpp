@@ -261,7 +261,8 @@ TEST_F(PassesTest, rows_of_any_lengths_as_pedigrees_have_them) {
   }
 }
 
-// Each length alone and in turns with single diagonals, so that batches have nothing else; at the end of the arrays too.
+// Each length alone and in turns with single diagonals, so that batches have nothing else; at the end of the arrays
+// too.
 TEST_F(PassesTest, rows_of_every_length_up_to_40_between_single_diagonals) {
   Random random(12);
   for (std::int64_t length = 0; length <= 40; ++length) {

@@ -204,6 +204,28 @@ TEST_P(Waiting, a_matrix_added_to_itself_is_scaled_with_what_waits) {
   EXPECT_EQ(at(m, 4, 4), 15.0);
 }
 
+TEST_P(Waiting, a_block_is_added_to_saved_and_cleared_with_what_waits) {
+  SmMatrix* m = square(kSymmetricSparse, 9);
+  make_wait(m);
+  ASSERT_EQ(set(m, 7, 7, 3.0), SM_OK);
+  ASSERT_EQ(set(m, 7, 8, 0.25), SM_OK);
+  ASSERT_EQ(set(m, 8, 8, 0.5), SM_OK);
+  SmMatrix* b = square(kSymmetricRows, 2);
+  ASSERT_EQ(set(b, 0, 0, -2.5), SM_OK);
+  ASSERT_EQ(set(b, 1, 1, 5.0), SM_OK);
+  ASSERT_EQ(fn().qxsmclose(b, 0.0), SM_OK);
+  SmMatrix* before = square(kSymmetricRows, 2);
+  ASSERT_EQ(waiting(m).count, 3);
+  ASSERT_EQ(qxsmAddGinv(m, b, before, 7, 1.0, 1.0), SM_OK);
+  ASSERT_EQ(fn().qxsmclose(m, 0.0), SM_OK);
+  EXPECT_EQ(at(m, 7, 7), 0.0) << "3 - 2.5 is at most the tolerance";
+  EXPECT_EQ(at(m, 7, 8), 0.0);
+  EXPECT_EQ(at(m, 8, 8), 5.5) << "0.5 and 5 are one element";
+  EXPECT_EQ(at(before, 0, 0), 3.0);
+  EXPECT_EQ(at(before, 0, 1), 0.25);
+  EXPECT_EQ(at(before, 1, 1), 0.5);
+}
+
 TEST_P(Waiting, an_outer_product_waits_like_single_entries) {
   SmMatrix* m = square(kSymmetricSparse, 5);
   make_wait(m);
