@@ -1,6 +1,9 @@
 // Entries of an open symmetric sparse matrix that wait to be linked in together.
 #include <gtest/gtest.h>
 
+#include <iterator>
+#include <map>
+#include <memory>
 #include <utility>
 #include <vector>
 
@@ -247,6 +250,54 @@ TEST_P(Waiting, what_waits_goes_with_a_new_size) {
   EXPECT_EQ(waiting(m).count, 0);
   ASSERT_EQ(fn().qxsmclose(m, 0.0), SM_OK);
   EXPECT_EQ(m->nnz, 6);
+}
+
+// A tree manager of another host: a root word holds an address less one of a list that is not a node at all.
+struct ListManager {
+  NonzeroTree tree{};  // first, so that the one is at the address of the other
+  std::vector<std::unique_ptr<std::map<std::int64_t, NonzeroNode*>>> lists;
+
+  static auto& list_of(std::uint64_t root) {
+    return *reinterpret_cast<std::map<std::int64_t, NonzeroNode*>*>(root + 1);
+  }
+  static NonzeroNode* insert(NonzeroTree* tree, std::uint64_t* root, NonzeroNode* node) {
+    if (*root == 0) {
+      auto& lists = reinterpret_cast<ListManager*>(tree)->lists;
+      lists.push_back(std::make_unique<std::map<std::int64_t, NonzeroNode*>>());
+      *root = reinterpret_cast<std::uintptr_t>(lists.back().get()) - 1;
+    }
+    auto& list = list_of(*root);
+    const auto [place, is_new] = list.emplace(node->key, node);
+    if (!is_new) return place->second;
+    const auto thread = [](NonzeroNode* to) { return reinterpret_cast<std::uintptr_t>(to) | SM_LINK_THREAD; };
+    node->left = thread(place == list.begin() ? nullptr : std::prev(place)->second);
+    node->right = thread(std::next(place) == list.end() ? nullptr : std::next(place)->second);
+    if (place != list.begin()) std::prev(place)->second->right = thread(node);
+    if (std::next(place) != list.end()) std::next(place)->second->left = thread(node);
+    return node;
+  }
+  static NonzeroNode* first(NonzeroTree*, std::uint64_t* root) {
+    return *root == 0 ? nullptr : list_of(*root).begin()->second;
+  }
+};
+
+TEST_P(Waiting, root_words_that_do_not_lead_to_nodes_are_not_followed) {
+  constexpr std::int64_t n = 20'000;
+  ListManager manager;
+  manager.tree.insert = ListManager::insert;
+  manager.tree.first = ListManager::first;
+  SmMatrix* m = typed(kSymmetricSparse);
+  NonzeroTree* const own = std::exchange(m->tree, &manager.tree);
+  ASSERT_EQ(fn().qxsmresize(m, n, n), SM_OK);
+  Nonzeros model = diagonal(n);
+  for (const Entry& e : scattered(n, 30'000, 4)) {
+    ASSERT_EQ(enter(m, e), SM_OK);
+    note(model, e);
+  }
+  EXPECT_EQ(waiting(m).interval, 0) << "no way was compared with the other";
+  ASSERT_EQ(fn().qxsmclose(m, kNan), SM_OK);
+  EXPECT_EQ(compressed(m), model);
+  m->tree = own;
 }
 
 INSTANTIATE_BOTH_HOSTS(Waiting);
