@@ -41,8 +41,6 @@ inline Stretch clip(const Stretch& run, Range range) {
   return first > last ? Stretch{nullptr, first, 0} : Stretch{run.v + (first - run.first), first, last - first + 1};
 }
 
-inline NonzeroNode* node_of(uint64_t link) { return reinterpret_cast<NonzeroNode*>(link & ~SM_LINK_TAGS); }
-
 // The first node at or after `key` in the subtree below `top`, or null.
 inline NonzeroNode* first_below(NonzeroNode* top, i64 key) {
   NonzeroNode* best = nullptr;

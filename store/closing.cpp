@@ -9,15 +9,13 @@ namespace sm {
 
 namespace {
 
-NonzeroNode* target(uint64_t link) { return reinterpret_cast<NonzeroNode*>(link & ~SM_LINK_TAGS); }
-
 // The walk of one row, node by node as sm_node_next does it. In random order every node is a miss that waits for the
 // one before it; before a subtree of some height is walked, all of it is therefore asked for level by level, where the
 // nodes of a level do not wait for each other.
 class RowWalk {
  public:
   NonzeroNode* next_of(const NonzeroNode* node) {
-    NonzeroNode* next = target(node->right);
+    NonzeroNode* next = node_of(node->right);
     if (node->right & SM_LINK_THREAD) {
       asked_for_ -= asked_for_ > 0;
       return next;
@@ -28,7 +26,7 @@ class RowWalk {
     NonzeroNode* way[kHeight];  // the last nodes on the way down
     int depth = 0;
     for (way[0] = next; !(next->left & SM_LINK_THREAD); way[depth % kHeight] = next) {
-      next = target(next->left);
+      next = node_of(next->left);
       ++depth;
     }
     if (!asked && depth >= kLow) ask_for(way[depth < kHeight ? 0 : (depth + 1) % kHeight]);
@@ -47,7 +45,7 @@ class RowWalk {
     for (int i = 0; i < count; ++i) {
       for (const uint64_t link : {nodes[i]->left, nodes[i]->right}) {
         if ((link & SM_LINK_THREAD) || count == kNodes) continue;
-        nodes[count] = target(link);
+        nodes[count] = node_of(link);
         __builtin_prefetch(nodes[count++]);
       }
     }
@@ -71,8 +69,8 @@ class RowStarts {
     if (row >= seeded_) return first_node(m_, row);
     NonzeroNode* diagonal = diagonal_ + row;
     if (row + kFar < seeded_) {
-      __builtin_prefetch(target(diagonal[kFar].right));
-      if (const NonzeroNode* second = target(diagonal[kNear].right)) __builtin_prefetch(target(second->right));
+      __builtin_prefetch(node_of(diagonal[kFar].right));
+      if (const NonzeroNode* second = node_of(diagonal[kNear].right)) __builtin_prefetch(node_of(second->right));
     }
     return diagonal;
   }

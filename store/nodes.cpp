@@ -88,7 +88,7 @@ SmStatus seed_diagonal(SmMatrix& m) {
     const NonzeroNode* node = m.spare_node;
     SM_TRY(enter_covered(m, m.sym_roots + i, i, false, 0.0));
     // A host's own trees may keep something else in a root word than where the top node is.
-    leads_to_top = leads_to_top && (m.sym_roots[i] & ~SM_LINK_TAGS) == reinterpret_cast<uintptr_t>(node);
+    leads_to_top = leads_to_top && node_of(m.sym_roots[i]) == node;
   }
   if (!leads_to_top) never_wait(open_rows(m).waiting);
   open_rows(m).diagonal = slab;

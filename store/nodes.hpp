@@ -7,6 +7,9 @@
 
 namespace sm {
 
+// Where a link word, or a root word of the tree extension's trees, leads to.
+inline NonzeroNode* node_of(uint64_t link) { return reinterpret_cast<NonzeroNode*>(link & ~SM_LINK_TAGS); }
+
 // The root array and the pool of a sparse matrix's trees.
 inline uint64_t*& roots_of(SmMatrix& m) { return is_symmetric_sparse(m) ? m.sym_roots : m.row_roots; }
 inline MemoryPool* tree_pool(SmMatrix& m) { return is_symmetric_sparse(m) ? m.assembly_pool : m.pool; }

@@ -16,8 +16,6 @@ constexpr int kRounds = 3;            // of a comparison
 constexpr i64 kLeastInterval = 4096;  // entries
 constexpr i64 kMostInterval = i64{1} << 18;
 
-inline NonzeroNode* target(uint64_t link) { return reinterpret_cast<NonzeroNode*>(link & ~SM_LINK_TAGS); }
-
 // There is a node for each entry that waits and one more, so that none of them needs a slab.
 i64 most_waiting(const SmMatrix& m) { return std::min(kMostWaiting, (m.slab_bytes - m.slab_used) / node_stride(m)); }
 
@@ -32,7 +30,7 @@ i64 most_waiting(const SmMatrix& m) { return std::min(kMostWaiting, (m.slab_byte
   i64 count = 0;
   for (i64 k = 0; k < waiting.count; ++k) {
     const WaitingEntry& entry = waiting.entry[k];
-    const NonzeroNode* root = target(m.sym_roots[entry.row]);
+    const NonzeroNode* root = node_of(m.sym_roots[entry.row]);
     __builtin_prefetch(root);
     ways[count] = {root, entry.col};
     count += root != nullptr;
@@ -42,7 +40,7 @@ i64 most_waiting(const SmMatrix& m) { return std::min(kMostWaiting, (m.slab_byte
     for (i64 k = 0; k < count; ++k) {
       const Way way = ways[k];
       const uint64_t link = way.key < way.node->key ? way.node->left : way.node->right;
-      const NonzeroNode* next = target(link);
+      const NonzeroNode* next = node_of(link);
       __builtin_prefetch(next);
       ways[left] = {next, way.key};
       left += way.key != way.node->key && !(link & SM_LINK_THREAD) && next;
